@@ -1,0 +1,33 @@
+// SPDX-License-Identifier: MIT
+// The command line of the partitioner:
+//   sfdisk -M1 DISK
+//   sfdisk -N<n> -uS -j<skip> -z<size|-1> -t<hex> [-q] [-f] [-F] DISK
+//   sfdisk --fast-delete <from:to|-1> DISK
+//   sfdisk -l -uS -N<n> DISK
+// An empty argument stands for nothing, wherever it is. Counts are 512-byte sectors.
+#pragma once
+
+#include "partition.h"
+
+enum COMMAND {
+    COMMAND_SIGN,
+    COMMAND_CREATE,
+    COMMAND_DELETE,
+    COMMAND_LIST,
+};
+
+constexpr u64 SIZE_REST_OF_DISK = ~u64{0};
+
+struct REQUEST {
+    COMMAND command;
+    const char *szDisk;
+    int number;  // partition to create or to list
+    u64 skip;    // sectors between the partition before and the new one
+    u64 sectors; // SIZE_REST_OF_DISK: up to the last sector that the table can name
+    u32 type;
+    int firstDeleted;
+    int lastDeleted;
+};
+
+// Fills the request, or says what is wrong with the words. Opens and changes nothing.
+int RequestRead(int argc, char **argv, REQUEST *pRequest);

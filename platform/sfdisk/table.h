@@ -1,0 +1,55 @@
+// SPDX-License-Identifier: MIT
+// The partition table of one disk, in memory until TableWrite.
+#pragma once
+
+#include "disk.h"
+
+#include <libfdisk/libfdisk.h>
+
+enum TABLE_LABEL {
+    TABLE_NONE,    // nothing that the kernel would take for a partition table
+    TABLE_MSDOS,   // ours
+    TABLE_FOREIGN, // GPT and the like, also an ms-dos table that only protects a GPT
+};
+
+struct ContextFree {
+    void operator()(fdisk_context *pContext) const
+    {
+        fdisk_unref_context(pContext);
+    }
+};
+
+struct TABLE {
+    std::unique_ptr<fdisk_context, ContextFree> pContext;
+    const char *szPath;
+    int fd;
+    TABLE_LABEL label;
+    u64 sectors;     // of the whole disk
+    u64 unit;        // sectors of 512 bytes in one sector of the disk: 1, or 8
+    bool fChanged;   // TableWrite has a table to write
+    bool fFindGhost; // TableWrite looks for the headers that an earlier GPT left
+};
+
+int TableOpen(const DISK *pDisk, bool fWrite, TABLE *pTable);
+
+// The partitions as they stand in memory, the logical ones from 5 up. The type of a partition
+// whose label knows no ms-dos types is that of the protective entry, ee.
+int TableRead(const TABLE *pTable, PARTITION_LIST *pList);
+
+// Starts over with an empty ms-dos table. TableWrite will wipe all that other programs take for
+// a signature of the whole disk.
+int TableRenew(TABLE *pTable);
+
+// The number is 1 to 4; the place is free and the disk has it (TableRoomGet).
+int TableAdd(TABLE *pTable, const PARTITION &partition);
+
+// Deleting an extended partition deletes the logical ones in it; deleting a logical one gives
+// those behind it the next lower number.
+int TableDelete(TABLE *pTable, int number);
+
+// The first sector that no entry can name any more: the end of the disk, or 2 TiB on a disk with
+// 512-byte sectors (an entry counts in 32 bits), whichever comes first.
+u64 TableRoomGet(const TABLE *pTable);
+
+// All is on the disk, not only in memory, when this returns.
+int TableWrite(const TABLE *pTable);
