@@ -1,0 +1,46 @@
+# SPDX-License-Identifier: MIT
+#
+# The flags of the house: what every target is compiled with, and what the shipped code adds.
+
+set(CMAKE_CXX_STANDARD 20)
+set(CMAKE_CXX_STANDARD_REQUIRED ON)
+set(CMAKE_CXX_EXTENSIONS OFF)
+set(CMAKE_C_STANDARD 11)
+set(CMAKE_EXPORT_COMPILE_COMMANDS ON)
+set(CMAKE_CXX_FLAGS_RELEASE "-O2 -DNDEBUG")
+set(CMAKE_C_FLAGS_RELEASE "-O2 -DNDEBUG")
+set(CMAKE_POSITION_INDEPENDENT_CODE ON)
+
+if(NOT CMAKE_BUILD_TYPE)
+    set(CMAKE_BUILD_TYPE Release CACHE STRING "" FORCE)
+endif()
+
+# Everybody: tests and platform pieces as well as the tool.
+add_library(house_warnings INTERFACE)
+target_compile_options(house_warnings INTERFACE
+    -Wall -Wextra -Wpedantic -Wconversion -Wshadow -Wformat=2 -Werror)
+target_compile_definitions(house_warnings INTERFACE
+    _GNU_SOURCE _FILE_OFFSET_BITS=64 _TIME_BITS=64)
+
+# The same source gives the same bytes, whatever folder it is built in.
+target_compile_options(house_warnings INTERFACE
+    "-ffile-prefix-map=${CMAKE_SOURCE_DIR}=." "-ffile-prefix-map=${CMAKE_BINARY_DIR}=build")
+
+# The tool and its libraries need nothing of the C++ runtime library: start-up costs what a C
+# program's start-up costs.
+add_library(house_tool INTERFACE)
+target_link_libraries(house_tool INTERFACE house_warnings)
+target_compile_options(house_tool INTERFACE
+    $<$<COMPILE_LANGUAGE:CXX>:-fno-exceptions;-fno-rtti;-fno-threadsafe-statics>
+    -fvisibility=hidden -fstack-protector-strong)
+target_compile_options(house_tool INTERFACE
+    $<$<CONFIG:Release>:-U_FORTIFY_SOURCE;-D_FORTIFY_SOURCE=2;-ffunction-sections;-fdata-sections>)
+
+# A library of the house: NAME, the floors below it, and its sources.
+function(add_house_library szName)
+    cmake_parse_arguments(PARSE_ARGV 1 HOUSE "" "" "SOURCES;USES")
+    add_library(${szName} STATIC ${HOUSE_SOURCES})
+    set_target_properties(${szName} PROPERTIES OUTPUT_NAME ${szName} PREFIX "")
+    target_include_directories(${szName} PUBLIC include)
+    target_link_libraries(${szName} PUBLIC ${HOUSE_USES} PRIVATE house_tool)
+endfunction()
