@@ -1,0 +1,48 @@
+// SPDX-License-Identifier: MIT
+#pragma once
+
+// A string-to-string map in one heap block: header, open-addressing slots and a pool of texts.
+// Only setting may move the block, and then the pointer that was handed in is updated.
+
+#include "nurocore/szlist.h"
+#include "nurocore/types.h"
+
+struct NLIBHASH_SLOT {
+    char *pszKey; // both NULL in a free slot, both inside the pool in a used one
+    char *pszValue;
+};
+
+struct NLIBHASH {
+    i32 cbPool;      // bytes of the pool
+    i32 cbFree;      // bytes of the pool not taken yet
+    i32 nSlot;       // slots
+    i32 nEntry;      // keys stored
+    char *pPoolNext; // first byte of the pool not taken yet
+};
+
+using PNLIBHASH = NLIBHASH *;
+
+// An empty table of nSlot slots and cbPool bytes for texts. The caller frees it with
+// NLIBCHashFree. NULL with ERR_OUT_OF_MEMORY on failure.
+PNLIBHASH NLIBCHashAllocator(int nSlot, int cbPool);
+
+// The same with 31 slots and a pool of 512 bytes at least.
+PNLIBHASH NLIBCHashAlloc(int cbPool);
+
+// NULL is ignored.
+void NLIBCHashFree(PNLIBHASH pHash);
+
+// Stores copies of the pair, or replaces the key's value. Returns the slot of the key (0 or more);
+// -1 for NULL arguments, a full table, or no memory to grow: the table then stays as it was.
+int NLIBCHashSet(PNLIBHASH *ppHash, const char *szKey, const char *szValue);
+
+// The key's value; it belongs to the table. NULL when there is none.
+const char *NLIBCHashGet(const NLIBHASH *pHash, const char *szKey);
+
+// Appends every key to *ppList in slot order (ppList may be NULL). Returns the number of keys, -1
+// for a NULL table or when the list cannot grow.
+int NLIBCHashKeyListGet(const NLIBHASH *pHash, PNLIBSZLIST *ppList);
+
+// The slot where the search for a text begins: 0 to nSlot - 1, -1 for NULL or no slots. The same
+// on every processor, so the order of a key list is too.
+int NLIBCHashIndex(const char *szText, int nSlot);

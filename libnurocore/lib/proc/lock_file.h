@@ -1,0 +1,23 @@
+// SPDX-License-Identifier: MIT
+#pragma once
+
+// The appliance's lock files as this process holds them. No command of the tool takes one; a child
+// lets go of whatever its parent may hold.
+
+#include "nurocore/types.h"
+
+#include <cstdio>
+
+struct LOCK_FILE {
+    FILE *pStream; // open while the lock is held
+    const char *szPath;
+    u32 lockBit; // 0 ends the table
+    i32 nHold;
+    i32 reserved;
+};
+
+// The table's first row; the row with lockBit 0 ends it.
+LOCK_FILE *NLIBCLockFileTable();
+
+// Closes every open lock file and forgets every hold. 0, or -1 when one did not close.
+int NLIBCLockFilesRelease();

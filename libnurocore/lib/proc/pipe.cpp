@@ -1,0 +1,275 @@
+// SPDX-License-Identifier: MIT
+#include "nurocore/pipe.h"
+
+#include "nurocore/error.h"
+#include "nurocore/handle.h"
+#include "nurocore/log.h"
+#include "nurocore/process.h"
+#include "nurocore/types.h"
+
+#include <atomic>
+#include <cerrno>
+#include <cstdarg>
+#include <cstdlib>
+#include <cstring>
+#include <fcntl.h>
+#include <paths.h>
+#include <sched.h>
+#include <sys/types.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+namespace
+{
+
+constexpr int SPIN_ATTEMPTS = 65536;
+constexpr int STATUS_NOT_EXECUTED = 127;
+
+struct PIPE_STREAM {
+    FILE *pStream;
+    i32 pid;
+    PIPE_STREAM *pNext;
+};
+
+PIPE_STREAM *g_pStreams = nullptr; // newest first
+std::atomic<u32> g_streamsLock = 0;
+
+void StreamsLock()
+{
+    int nAttempt = 0;
+    while (g_streamsLock.exchange(1) != 0) {
+        if (++nAttempt == SPIN_ATTEMPTS) {
+            (void)sched_yield();
+            nAttempt = 0;
+        }
+    }
+}
+
+void StreamsUnlock()
+{
+    std::atomic_thread_fence(std::memory_order_seq_cst);
+    g_streamsLock.store(0, std::memory_order_relaxed);
+}
+
+// What the letters of a mode ask for.
+struct PIPE_MODE {
+    bool fRead;
+    bool fWrite;
+    bool fKeepCloseOnExec;
+    bool fStderrOnly;
+    bool fStderrToo;
+};
+
+bool ModeLetterTake(char ch, PIPE_MODE &mode)
+{
+    switch (ch) {
+    case 'r':
+        mode.fRead = true;
+        return true;
+    case 'w':
+        mode.fWrite = true;
+        return true;
+    case 'e':
+        mode.fKeepCloseOnExec = true;
+        return true;
+    case 'E':
+        mode.fStderrOnly = true;
+        return true;
+    case 'B':
+        mode.fStderrToo = true;
+        return true;
+    default:
+        return ch == 'p';
+    }
+}
+
+bool ModeParse(const char *szMode, PIPE_MODE &mode)
+{
+    for (const char *pch = szMode; *pch != '\0'; pch++) {
+        if (!ModeLetterTake(*pch, mode)) {
+            return false;
+        }
+    }
+    return mode.fRead != mode.fWrite;
+}
+
+void CloseOnExecClear(int fd)
+{
+    if (fcntl(fd, F_SETFD, 0) != 0) {
+        NLIBCLog(LOG_ERR, "fcntl failed, %m");
+    }
+}
+
+void MakeStandard(int fd, int fdStandard)
+{
+    if (fd == fdStandard) {
+        CloseOnExecClear(fd);
+    } else {
+        (void)dup2(fd, fdStandard);
+    }
+}
+
+void StandardStreamsSet(const PIPE_MODE &mode, int fdPipe)
+{
+    const bool fPiped[] = {
+        mode.fWrite,
+        mode.fRead && !mode.fStderrOnly,
+        mode.fRead && (mode.fStderrOnly || mode.fStderrToo),
+    };
+    for (int fd = STDIN_FILENO; fd <= STDERR_FILENO; fd++) {
+        if (fPiped[fd]) {
+            MakeStandard(fdPipe, fd);
+        }
+    }
+    const int fdNull = open(_PATH_DEVNULL, O_RDWR);
+    if (fdNull < 0) {
+        return;
+    }
+    for (int fd = STDIN_FILENO; fd <= STDERR_FILENO; fd++) {
+        if (!fPiped[fd]) {
+            (void)dup2(fdNull, fd);
+        }
+    }
+    if (fdNull > STDERR_FILENO) {
+        (void)close(fdNull);
+    }
+}
+
+// The other streams are the parent's business; this program must not hold their ends open.
+void OtherStreamsClose()
+{
+    for (const PIPE_STREAM *p = g_pStreams; p != nullptr; p = p->pNext) {
+        if (fileno(p->pStream) > STDERR_FILENO) {
+            (void)close(fileno(p->pStream));
+        }
+    }
+}
+
+[[noreturn]] void ChildRun(const char *szPath, const PIPE_MODE &mode, int fdPipe,
+                           char *const argv[])
+{
+    StandardStreamsSet(mode, fdPipe);
+    OtherStreamsClose();
+    (void)execv(szPath, argv);
+    _exit(STATUS_NOT_EXECUTED);
+}
+
+// In the parent: turns its end of the pipe into a registered stream.
+FILE *StreamRegister(HEAP_OWNER<PIPE_STREAM> pRecord, const PIPE_MODE &mode, FD_OWNER fdOurs)
+{
+    if (!mode.fKeepCloseOnExec) {
+        CloseOnExecClear(fdOurs.get());
+    }
+    FILE *const pStream = fdopen(fdOurs.get(), mode.fRead ? "r" : "w");
+    if (pStream == nullptr) {
+        NLIBCErrSetHere(ERR_OPEN_FAILED);
+        return nullptr;
+    }
+    (void)fdOurs.release();
+    pRecord->pStream = pStream;
+    StreamsLock();
+    pRecord->pNext = g_pStreams;
+    g_pStreams = pRecord.release();
+    StreamsUnlock();
+    return pStream;
+}
+
+// Takes the stream's record out of the registry; NULL when it has none. Under the lock.
+PIPE_STREAM *StreamUnlink(const FILE *pStream)
+{
+    PIPE_STREAM **pp = &g_pStreams;
+    while (*pp != nullptr && (*pp)->pStream != pStream) {
+        pp = &(*pp)->pNext;
+    }
+    PIPE_STREAM *const pRecord = *pp;
+    if (pRecord != nullptr) {
+        *pp = pRecord->pNext;
+    }
+    return pRecord;
+}
+
+} // namespace
+
+FILE *NLIBCPopenV(const char *szPath, const char *szMode, char *const argv[])
+{
+    PIPE_MODE mode = {};
+    if (szPath == nullptr || szMode == nullptr || argv == nullptr || !ModeParse(szMode, mode)) {
+        NLIBCErrSetHere(ERR_BAD_PARAMETER);
+        return nullptr;
+    }
+    int fdPipe[2] = {-1, -1};
+    if (pipe2(fdPipe, O_CLOEXEC) != 0) {
+        NLIBCErrSetHere(ERR_PIPE_FAILED);
+        return nullptr;
+    }
+    HEAP_OWNER<PIPE_STREAM> pRecord(static_cast<PIPE_STREAM *>(calloc(1, sizeof(PIPE_STREAM))));
+    if (pRecord == nullptr) {
+        // Kept: the pipe stays open here. A process out of memory for 24 bytes is about to end.
+        NLIBCErrSetHere(ERR_OUT_OF_MEMORY);
+        return nullptr;
+    }
+    FD_OWNER fdOurs(fdPipe[mode.fRead ? 0 : 1]);
+    FD_OWNER fdTheirs(fdPipe[mode.fRead ? 1 : 0]);
+
+    // Forked under the lock, so that the child never inherits a list half changed.
+    StreamsLock();
+    const pid_t pid = fork();
+    if (pid == 0) {
+        ChildRun(szPath, mode, fdTheirs.get(), argv);
+    }
+    pRecord->pid = pid;
+    StreamsUnlock();
+
+    fdTheirs.reset();
+    if (pid < 0) {
+        NLIBCErrSetHere(ERR_FORK_FAILED);
+        return nullptr;
+    }
+    return StreamRegister(std::move(pRecord), mode, std::move(fdOurs));
+}
+
+FILE *NLIBCPopen(const char *szPath, const char *szMode, ...)
+{
+    if (szPath == nullptr || szMode == nullptr) {
+        NLIBCErrSetHere(ERR_BAD_PARAMETER);
+        return nullptr;
+    }
+    va_list arguments;
+    va_start(arguments, szMode);
+    const HEAP_OWNER<char *> argv(NLIBCArgvAlloc(szPath, arguments));
+    va_end(arguments);
+    if (argv == nullptr) {
+        NLIBCErrSetHere(ERR_OUT_OF_MEMORY);
+        return nullptr;
+    }
+    return NLIBCPopenV(szPath, szMode, argv.get());
+}
+
+int NLIBCPclose(FILE *pStream)
+{
+    if (pStream == nullptr) {
+        NLIBCErrSetHere(ERR_BAD_PARAMETER);
+        return -1;
+    }
+    StreamsLock();
+    const HEAP_OWNER<PIPE_STREAM> pRecord(StreamUnlink(pStream));
+    if (pRecord != nullptr) {
+        (void)fclose(pStream);
+    }
+    StreamsUnlock();
+    if (pRecord == nullptr) {
+        NLIBCErrSetHere(ERR_NO_SUCH_CHILD);
+        return -1;
+    }
+    int status = 0;
+    while (waitpid(pRecord->pid, &status, 0) < 0) {
+        if (errno == ECHILD) {
+            return 0;
+        }
+        if (errno != EINTR) {
+            NLIBCErrSetHere(ERR_NO_SUCH_CHILD);
+            return -1;
+        }
+    }
+    return status;
+}

@@ -1,0 +1,93 @@
+// SPDX-License-Identifier: MIT
+#include "nurocore/text.h"
+
+#include "nurocore/error.h"
+#include "nurocore/handle.h"
+
+#include <algorithm>
+#include <cstdint>
+#include <cstdlib>
+#include <cstring>
+#include <limits>
+
+namespace
+{
+
+// Vertical tab and form feed are text.
+constexpr char WHITE_SPACE[] = " \t\n\r";
+
+bool IsWhiteSpace(char ch)
+{
+    return ch != '\0' && strchr(WHITE_SPACE, ch) != nullptr;
+}
+
+bool IsBehindStartOf(const char *szText, size_t cchText, const char *pch)
+{
+    const auto start = reinterpret_cast<std::uintptr_t>(szText);
+    const auto place = reinterpret_cast<std::uintptr_t>(pch);
+    return place > start && place <= start + cchText;
+}
+
+} // namespace
+
+int NLIBCStrTrimSpace(char *szSrc, char *szDst)
+{
+    if (szSrc == nullptr || IsBehindStartOf(szSrc, strlen(szSrc), szDst)) {
+        NLIBCErrSetHere(ERR_BAD_PARAMETER);
+        return -1;
+    }
+    const char *pFirst = szSrc + strspn(szSrc, WHITE_SPACE);
+    size_t cch = strlen(pFirst);
+    while (cch > 0 && IsWhiteSpace(pFirst[cch - 1])) {
+        cch--;
+    }
+    if (cch > 1 && pFirst[0] == '"' && pFirst[cch - 1] == '"') {
+        pFirst++;
+        cch -= 2;
+    }
+    char *const szTrimmed = szDst == nullptr ? szSrc : szDst;
+    memmove(szTrimmed, pFirst, cch);
+    szTrimmed[cch] = '\0';
+    return static_cast<int>(cch);
+}
+
+char *NLIBCStrSepNonEmpty(char **pszCursor, const char *szDelims)
+{
+    if (pszCursor == nullptr || szDelims == nullptr) {
+        return nullptr;
+    }
+    char *pszField = nullptr;
+    do {
+        pszField = strsep(pszCursor, szDelims);
+    } while (pszField != nullptr && *pszField == '\0');
+    return pszField;
+}
+
+int NLIBCStrTok(const char *szText, const char *szDelims, PNLIBSZLIST *ppList)
+{
+    if (szText == nullptr || szDelims == nullptr || ppList == nullptr || *ppList == nullptr) {
+        NLIBCErrSetHere(ERR_BAD_PARAMETER);
+        return -1;
+    }
+    const HEAP_OWNER<char> szCopy(strdup(szText));
+    if (szCopy == nullptr) {
+        NLIBCErrSetHere(ERR_OUT_OF_MEMORY);
+        return -1;
+    }
+    int nField = 0;
+    char *pszCursor = szCopy.get();
+    while (const char *const pszField = NLIBCStrSepNonEmpty(&pszCursor, szDelims)) {
+        if (NLIBCSzListPush(ppList, pszField) < 0) {
+            return -1;
+        }
+        nField++;
+    }
+    return nField;
+}
+
+i32 NLIBCStrToI32(const char *szText)
+{
+    const i64 value = strtol(szText, nullptr, 10);
+    return static_cast<i32>(std::clamp<i64>(value, std::numeric_limits<i32>::min(),
+                                            std::numeric_limits<i32>::max()));
+}
