@@ -1,0 +1,185 @@
+// SPDX-License-Identifier: MIT
+#include "hwcontrol/disk_name.h"
+
+#include "nurocore/error.h"
+#include "nurocore/handle.h"
+#include "nurocore/log.h"
+#include "nurocore/text.h"
+
+#include <algorithm>
+#include <cctype>
+#include <cerrno>
+#include <cstdio>
+#include <cstring>
+#include <fcntl.h>
+#include <linux/fs.h>
+#include <string_view>
+#include <sys/ioctl.h>
+
+namespace
+{
+
+constexpr char DEV_PREFIX[] = "/dev/";
+constexpr size_t DEV_PREFIX_LENGTH = sizeof(DEV_PREFIX) - 1;
+constexpr char SD_PREFIX[] = "sd";
+constexpr char MMC_NAME[] = "mmcblk";
+constexpr char BOOT_NAME[] = "nuroboot";
+constexpr size_t NAME_SIZE = 32; // longer names are cut; the kernel's have at most 31 characters
+
+bool IsMmc(const char *szName)
+{
+    return strstr(szName, MMC_NAME) != nullptr;
+}
+
+const char *SkipPrefix(const char *szName, std::string_view prefix)
+{
+    return std::string_view(szName).starts_with(prefix) ? szName + prefix.size() : szName;
+}
+
+bool IsDecimal(char ch)
+{
+    return ch >= '0' && ch <= '9';
+}
+
+// The number at the start of szText as scanf's %d sees it; -1 when there is none.
+int ScanNumber(const char *szText)
+{
+    const char *pch = szText + strspn(szText, " \t\n\v\f\r");
+    pch += *pch == '+' || *pch == '-' ? 1 : 0;
+    return IsDecimal(*pch) ? NLIBCStrToI32(szText) : -1;
+}
+
+// The first character that does not belong to the disk: a "p" that a digit follows, last in an
+// mmcblk path; the first digit in any other.
+size_t DiskLength(const char *szPart)
+{
+    if (!IsMmc(szPart)) {
+        return strcspn(szPart, "0123456789");
+    }
+    const char *const pchLast = strrchr(szPart, 'p');
+    const bool fNumber = pchLast != nullptr && IsDecimal(pchLast[1]);
+    return fNumber ? static_cast<size_t>(pchLast - szPart) : strlen(szPart);
+}
+
+bool IsPartitionRequestValid(const char *szDisk, int partNum, const char *szOut, size_t cbOut)
+{
+    if (cbOut == 0 || szOut == nullptr || szDisk == nullptr || partNum <= 0) {
+        NLIBCLog(LOG_ERR,
+                 "out put szPartitionPath can not be NULL and path length can't be zero");
+        return false;
+    }
+    return true;
+}
+
+} // namespace
+
+int DiskIndexGet(const char *szName)
+{
+    if (szName == nullptr) {
+        return -1;
+    }
+    u32 index = ~0U;
+    const char *pch = SkipPrefix(SkipPrefix(szName, DEV_PREFIX), SD_PREFIX);
+    for (; *pch >= 'a' && *pch <= 'z'; pch++) {
+        index = (index + 1U) * 26U + static_cast<u32>(*pch - 'a');
+    }
+    return static_cast<i32>(index);
+}
+
+int DiskPartitionNumGet(const char *szName, char *szDisk, int cbDisk)
+{
+    if (szName == nullptr || szDisk == nullptr || cbDisk <= 0) {
+        NLIBCErrSetHere(ERR_BAD_PARAMETER);
+        return -1;
+    }
+    // Kept: the disk ends at the first 1 to 9 here, not at a 0 (sda10 is sda and 10; mmcblk0 is
+    // whole), while DiskPartitionNumRemove ends it at any digit.
+    const bool fMmc = IsMmc(szName);
+    const size_t cchDisk = std::min(strcspn(szName, fMmc ? "p" : "123456789"),
+                                    static_cast<size_t>(cbDisk) - 1);
+    memcpy(szDisk, szName, cchDisk);
+    szDisk[cchDisk] = '\0';
+    if (cchDisk == 0) {
+        return -1;
+    }
+    const char *pchNumber = szName + cchDisk;
+    if (*pchNumber == '\0') {
+        return 0;
+    }
+    if (fMmc && *pchNumber++ != 'p') {
+        return -1;
+    }
+    return ScanNumber(pchNumber);
+}
+
+int DiskPartitionNumRemove(const char *szPart, char *szDisk, int cbDisk)
+{
+    if (szPart == nullptr || szDisk == nullptr || cbDisk <= 0) {
+        NLIBCLog(LOG_DEBUG, "Bad parameters");
+        return -1;
+    }
+    if (static_cast<size_t>(cbDisk) < strlen(szPart) + 1) {
+        NLIBCLog(LOG_ERR, "buffer size of szDiskPath should be longer than string length of "
+                          "szPartPath");
+        return -1;
+    }
+    const size_t cchDisk = DiskLength(szPart);
+    memmove(szDisk, szPart, cchDisk);
+    szDisk[cchDisk] = '\0';
+    return 0;
+}
+
+int DiskDevicePartitionNameGet(const char *szDisk, int partNum, char *szOut, size_t cbOut)
+{
+    if (!IsPartitionRequestValid(szDisk, partNum, szOut, cbOut)) {
+        return -1;
+    }
+    char szName[NAME_SIZE];
+    const bool fPath = strncmp(szDisk, "/dev", 4) == 0;
+    const size_t cchSkipped = fPath ? std::min(strlen(szDisk), DEV_PREFIX_LENGTH) : 0;
+    const size_t cchName = std::min(strlen(szDisk + cchSkipped), NAME_SIZE - 1);
+    memcpy(szName, szDisk + cchSkipped, cchName);
+    szName[cchName] = '\0';
+
+    if (std::string_view(szName).starts_with(BOOT_NAME)) {
+        NLIBCLog(LOG_ERR, "we don't generate nuroboot partition name here");
+        return -1;
+    }
+    (void)snprintf(szOut, cbOut, "%s%s%d", szName, IsMmc(szName) ? "p" : "", partNum);
+    return 0;
+}
+
+int DiskDevicePartitionPathGet(const char *szDisk, int partNum, char *szOut, size_t cbOut)
+{
+    if (!IsPartitionRequestValid(szDisk, partNum, szOut, cbOut)) {
+        return -1;
+    }
+    char szName[NAME_SIZE];
+    if (DiskDevicePartitionNameGet(szDisk, partNum, szName, NAME_SIZE) != 0) {
+        NLIBCLog(LOG_ERR, "fail to get device partition name");
+        return -1;
+    }
+    (void)snprintf(szOut, cbOut, "%s%s", DEV_PREFIX, szName);
+    return 0;
+}
+
+int DiskIsExist(const char *szPath)
+{
+    if (szPath == nullptr) {
+        NLIBCErrSetHere(ERR_BAD_PARAMETER);
+        return -1;
+    }
+    const FD_OWNER fd(open(szPath, O_RDONLY | O_CLOEXEC));
+    if (!fd) {
+        if (errno != ENXIO) {
+            NLIBCLog(LOG_ERR, "Failed to open %s, errno=%m", szPath);
+        }
+        return 0;
+    }
+    u64 cbDisk = 0;
+    if (ioctl(fd.get(), BLKGETSIZE64, &cbDisk) != 0) {
+        NLIBCLog(LOG_ERR, "Failed to ioctl %s, errno=%m", szPath);
+        return 0;
+    }
+    return 1;
+}
