@@ -1,0 +1,319 @@
+#!/bin/sh
+# SPDX-License-Identifier: MIT
+#
+# The partitioner on real disks: what the kernel knows when it exits, and that partitions in use
+# are left alone. Runs inside the appliance with four blank disks; sdd is also the one that others
+# lock and kill it on. Read back with sysfs, /proc/partitions, the stock sfdisk, blkid and mount.
+set -u
+
+nChecks=0
+nFailed=0
+szErr=/tmp/partitioner.err
+
+check() {
+    szWhat=$1
+    shift
+    nChecks=$((nChecks + 1))
+    if "$@"; then
+        return
+    fi
+    nFailed=$((nFailed + 1))
+    echo "FAILED: $szWhat: $*"
+    cat "$szErr" 2>/dev/null
+}
+
+does() {
+    sfdisk "$@" 2>"$szErr" && [ ! -s "$szErr" ]
+}
+
+# The line it must say, then the command.
+refuses() {
+    szLine=$1
+    shift
+    sfdisk "$@" 2>"$szErr" && return 1
+    [ "$(cat "$szErr")" = "sfdisk: $szLine" ]
+}
+
+creates() {
+    does "-N$2" "" -uS -q -f "-j$3" "-z$4" "-t$5" -F "/dev/$1"
+}
+
+# Disk, number, start, size: the kernel's numbers, the node, and the line in /proc/partitions.
+knows() {
+    [ "$(cat "/sys/block/$1/$1$2/start" "/sys/block/$1/$1$2/size" 2>&1 | tr '\n' ' ')" = "$3 $4 " ] &&
+        [ -b "/dev/$1$2" ] && grep -q " $1$2\$" /proc/partitions
+}
+
+forgot() {
+    [ ! -e "/sys/block/$1/$1$2" ] && [ ! -e "/dev/$1$2" ] && ! grep -q " $1$2\$" /proc/partitions
+}
+
+table_has() {
+    sfdisk.stock --dump "/dev/$1" | grep -q "^/dev/$1$2 : start= *$3, size= *$4, type=$5\$"
+}
+
+table_lacks() {
+    ! sfdisk.stock --dump "/dev/$1" | grep -q "^/dev/$1$2 :"
+}
+
+label_is() {
+    [ "$(blkid -p -s PTTYPE -o value "/dev/$1")" = "$2" ]
+}
+
+only_dos() {
+    [ "$(wipefs --noheadings -O TYPE "/dev/$1")" = dos ]
+}
+
+is_not() {
+    ! "$@"
+}
+
+stock_table() {
+    printf '%s\n' "$2" | sfdisk.stock -q --no-reread --wipe always "/dev/$1" >/dev/null 2>&1
+    blockdev --rereadpt "/dev/$1"
+}
+
+layout_of_the_appliance() {
+    check "sign a blank disk" does -M1 /dev/sda
+    check "clean table" only_dos sda
+    check "create 1" creates sda 1 2048 4980480 fd
+    check "1 is known at once" knows sda 1 2048 4980480
+    check "create 2" creates sda 2 0 4194304 fd
+    check "2 is known at once" knows sda 2 4982528 4194304
+    check "create 3" creates sda 3 260352 -1 fd
+    check "3 is known at once" knows sda 3 9437184 $(($(cat /sys/block/sda/size) - 9437184))
+    check "table 1" table_has sda 1 2048 4980480 fd
+    check "table 2" table_has sda 2 4982528 4194304 fd
+    check "line of 2" [ "$(sfdisk -l -uS -N2 /dev/sda)" = "/dev/sda2 4982528 9176831 4194304 fd" ]
+    check "no line of 4" [ "$(sfdisk -l -uS -N4 /dev/sda)" = "" ]
+    check "delete 3:128" does --fast-delete 3:128 /dev/sda
+    check "3 is gone" forgot sda 3
+    check "a partition is no disk" refuses "/dev/sda1 is a partition, no disk" -M1 /dev/sda1
+    check "an absent disk" refuses "cannot open /dev/sdz: No such file or directory" -M1 /dev/sdz
+}
+
+beside_a_mounted_partition() {
+    mkfs.ext4 -q /dev/sda1 && mount /dev/sda1 /mnt && echo precious >/mnt/file
+    check "the kernel reads no whole table now" is_not blockdev --rereadpt /dev/sda
+    check "create 3 beside a mounted 1" creates sda 3 260352 1000000 83
+    check "3 is known at once" knows sda 3 9437184 1000000
+    check "sign beside a mounted 1" does -M1 /dev/sda
+    check "delete 3 beside a mounted 1" does --fast-delete 3:128 /dev/sda
+    check "3 is gone" forgot sda 3
+    check "all is refused" refuses "partition 1 of /dev/sda is in use" --fast-delete -1 /dev/sda
+    check "1:2 is refused" refuses "partition 1 of /dev/sda is in use" --fast-delete 1:2 /dev/sda
+    check "1 stays" knows sda 1 2048 4980480
+    check "2 stays" knows sda 2 4982528 4194304
+    check "1 stays in the table" table_has sda 1 2048 4980480 fd
+    check "2 stays in the table" table_has sda 2 4982528 4194304 fd
+    check "1 exists" refuses "partition 1 of /dev/sda exists already" \
+        -N1 -uS -q -f -j2048 -z4980480 -tfd -F /dev/sda
+    check "the file is there" [ "$(cat /mnt/file)" = precious ]
+    umount /mnt
+    check "file system is whole" e2fsck -fn /dev/sda1 >/dev/null 2>&1
+}
+
+beside_an_array() {
+    check "sign sdb" does -M1 /dev/sdb
+    check "sdb1" creates sdb 1 2048 4980480 fd
+    check "sdb2" creates sdb 2 0 4194304 fd
+    mdadm -C /dev/md0 -e 0.9 -amd -R -l1 -n2 /dev/sda1 /dev/sdb1 >/dev/null 2>&1
+    check "array" grep -q '^md0 : active raid1' /proc/mdstat
+    check "a member is in use" refuses "partition 1 of /dev/sdb is in use" \
+        --fast-delete -1 /dev/sdb
+    check "sdb2 came back" knows sdb 2 4982528 4194304
+    check "data partition beside the array" creates sdb 3 260352 -1 fd
+    pvcreate -q /dev/sdb3 >/dev/null 2>&1 && vgcreate -q group /dev/sdb3 >/dev/null 2>&1 &&
+        lvcreate -q -L 64M -n volume group >/dev/null 2>&1
+    check "a volume is in use" refuses "partition 3 of /dev/sdb is in use" \
+        --fast-delete 3:128 /dev/sdb
+    lvremove -q -f group >/dev/null 2>&1 && vgremove -q -f group >/dev/null 2>&1
+    check "no volume, no use" does --fast-delete 3:128 /dev/sdb
+    mdadm -q -S /dev/md0
+    check "no array, no use" does --fast-delete -1 /dev/sdb
+    check "sdb1 is gone" forgot sdb 1
+    check "sdb2 is gone" forgot sdb 2
+    check "sign again" does -M1 /dev/sdb
+}
+
+who_only_looks_is_waited_for() {
+    check "sdb1" creates sdb 1 2048 10000 fd
+    sleep 0.4 </dev/sdb1 &
+    check "a short look" does --fast-delete -1 /dev/sdb
+    wait
+    check "sdb1 is gone" forgot sdb 1
+}
+
+foreign_tables() {
+    stock_table sdc 'label: gpt
+start=2048, size=100000
+start=104448, size=100000'
+    check "gpt is known" knows sdc 2 104448 100000
+    mkfs.ext4 -q /dev/sdc2 && mount /dev/sdc2 /mnt
+    check "a mounted gpt" refuses "/dev/sdc is in use" -M1 /dev/sdc
+    check "a mounted gpt stays" label_is sdc gpt
+    check "its partitions stay" knows sdc 1 2048 100000
+    umount /mnt
+    check "no partition in a gpt" refuses "/dev/sdc has no ms-dos partition table" \
+        -N3 -uS -j0 -z100 -tfd /dev/sdc
+    check "sign a gpt" does -M1 /dev/sdc
+    check "no ghost" only_dos sdc
+    check "gpt 1 is gone" forgot sdc 1
+    check "gpt 2 is gone" forgot sdc 2
+    blockdev --rereadpt /dev/sdc
+    check "gpt 1 stays gone" forgot sdc 1
+
+    wipefs -qa /dev/sdc && mkfs.ext4 -qF /dev/sdc && mount /dev/sdc /mnt
+    check "a mounted disk" refuses "/dev/sdc is in use" -M1 /dev/sdc
+    umount /mnt
+    check "the file system is whole" e2fsck -fn /dev/sdc >/dev/null 2>&1
+    check "sign a file system" does -M1 /dev/sdc
+    check "no ghost of it" only_dos sdc
+}
+
+logical_partitions() {
+    stock_table sdc 'label: dos
+1: start=2048, size=2048, type=fd
+4: start=8192, size=100000, type=5
+5: start=10240, size=2048, type=83
+6: start=14336, size=2048, type=83
+7: start=18432, size=4096, type=83'
+    check "7 is known" knows sdc 7 18432 4096
+    sleep 30 </dev/sdc7 &
+    nHolder=$!
+    check "7 would move" refuses "partition 7 of /dev/sdc is in use" --fast-delete 6:6 /dev/sdc
+    check "6 stays" knows sdc 6 14336 2048
+    kill "$nHolder"
+    wait "$nHolder" 2>/dev/null
+    check "delete 6" does --fast-delete 6:6 /dev/sdc
+    check "7 is 6 now" knows sdc 6 18432 4096
+    check "there is no 7" forgot sdc 7
+    check "5 stays" knows sdc 5 10240 2048
+    blockdev --rereadpt /dev/sdc
+    check "the kernel reads the same" knows sdc 6 18432 4096
+    check "delete 3:128" does --fast-delete 3:128 /dev/sdc
+    for nPart in 4 5 6; do
+        check "$nPart is gone" forgot sdc "$nPart"
+    done
+    check "1 stays" knows sdc 1 2048 2048
+}
+
+# The table says one thing and the kernel another, as after a run that was cut short.
+kernel_and_table_differ() {
+    check "sdc2" creates sdc 2 0 2048 fd
+    dd if=/dev/zero of=/dev/sdc bs=512 count=1 conv=notrunc 2>/dev/null
+    check "sign" does -M1 /dev/sdc
+    check "sdc1 is gone" forgot sdc 1
+    check "sdc2 is gone" forgot sdc 2
+    check "sdc1" creates sdc 1 2048 2048 fd
+    dd if=/dev/sdc of=/tmp/table bs=512 count=1 2>/dev/null
+    check "delete" does --fast-delete -1 /dev/sdc
+    dd if=/tmp/table of=/dev/sdc bs=512 count=1 conv=notrunc 2>/dev/null
+    check "the kernel knows nothing" forgot sdc 1
+    check "sign" does -M1 /dev/sdc
+    check "the kernel knows" knows sdc 1 2048 2048
+}
+
+locks() {
+    check "sign" does -M1 /dev/sdd
+    flock /dev/sdd sleep 1 &
+    sleep 0.2
+    nBefore=$(cut -d. -f1 /proc/uptime)
+    check "a locked disk is waited for" creates sdd 1 2048 2048 fd
+    check "not for long" [ $(($(cut -d. -f1 /proc/uptime) - nBefore)) -le 4 ]
+    wait
+    check "made" knows sdd 1 2048 2048
+    sfdisk -N2 -uS -j0 -z10 -tfd /dev/sdd &
+    sfdisk --fast-delete -1 /dev/sdc &
+    wait
+    check "two disks at once" knows sdd 2 4096 10
+    check "the table reaches the disk" synced
+}
+
+# The last thing before the kernel learns of it is that the disk has it.
+synced() {
+    strace -o /tmp/trace -e trace=write,pwrite64,fsync,ioctl sfdisk -N3 -uS -j0 -z10 -tfd /dev/sdd
+    [ "$(grep -E 'write|fsync|BLKPG' /tmp/trace | tail -n 2 | cut -d'(' -f1 | tr '\n' ' ')" = "fsync ioctl " ]
+}
+
+killed_and_run_again() {
+    for szPause in 0.000 0.005 0.010 0.015 0.020 0.025 0.030 0.040 0.050; do
+        for szStep in "--fast-delete -1" -M1 "-N1 -uS -j2048 -z2048 -tfd"; do
+            # shellcheck disable=SC2086  # words, not one word
+            sfdisk $szStep /dev/sdd 2>/dev/null &
+            nKilled=$!
+            sleep "$szPause"
+            kill -KILL "$nKilled" 2>/dev/null
+            wait "$nKilled" 2>/dev/null
+            check "$szPause $szStep: delete" does --fast-delete -1 /dev/sdd
+            check "$szPause $szStep: sign" does -M1 /dev/sdd
+            check "$szPause $szStep: create" creates sdd 1 2048 2048 fd
+            check "$szPause $szStep: known" knows sdd 1 2048 2048
+            check "$szPause $szStep: in the table" table_has sdd 1 2048 2048 fd
+        done
+    done
+}
+
+# Prints the name of the disk that the kernel's test driver makes with these parameters.
+debug_disk() {
+    szBefore=$(ls /sys/block)
+    modprobe scsi_debug per_host_store=1 dev_size_mb=16 "$@" || return
+    for szHost in /sys/class/scsi_host/host*; do
+        [ "$(cat "$szHost/proc_name")" = scsi_debug ] && echo '- - -' >"$szHost/scan"
+    done
+    nTenths=0
+    while [ "$nTenths" -lt 50 ]; do
+        for szName in $(ls /sys/block); do
+            case " $(echo "$szBefore" | tr '\n' ' ') " in
+            *" $szName "*) ;;
+            *) [ -b "/dev/$szName" ] && echo "$szName" && return ;;
+            esac
+        done
+        nTenths=$((nTenths + 1))
+        sleep 0.1
+    done
+}
+
+sectors_of_4096_bytes() {
+    szDisk=$(debug_disk sector_size=4096)
+    check "the disk has large sectors" [ "$(cat "/sys/block/$szDisk/queue/logical_block_size")" = 4096 ]
+    check "sign" does -M1 "/dev/$szDisk"
+    check "half a sector" refuses "partition 1 does not lie on whole sectors of /dev/$szDisk" \
+        -N1 -uS -j63 -z8000 -tfd "/dev/$szDisk"
+    check "create 1" creates "$szDisk" 1 2048 8192 fd
+    check "1 is known" knows "$szDisk" 1 2048 8192
+    check "create 2" creates "$szDisk" 2 0 -1 82
+    check "2 is known" knows "$szDisk" 2 10240 $(($(cat "/sys/block/$szDisk/size") - 10240))
+    check "line" [ "$(sfdisk -l -uS -N1 "/dev/$szDisk")" = "/dev/${szDisk}1 2048 10239 8192 fd" ]
+    check "stock reads it" table_has "$szDisk" 1 256 1024 fd
+    check "delete" does --fast-delete -1 "/dev/$szDisk"
+    check "1 is gone" forgot "$szDisk" 1
+    modprobe -r scsi_debug
+}
+
+more_than_two_tebibytes() {
+    szDisk=$(debug_disk virtual_gb=3000)
+    check "the disk is large" [ "$(cat "/sys/block/$szDisk/size")" -gt 4294967296 ]
+    check "sign" does -M1 "/dev/$szDisk"
+    check "create 1" creates "$szDisk" 1 2048 -1 fd
+    check "up to 2 TiB" knows "$szDisk" 1 2048 4294965248
+    check "no more" refuses \
+        "partition 2 does not fit on /dev/$szDisk: it begins at sector 4294967296 of 4294967296" \
+        -N2 -uS -j0 -z-1 -tfd "/dev/$szDisk"
+    modprobe -r scsi_debug
+}
+
+layout_of_the_appliance
+beside_a_mounted_partition
+beside_an_array
+who_only_looks_is_waited_for
+foreign_tables
+logical_partitions
+kernel_and_table_differ
+locks
+killed_and_run_again
+sectors_of_4096_bytes
+more_than_two_tebibytes
+
+echo "partitioner: $nChecks checks, $nFailed failed"
+[ "$nFailed" -eq 0 ]

@@ -1,0 +1,75 @@
+#!/bin/sh
+# SPDX-License-Identifier: MIT
+# Healthy arrays of every level, both superblock formats, large and small; and arrays that are none.
+# disks: 4
+# size: 6G
+# timeout: 120
+# shellcheck source=SCRIPTDIR/../lib.sh
+. /appliance/lib.sh
+plan 17
+
+partition_disks '64M 64M 64M' sda sdb sdc sdd
+
+# level_case NAME LEVEL WORD FORMAT MEMBER...
+level_case() {
+    name=$1
+    level=$2
+    word=$3
+    format=$4
+    shift 4
+    nodes=
+    lines=
+    for member in "$@"; do
+        nodes="$nodes /dev/$member"
+        lines="$member:Normal $lines"
+    done
+    # shellcheck disable=SC2086  # lists of words
+    make_array 2 -e "$format" --level="$level" --raid-devices=$# --assume-clean $nodes
+    # shellcheck disable=SC2086
+    check_status "$name" 2 clean NORMAL None "$word" $lines
+    # shellcheck disable=SC2086
+    drop_array 2 $nodes
+}
+
+level_case 'RAID 0 of two' raid0 'RAID 0' 1.2 sda1 sdb1
+level_case 'RAID 0 of four' raid0 'RAID 0' 1.0 sda1 sdb1 sdc1 sdd1
+level_case 'RAID 1 of two' raid1 'RAID 1' 1.2 sda1 sdb1
+level_case 'RAID 1 of four with a 0.90 superblock' raid1 'RAID 1' 0.90 sda1 sdb1 sdc1 sdd1
+level_case 'RAID 4 has no word' raid4 '' 1.2 sda1 sdb1 sdc1
+level_case 'RAID 5 of three' raid5 'RAID 5' 1.2 sda1 sdb1 sdc1
+level_case 'RAID 5 with a 0.90 superblock' raid5 'RAID 5' 0.90 sda1 sdb1 sdc1 sdd1
+level_case 'RAID 6 of four' raid6 'RAID 6' 1.2 sda1 sdb1 sdc1 sdd1
+level_case 'RAID 10 of four' raid10 'RAID_10' 1.2 sda1 sdb1 sdc1 sdd1
+level_case 'linear of two' linear JBOD 1.2 sda1 sdb1
+level_case 'linear with a 0.90 superblock' linear JBOD 0.90 sda1 sdb1 sdc1
+
+# A 64 MiB partition under a 0.90 superblock gives its last 64 KiB, and no more.
+make_array 0 -e 0.90 --level=1 --raid-devices=2 --assume-clean /dev/sda2 /dev/sdb2
+report 0 NORMAL None 'RAID 1' 67043328 sdb2:Normal sda2:Normal >"$EXPECTED"
+check_run 'the size of a small mirror to the byte' 0 arrayctl status 0
+drop_array 0 /dev/sda2 /dev/sdb2
+
+make_array 12 -e 1.2 --level=1 --raid-devices=2 --assume-clean /dev/sdc4 /dev/sdd4
+check_status 'a mirror of more than 4 GiB' 12 clean NORMAL None 'RAID 1' sdd4:Normal sdc4:Normal
+drop_array 12 /dev/sdc4 /dev/sdd4
+
+make_array 3 -e 1.2 --level=0 --raid-devices=4 /dev/sda4 /dev/sdb4 /dev/sdc4 /dev/sdd4
+check_status 'a stripe of more than 16 GiB' 3 clean NORMAL None 'RAID 0' \
+    sdd4:Normal sdc4:Normal sdb4:Normal sda4:Normal
+drop_array 3 /dev/sda4 /dev/sdb4 /dev/sdc4 /dev/sdd4
+
+check_not_found 'an array without a node' 7
+
+must mknod /dev/md9 b 9 9
+check_not_found 'a node without an array' 9
+
+# One member of two: the driver holds it, but does not start what it belongs to.
+make_array 5 -e 1.2 --level=1 --raid-devices=2 --assume-clean /dev/sda3 /dev/sdb3
+must mdadm --stop /dev/md5
+must mknod /dev/md5 b 9 5
+echo 'ARRAY /dev/md5 name=appliance:5' >/etc/mdadm/mdadm.conf
+must mdadm --incremental --no-degraded /dev/sda3
+grep -q '^md5 : inactive' /proc/mdstat || abort "md5 is not inactive: $(cat /proc/mdstat)"
+check_not_found 'an inactive array' 5
+
+finish
