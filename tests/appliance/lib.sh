@@ -11,6 +11,9 @@ SEEN=/tmp/seen
 ERRORS=/tmp/errors
 SYSLOG=/var/log/messages
 
+# Long enough for a busy host; nobody waits longer than the condition takes.
+SETTLE_SECONDS=30
+
 # How many verdicts this file gives. Fewer or more mean that it went astray.
 plan() {
     echo "plan $1"
@@ -81,7 +84,7 @@ partition_disks() {
 # pull_disk sdd: as if the drive was taken out of its bay.
 pull_disk() {
     echo 1 >"/sys/block/$1/device/delete"
-    wait_for 5 test ! -e "/sys/block/$1" || abort "$1 cannot be pulled"
+    wait_for "$SETTLE_SECONDS" test ! -e "/sys/block/$1" || abort "$1 cannot be pulled"
 }
 
 # --- arrays ------------------------------------------------------------------------------------
@@ -102,7 +105,7 @@ drop_array() {
     number=$1
     shift
     must mdadm --stop "/dev/md$number"
-    wait_for 5 array_is_gone "$number" || abort "md$number does not go away"
+    wait_for "$SETTLE_SECONDS" array_is_gone "$number" || abort "md$number does not go away"
     for member in "$@"; do
         must mdadm --zero-superblock "$member"
     done
@@ -112,7 +115,7 @@ drop_array() {
 # it; so the member's own word decides.
 fail_member() {
     mdadm "/dev/md$1" --fail "/dev/$2" >/dev/null 2>&1
-    wait_for 5 grep -q faulty "/sys/block/md$1/md/dev-$2/state" || abort "$2 of md$1 does not fail"
+    wait_for "$SETTLE_SECONDS" grep -q faulty "/sys/block/md$1/md/dev-$2/state" || abort "$2 of md$1 does not fail"
 }
 
 # break_array MD MEMBER: fails a member that the driver cannot do without. It keeps the member and
@@ -123,7 +126,7 @@ break_array() {
 }
 
 wait_for_broken() {
-    wait_for 5 grep -q broken "/sys/block/md$1/md/array_state" || abort "md$1 is not broken"
+    wait_for "$SETTLE_SECONDS" grep -q broken "/sys/block/md$1/md/array_state" || abort "md$1 is not broken"
 }
 
 # Keeps a resync from ending before it was looked at, and lets it go on.
@@ -191,7 +194,7 @@ check_status() {
     number=$2
     state=$3
     shift 3
-    if ! wait_for 10 mdadm_state_is "$number" "$state"; then
+    if ! wait_for "$SETTLE_SECONDS" mdadm_state_is "$number" "$state"; then
         fail "$name" "the array is not what the test wants: mdadm expected '$state'" \
             "seen '$(mdadm_state "$number")'"
         return

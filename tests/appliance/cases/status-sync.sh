@@ -42,7 +42,7 @@ check_status 'a mirror that waits to rebuild' 2 'clean, degraded, resyncing (DEL
 
 fast_resync
 check_status 'a mirror that is whole again' 1 clean NORMAL None 'RAID 1' sdc1:Normal sdb1:Normal
-mdadm_state_is 2 clean || wait_for 20 mdadm_state_is 2 clean || abort "md2 does not get whole"
+wait_for "$SETTLE_SECONDS" mdadm_state_is 2 clean || abort "md2 does not get whole"
 drop_array 1 /dev/sdb1 /dev/sdc1
 drop_array 2 /dev/sdb2 /dev/sdc2
 slow_resync
