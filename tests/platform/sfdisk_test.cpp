@@ -335,6 +335,8 @@ TEST_F(SfdiskTest, MalformedWordsAreRefusedWithOneLine)
         {{"-N1", "-j1", "-z1", "-tfd", disk}, "these options make no command"},
         {{"-N1", "-l", "-uS", "-j1", "-z1", "-tfd", disk}, "these options make no command"},
         {{"-N1", "-uS", "-j-1", "-z1", "-tfd", disk}, "bad value '-1' of option '-j'"},
+        {{"-N1", "-uS", "-j18446744073709551616", "-z1", "-tfd", disk},
+         "bad value '18446744073709551616' of option '-j'"},
         {{"-N1", "-uS", "-j1", "-z0", "-tfd", disk}, "bad value '0' of option '-z'"},
         {{"-N1", "-uS", "-j1", "-z-2", "-tfd", disk}, "bad value '-2' of option '-z'"},
         {{"-N1", "-uS", "-j1", "-z99999999999999999999", "-tfd", disk},

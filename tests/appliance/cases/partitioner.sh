@@ -1,37 +1,51 @@
 #!/bin/sh
 # SPDX-License-Identifier: MIT
 #
-# The partitioner on real disks: what the kernel knows when it exits, and that partitions in use
-# are left alone. Runs inside the appliance with four blank disks; sdd is also the one that others
-# lock and kill it on. Read back with sysfs, /proc/partitions, the stock sfdisk, blkid and mount.
-set -u
+# The partitioner on real disks: what the kernel knows when it exits, and that partitions in use are
+# left alone. Read back with sysfs, /proc/partitions, the stock sfdisk, blkid, wipefs and e2fsck.
+# disks: 4
+# size: 6G
+# timeout: 180
+# shellcheck disable=SC2317  # check and must call the functions
+# shellcheck source=SCRIPTDIR/../lib.sh
+. /appliance/lib.sh
+plan 11
+checks=0
+failures=0
 
-nChecks=0
-nFailed=0
-szErr=/tmp/partitioner.err
+# verdict NAME: one for all the checks since the one before.
+verdict() {
+    if [ "$failures" -eq 0 ]; then
+        pass "$1 ($checks checks)"
+    else
+        fail "$1" "$failures of $checks checks failed"
+    fi
+    checks=0
+    failures=0
+}
 
 check() {
-    szWhat=$1
+    what=$1
     shift
-    nChecks=$((nChecks + 1))
-    if "$@"; then
-        return
+    checks=$((checks + 1))
+    : >"$ERRORS"
+    if ! "$@"; then
+        failures=$((failures + 1))
+        echo "wrong: $what: $*"
+        show_file "on standard error" "$ERRORS"
     fi
-    nFailed=$((nFailed + 1))
-    echo "FAILED: $szWhat: $*"
-    cat "$szErr" 2>/dev/null
 }
 
 does() {
-    sfdisk "$@" 2>"$szErr" && [ ! -s "$szErr" ]
+    sfdisk "$@" 2>"$ERRORS" && [ ! -s "$ERRORS" ]
 }
 
 # The line it must say, then the command.
 refuses() {
-    szLine=$1
+    line=$1
     shift
-    sfdisk "$@" 2>"$szErr" && return 1
-    [ "$(cat "$szErr")" = "sfdisk: $szLine" ]
+    sfdisk "$@" 2>"$ERRORS" && return 1
+    [ "$(cat "$ERRORS")" = "sfdisk: $line" ]
 }
 
 creates() {
@@ -40,7 +54,8 @@ creates() {
 
 # Disk, number, start, size: the kernel's numbers, the node, and the line in /proc/partitions.
 knows() {
-    [ "$(cat "/sys/block/$1/$1$2/start" "/sys/block/$1/$1$2/size" 2>&1 | tr '\n' ' ')" = "$3 $4 " ] &&
+    [ "$(cat "/sys/block/$1/$1$2/start" 2>&1)" = "$3" ] &&
+        [ "$(cat "/sys/block/$1/$1$2/size" 2>&1)" = "$4" ] &&
         [ -b "/dev/$1$2" ] && grep -q " $1$2\$" /proc/partitions
 }
 
@@ -50,10 +65,6 @@ forgot() {
 
 table_has() {
     sfdisk.stock --dump "/dev/$1" | grep -q "^/dev/$1$2 : start= *$3, size= *$4, type=$5\$"
-}
-
-table_lacks() {
-    ! sfdisk.stock --dump "/dev/$1" | grep -q "^/dev/$1$2 :"
 }
 
 label_is() {
@@ -69,8 +80,8 @@ is_not() {
 }
 
 stock_table() {
-    printf '%s\n' "$2" | sfdisk.stock -q --no-reread --wipe always "/dev/$1" >/dev/null 2>&1
-    blockdev --rereadpt "/dev/$1"
+    echo "$2" >/tmp/table
+    must sh -c "sfdisk.stock -q --wipe always /dev/$1 </tmp/table"
 }
 
 layout_of_the_appliance() {
@@ -93,8 +104,10 @@ layout_of_the_appliance() {
 }
 
 beside_a_mounted_partition() {
-    mkfs.ext4 -q /dev/sda1 && mount /dev/sda1 /mnt && echo precious >/mnt/file
-    check "the kernel reads no whole table now" is_not blockdev --rereadpt /dev/sda
+    must mkfs.ext4 -q /dev/sda1
+    must mount /dev/sda1 /mnt
+    echo precious >/mnt/file
+    check "the kernel reads no whole table now" is_not blockdev --rereadpt /dev/sda 2>/dev/null
     check "create 3 beside a mounted 1" creates sda 3 260352 1000000 83
     check "3 is known at once" knows sda 3 9437184 1000000
     check "sign beside a mounted 1" does -M1 /dev/sda
@@ -109,7 +122,7 @@ beside_a_mounted_partition() {
     check "1 exists" refuses "partition 1 of /dev/sda exists already" \
         -N1 -uS -q -f -j2048 -z4980480 -tfd -F /dev/sda
     check "the file is there" [ "$(cat /mnt/file)" = precious ]
-    umount /mnt
+    must umount /mnt
     check "file system is whole" e2fsck -fn /dev/sda1 >/dev/null 2>&1
 }
 
@@ -117,19 +130,21 @@ beside_an_array() {
     check "sign sdb" does -M1 /dev/sdb
     check "sdb1" creates sdb 1 2048 4980480 fd
     check "sdb2" creates sdb 2 0 4194304 fd
-    mdadm -C /dev/md0 -e 0.9 -amd -R -l1 -n2 /dev/sda1 /dev/sdb1 >/dev/null 2>&1
-    check "array" grep -q '^md0 : active raid1' /proc/mdstat
+    make_array 0 -e 0.9 -l1 -n2 /dev/sda1 /dev/sdb1
     check "a member is in use" refuses "partition 1 of /dev/sdb is in use" \
         --fast-delete -1 /dev/sdb
     check "sdb2 came back" knows sdb 2 4982528 4194304
     check "data partition beside the array" creates sdb 3 260352 -1 fd
-    pvcreate -q /dev/sdb3 >/dev/null 2>&1 && vgcreate -q group /dev/sdb3 >/dev/null 2>&1 &&
-        lvcreate -q -L 64M -n volume group >/dev/null 2>&1
+    must pvcreate /dev/sdb3
+    must vgcreate group /dev/sdb3
+    must lvcreate -L 64M -n volume group
     check "a volume is in use" refuses "partition 3 of /dev/sdb is in use" \
         --fast-delete 3:128 /dev/sdb
-    lvremove -q -f group >/dev/null 2>&1 && vgremove -q -f group >/dev/null 2>&1
+    must lvremove -f group
+    must vgremove -f group
     check "no volume, no use" does --fast-delete 3:128 /dev/sdb
-    mdadm -q -S /dev/md0
+    must mdadm --stop /dev/md0
+    wait_for 5 array_is_gone 0
     check "no array, no use" does --fast-delete -1 /dev/sdb
     check "sdb1 is gone" forgot sdb 1
     check "sdb2 is gone" forgot sdb 2
@@ -138,7 +153,10 @@ beside_an_array() {
 
 who_only_looks_is_waited_for() {
     check "sdb1" creates sdb 1 2048 10000 fd
-    sleep 0.4 </dev/sdb1 &
+    (
+        exec </dev/sdb1
+        sleep 0.4
+    ) &
     check "a short look" does --fast-delete -1 /dev/sdb
     wait
     check "sdb1 is gone" forgot sdb 1
@@ -149,11 +167,12 @@ foreign_tables() {
 start=2048, size=100000
 start=104448, size=100000'
     check "gpt is known" knows sdc 2 104448 100000
-    mkfs.ext4 -q /dev/sdc2 && mount /dev/sdc2 /mnt
+    must mkfs.ext4 -q /dev/sdc2
+    must mount /dev/sdc2 /mnt
     check "a mounted gpt" refuses "/dev/sdc is in use" -M1 /dev/sdc
     check "a mounted gpt stays" label_is sdc gpt
     check "its partitions stay" knows sdc 1 2048 100000
-    umount /mnt
+    must umount /mnt
     check "no partition in a gpt" refuses "/dev/sdc has no ms-dos partition table" \
         -N3 -uS -j0 -z100 -tfd /dev/sdc
     check "sign a gpt" does -M1 /dev/sdc
@@ -163,9 +182,11 @@ start=104448, size=100000'
     blockdev --rereadpt /dev/sdc
     check "gpt 1 stays gone" forgot sdc 1
 
-    wipefs -qa /dev/sdc && mkfs.ext4 -qF /dev/sdc && mount /dev/sdc /mnt
+    must wipefs -qa /dev/sdc
+    must mkfs.ext4 -qF /dev/sdc
+    must mount /dev/sdc /mnt
     check "a mounted disk" refuses "/dev/sdc is in use" -M1 /dev/sdc
-    umount /mnt
+    must umount /mnt
     check "the file system is whole" e2fsck -fn /dev/sdc >/dev/null 2>&1
     check "sign a file system" does -M1 /dev/sdc
     check "no ghost of it" only_dos sdc
@@ -179,12 +200,10 @@ logical_partitions() {
 6: start=14336, size=2048, type=83
 7: start=18432, size=4096, type=83'
     check "7 is known" knows sdc 7 18432 4096
-    sleep 30 </dev/sdc7 &
-    nHolder=$!
+    exec 7</dev/sdc7
     check "7 would move" refuses "partition 7 of /dev/sdc is in use" --fast-delete 6:6 /dev/sdc
     check "6 stays" knows sdc 6 14336 2048
-    kill "$nHolder"
-    wait "$nHolder" 2>/dev/null
+    exec 7<&-
     check "delete 6" does --fast-delete 6:6 /dev/sdc
     check "7 is 6 now" knows sdc 6 18432 4096
     check "there is no 7" forgot sdc 7
@@ -192,8 +211,8 @@ logical_partitions() {
     blockdev --rereadpt /dev/sdc
     check "the kernel reads the same" knows sdc 6 18432 4096
     check "delete 3:128" does --fast-delete 3:128 /dev/sdc
-    for nPart in 4 5 6; do
-        check "$nPart is gone" forgot sdc "$nPart"
+    for part in 4 5 6; do
+        check "$part is gone" forgot sdc "$part"
     done
     check "1 stays" knows sdc 1 2048 2048
 }
@@ -218,9 +237,9 @@ locks() {
     check "sign" does -M1 /dev/sdd
     flock /dev/sdd sleep 1 &
     sleep 0.2
-    nBefore=$(cut -d. -f1 /proc/uptime)
+    before=$(cut -d. -f1 /proc/uptime)
     check "a locked disk is waited for" creates sdd 1 2048 2048 fd
-    check "not for long" [ $(($(cut -d. -f1 /proc/uptime) - nBefore)) -le 4 ]
+    check "not for long" [ $(($(cut -d. -f1 /proc/uptime) - before)) -le 4 ]
     wait
     check "made" knows sdd 1 2048 2048
     sfdisk -N2 -uS -j0 -z10 -tfd /dev/sdd &
@@ -233,87 +252,96 @@ locks() {
 # The last thing before the kernel learns of it is that the disk has it.
 synced() {
     strace -o /tmp/trace -e trace=write,pwrite64,fsync,ioctl sfdisk -N3 -uS -j0 -z10 -tfd /dev/sdd
-    [ "$(grep -E 'write|fsync|BLKPG' /tmp/trace | tail -n 2 | cut -d'(' -f1 | tr '\n' ' ')" = "fsync ioctl " ]
+    last=$(grep -E 'write|fsync|BLKPG' /tmp/trace | tail -n 2 | cut -d'(' -f1)
+    [ "$last" = "fsync
+ioctl" ]
 }
 
 killed_and_run_again() {
-    for szPause in 0.000 0.005 0.010 0.015 0.020 0.025 0.030 0.040 0.050; do
-        for szStep in "--fast-delete -1" -M1 "-N1 -uS -j2048 -z2048 -tfd"; do
+    for pause in 0.000 0.005 0.010 0.015 0.020 0.025 0.030 0.040 0.050; do
+        for step in "--fast-delete -1" -M1 "-N1 -uS -j2048 -z2048 -tfd"; do
             # shellcheck disable=SC2086  # words, not one word
-            sfdisk $szStep /dev/sdd 2>/dev/null &
-            nKilled=$!
-            sleep "$szPause"
-            kill -KILL "$nKilled" 2>/dev/null
-            wait "$nKilled" 2>/dev/null
-            check "$szPause $szStep: delete" does --fast-delete -1 /dev/sdd
-            check "$szPause $szStep: sign" does -M1 /dev/sdd
-            check "$szPause $szStep: create" creates sdd 1 2048 2048 fd
-            check "$szPause $szStep: known" knows sdd 1 2048 2048
-            check "$szPause $szStep: in the table" table_has sdd 1 2048 2048 fd
+            sfdisk $step /dev/sdd 2>/dev/null &
+            killed=$!
+            sleep "$pause"
+            kill -KILL "$killed" 2>/dev/null
+            wait "$killed" 2>/dev/null
+            check "$pause $step: delete" does --fast-delete -1 /dev/sdd
+            check "$pause $step: sign" does -M1 /dev/sdd
+            check "$pause $step: create" creates sdd 1 2048 2048 fd
+            check "$pause $step: known" knows sdd 1 2048 2048
+            check "$pause $step: in the table" table_has sdd 1 2048 2048 fd
         done
     done
 }
 
-# Prints the name of the disk that the kernel's test driver makes with these parameters.
+# The name of the disk that the kernel's test driver made.
+debug_disk_name() {
+    for folder in /sys/bus/pseudo/drivers/scsi_debug/adapter*/host*/target*/*/block/*; do
+        [ -b "/dev/${folder##*/}" ] && echo "${folder##*/}" && return
+    done
+    return 1
+}
+
+# debug_disk PARAMETER...: sets disk.
 debug_disk() {
-    szBefore=$(ls /sys/block)
-    modprobe scsi_debug per_host_store=1 dev_size_mb=16 "$@" || return
-    for szHost in /sys/class/scsi_host/host*; do
-        [ "$(cat "$szHost/proc_name")" = scsi_debug ] && echo '- - -' >"$szHost/scan"
+    must modprobe scsi_debug per_host_store=1 dev_size_mb=16 "$@"
+    for host in /sys/class/scsi_host/host*; do
+        [ "$(cat "$host/proc_name")" = scsi_debug ] && echo '- - -' >"$host/scan"
     done
-    nTenths=0
-    while [ "$nTenths" -lt 50 ]; do
-        for szName in $(ls /sys/block); do
-            case " $(echo "$szBefore" | tr '\n' ' ') " in
-            *" $szName "*) ;;
-            *) [ -b "/dev/$szName" ] && echo "$szName" && return ;;
-            esac
-        done
-        nTenths=$((nTenths + 1))
-        sleep 0.1
-    done
+    wait_for 5 debug_disk_name || abort "no disk of scsi_debug"
+    disk=$(debug_disk_name)
 }
 
 sectors_of_4096_bytes() {
-    szDisk=$(debug_disk sector_size=4096)
-    check "the disk has large sectors" [ "$(cat "/sys/block/$szDisk/queue/logical_block_size")" = 4096 ]
-    check "sign" does -M1 "/dev/$szDisk"
-    check "half a sector" refuses "partition 1 does not lie on whole sectors of /dev/$szDisk" \
-        -N1 -uS -j63 -z8000 -tfd "/dev/$szDisk"
-    check "create 1" creates "$szDisk" 1 2048 8192 fd
-    check "1 is known" knows "$szDisk" 1 2048 8192
-    check "create 2" creates "$szDisk" 2 0 -1 82
-    check "2 is known" knows "$szDisk" 2 10240 $(($(cat "/sys/block/$szDisk/size") - 10240))
-    check "line" [ "$(sfdisk -l -uS -N1 "/dev/$szDisk")" = "/dev/${szDisk}1 2048 10239 8192 fd" ]
-    check "stock reads it" table_has "$szDisk" 1 256 1024 fd
-    check "delete" does --fast-delete -1 "/dev/$szDisk"
-    check "1 is gone" forgot "$szDisk" 1
-    modprobe -r scsi_debug
+    debug_disk sector_size=4096
+    check "large sectors" grep -qx 4096 "/sys/block/$disk/queue/logical_block_size"
+    check "sign" does -M1 "/dev/$disk"
+    check "half a sector" refuses "partition 1 does not lie on whole sectors of /dev/$disk" \
+        -N1 -uS -j63 -z8000 -tfd "/dev/$disk"
+    check "create 1" creates "$disk" 1 2048 8192 fd
+    check "1 is known" knows "$disk" 1 2048 8192
+    check "create 2" creates "$disk" 2 0 -1 82
+    check "2 is known" knows "$disk" 2 10240 $(($(cat "/sys/block/$disk/size") - 10240))
+    check "line" [ "$(sfdisk -l -uS -N1 "/dev/$disk")" = "/dev/${disk}1 2048 10239 8192 fd" ]
+    check "stock reads it" table_has "$disk" 1 256 1024 fd
+    check "delete" does --fast-delete -1 "/dev/$disk"
+    check "1 is gone" forgot "$disk" 1
+    must rmmod scsi_debug
 }
 
 more_than_two_tebibytes() {
-    szDisk=$(debug_disk virtual_gb=3000)
-    check "the disk is large" [ "$(cat "/sys/block/$szDisk/size")" -gt 4294967296 ]
-    check "sign" does -M1 "/dev/$szDisk"
-    check "create 1" creates "$szDisk" 1 2048 -1 fd
-    check "up to 2 TiB" knows "$szDisk" 1 2048 4294965248
+    debug_disk virtual_gb=3000
+    check "the disk is large" [ "$(cat "/sys/block/$disk/size")" -gt 4294967296 ]
+    check "sign" does -M1 "/dev/$disk"
+    check "create 1" creates "$disk" 1 2048 -1 fd
+    check "up to 2 TiB" knows "$disk" 1 2048 4294965248
     check "no more" refuses \
-        "partition 2 does not fit on /dev/$szDisk: it begins at sector 4294967296 of 4294967296" \
-        -N2 -uS -j0 -z-1 -tfd "/dev/$szDisk"
-    modprobe -r scsi_debug
+        "partition 2 does not fit on /dev/$disk: it begins at sector 4294967296 of 4294967296" \
+        -N2 -uS -j0 -z-1 -tfd "/dev/$disk"
+    must rmmod scsi_debug
 }
 
 layout_of_the_appliance
+verdict 'the layout of the appliance'
 beside_a_mounted_partition
+verdict 'beside a mounted partition'
 beside_an_array
+verdict 'beside an array and a volume'
 who_only_looks_is_waited_for
+verdict 'who only looks is waited for'
 foreign_tables
+verdict 'foreign tables and whole disks in use'
 logical_partitions
+verdict 'logical partitions'
 kernel_and_table_differ
+verdict 'the table and the kernel differ'
 locks
+verdict 'locks, and data on the disk'
 killed_and_run_again
+verdict 'killed and run again'
 sectors_of_4096_bytes
+verdict 'sectors of 4096 bytes'
 more_than_two_tebibytes
-
-echo "partitioner: $nChecks checks, $nFailed failed"
-[ "$nFailed" -eq 0 ]
+verdict 'a disk of more than 2 TiB'
+finish
