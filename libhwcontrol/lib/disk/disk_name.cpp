@@ -31,11 +31,6 @@ bool IsMmc(const char *szName)
     return strstr(szName, MMC_NAME) != nullptr;
 }
 
-const char *SkipPrefix(const char *szName, std::string_view prefix)
-{
-    return std::string_view(szName).starts_with(prefix) ? szName + prefix.size() : szName;
-}
-
 bool IsDecimal(char ch)
 {
     return ch >= '0' && ch <= '9';
@@ -79,7 +74,7 @@ int DiskIndexGet(const char *szName)
         return -1;
     }
     u32 index = ~0U;
-    const char *pch = SkipPrefix(SkipPrefix(szName, DEV_PREFIX), SD_PREFIX);
+    const char *pch = NLIBCStrSkipPrefix(NLIBCStrSkipPrefix(szName, DEV_PREFIX), SD_PREFIX);
     for (; *pch >= 'a' && *pch <= 'z'; pch++) {
         index = (index + 1U) * 26U + static_cast<u32>(*pch - 'a');
     }

@@ -4,10 +4,10 @@
 #include "hwcontrol/disk_name.h"
 #include "nurocore/error.h"
 #include "nurocore/log.h"
+#include "nurocore/text.h"
 
 #include <array>
 #include <cstring>
-#include <string_view>
 
 namespace
 {
@@ -28,11 +28,6 @@ constexpr std::array<u32, 10> CONTAINERS = {
     DISK_CONTAINER_USB,       // OTHER_DEVICE
     CONTAINER_NONE,           // MMC_DEVICE
 };
-
-const char *SkipPrefix(const char *szText, std::string_view prefix)
-{
-    return std::string_view(szText).starts_with(prefix) ? szText + prefix.size() : szText;
-}
 
 // Kept: a parsed path tells other containers than DiskContainerFromPortType for the types that it
 // refuses. The boot device and isd disks count as internal, an MMC card as USB.
@@ -88,12 +83,12 @@ int DiskPathParse(const char *szPath, DISK_PATH_INFO *pInfo)
         NLIBCLog(LOG_ERR, "bad paramters: unknown device, disk path: %s", szPath);
         return -1;
     }
-    const char *const szName = SkipPrefix(szPath, "/dev/");
+    const char *const szName = NLIBCStrSkipPrefix(szPath, "/dev/");
     char szDisk[NAME_SIZE];
     pInfo->partitionNum = DiskPartitionNumGet(szName, szDisk, NAME_SIZE);
     pInfo->container = ParsedContainer(type);
     if (type == EUNIT_DEVICE) {
-        UnitDiskPlace(szPath, SkipPrefix(szName, "sd"), pInfo);
+        UnitDiskPlace(szPath, NLIBCStrSkipPrefix(szName, "sd"), pInfo);
     } else {
         pInfo->diskIndex = DiskIndexGet(szPath) + 1;
         pInfo->unitIndex = 0;

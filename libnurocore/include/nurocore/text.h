@@ -6,6 +6,8 @@
 #include "nurocore/szlist.h"
 #include "nurocore/types.h"
 
+#include <string_view>
+
 // Copies szSrc without the white space around it (blank, tab, line feed, carriage return) and
 // without one pair of enclosing double quotes to szDst, which has room for strlen(szSrc) + 1
 // bytes; works in place when szDst is NULL or szSrc. Returns the length left, 0 or more; -1 with
@@ -19,6 +21,9 @@ char *NLIBCStrSepNonEmpty(char **pszCursor, const char *szDelims);
 // Pushes every field of szText that is not empty onto the list. Returns how many, 0 for none, -1
 // on failure: ERR_BAD_PARAMETER, ERR_OUT_OF_MEMORY, or the code of the push.
 int NLIBCStrTok(const char *szText, const char *szDelims, PNLIBSZLIST *ppList);
+
+// szText behind the prefix when it begins with it, else szText.
+const char *NLIBCStrSkipPrefix(const char *szText, std::string_view prefix);
 
 // The decimal number that szText begins with, as strtol reads it (white space, sign, then digits
 // up to the first other character; 0 without digits), clamped to 32 bits on every platform.

@@ -85,6 +85,11 @@ int NLIBCStrTok(const char *szText, const char *szDelims, PNLIBSZLIST *ppList)
     return nField;
 }
 
+const char *NLIBCStrSkipPrefix(const char *szText, std::string_view prefix)
+{
+    return std::string_view(szText).starts_with(prefix) ? szText + prefix.size() : szText;
+}
+
 i32 NLIBCStrToI32(const char *szText)
 {
     const i64 value = strtol(szText, nullptr, 10);

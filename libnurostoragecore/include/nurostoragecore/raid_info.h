@@ -1,0 +1,73 @@
+// SPDX-License-Identifier: MIT
+#pragma once
+
+// The state of an md array, asked of the driver. Nothing here changes it.
+
+#include "nurocore/types.h"
+#include "nurostoragecore/raid_disk.h"
+
+// The kernel's header names array states that the house does not use; it comes with its types.
+#include <linux/types.h>
+
+#include <linux/raid/md_u.h>
+
+// Single bits, so that a set of levels is tested with one mask. 0 is a level the house has not.
+constexpr u32 RAID_LEVEL_0 = 1;
+constexpr u32 RAID_LEVEL_1 = 2;
+constexpr u32 RAID_LEVEL_5 = 4;
+constexpr u32 RAID_LEVEL_6 = 8;
+constexpr u32 RAID_LEVEL_10 = 16;
+constexpr u32 RAID_LEVEL_LINEAR = 32;
+
+constexpr u32 RAID_STATUS_NORMAL = 1;
+constexpr u32 RAID_STATUS_DEGRADE = 2;
+constexpr u32 RAID_STATUS_CRASHED = 4;
+
+constexpr u32 REBUILD_NONE = 0;
+constexpr u32 REBUILD_PROGRESSING = 1;
+constexpr u32 REBUILD_WAITING = 2;
+
+struct RAID_REBUILD_STATUS {
+    u32 state; // one of REBUILD_*
+    u64 done;  // both as the driver counts them, 0 when nothing runs
+    u64 total;
+};
+
+constexpr int RAID_UUID_SIZE = 64;
+
+struct RAID_INFO {
+    i32 nMd; // N of /dev/mdN
+    char szPath[RAID_PATH_SIZE];
+    char szUuid[RAID_UUID_SIZE]; // empty unless a caller sets it
+    u32 level;                   // one of RAID_LEVEL_*, 0 for any other md level
+    i32 majorVersion;            // of the superblock: 0 for 0.90, 1 for 1.x
+    i32 minorVersion;
+    u32 status; // one of RAID_STATUS_*
+    RAID_REBUILD_STATUS rebuild;
+    u64 arraySize;  // bytes
+    u64 deviceSize; // bytes used on each member; 0 for RAID 0 and linear
+    i32 nRaidDisks; // slots
+    i32 nActiveDisks;
+    i32 nSpareDisks;
+    RAID_DISK *pDisks; // owned by the record
+};
+
+// The array behind "/dev/md%d". Returns 1 with a record that the caller frees with RAIDInfoFree, 0
+// when the array is absent, -1 on failure: ERR_BAD_PARAMETER, ERR_BAD_FORMAT for another path,
+// ERR_OUT_OF_MEMORY, ERR_OPEN_FAILED, or the code of the request that failed. An inactive array
+// gives -1 with ERR_SYSCALL_FAILED.
+int RAIDInfoGet(const char *szMd, RAID_INFO **ppInfo);
+
+// NULL is ignored.
+void RAIDInfoFree(RAID_INFO *pInfo);
+
+// One request each to the open array. They return 0, or -1 with ERR_BAD_PARAMETER for NULL,
+// ERR_DEVICE_ABSENT for ENODEV, ERR_INTERRUPTED for EINTR and ERR_SYSCALL_FAILED otherwise, save
+// that RAIDIoctlInfo never leaves ERR_DEVICE_ABSENT and that size and rebuild know no EINTR.
+int RAIDIoctlInfo(int fd, mdu_array_info_t *pInfo);
+int RAIDIoctlSize(int fd, u64 *pcbArray);
+int RAIDIoctlStatus(int fd, u32 *pStatus);
+int RAIDRebuildStatusGet(int fd, RAID_REBUILD_STATUS *pRebuild);
+
+// What each member contributes, in 512-byte sectors, from sysfs; 0 also when it cannot be read.
+u64 RAIDComponentSizeGet(int fd);

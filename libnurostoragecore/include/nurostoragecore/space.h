@@ -1,0 +1,18 @@
+// SPDX-License-Identifier: MIT
+#pragma once
+
+// The runner of tools that change disks. What such a tool writes to standard error is the record of
+// failed storage operations: one line a command in /var/log/space_operation_error.log.
+
+#include <cstdio>
+
+// Runs szPath with the arguments that follow, up to a NULL, and logs its standard error. Returns
+// the raw wait status: 0 for exit status 0, exit status * 256 otherwise (32512 when it cannot be
+// executed); -1 with the code of the pipe stream, with ERR_BAD_PARAMETER for NULL, without a code
+// when there is no memory for the arguments.
+[[gnu::sentinel]] int SpaceExecl(const char *szPath, ...);
+
+// Reads the stream to its end and, when there was anything, appends a line with the time and
+// szCommand (NULL is an empty text). Returns 0, or -1: ERR_BAD_PARAMETER for a NULL stream, no code
+// when the log cannot be opened.
+int SpaceErrorLog(FILE *pStream, const char *szCommand);

@@ -1,0 +1,186 @@
+// SPDX-License-Identifier: MIT
+#include "nurostoragecore/partition_layout.h"
+
+#include "hwcontrol/disk_name.h"
+#include "nurocore/conf.h"
+#include "nurocore/error.h"
+#include "nurocore/handle.h"
+#include "nurocore/io.h"
+#include "nurocore/log.h"
+#include "nurocore/text.h"
+
+#include <array>
+#include <cstdio>
+#include <cstdlib>
+#include <unistd.h>
+
+namespace
+{
+
+constexpr int NAME_SIZE = 128;
+constexpr int PATH_SIZE = 512;
+constexpr int LINE_SIZE = 129; // a line of at most 128 bytes
+constexpr PARTITION_PLACE ANYWHERE(u32 type)
+{
+    return {.start = PARTITION_NOT_FIXED, .size = PARTITION_NOT_FIXED, .type = type};
+}
+
+constexpr u32 LINUX = 0x83;
+constexpr u32 SWAP = 0x82;
+constexpr u32 RAID = 0xfd;
+
+// The product's own values, the odd ones too: there is no version 4, 3 and 5 are without RAID only,
+// and with built-in storage 7 and 8 are alike. The first row that fits is taken.
+constexpr std::array<PARTITION_LAYOUT, 14> LAYOUTS = {{
+    {1, 0, 273042, 787185, 273042,
+     {{63, 273042, LINUX}, {273105, 787185, SWAP}, ANYWHERE(LINUX)}, 0},
+    {2, 0, 4980087, 1044225, 257040,
+     {{63, 4980087, LINUX}, {4980150, 1044225, SWAP}, ANYWHERE(LINUX)}, 0},
+    {3, 0, 530082, 787185, 16002,
+     {{63, 530082, LINUX}, {530145, 787185, SWAP}, ANYWHERE(LINUX)}, 0},
+    {5, 0, 722862, 594405, 16002,
+     {{63, 722862, LINUX}, {722925, 594405, SWAP}, ANYWHERE(LINUX)}, 0},
+    {6, 0, 4980087, 4192965, 257040,
+     {{63, 4980087, LINUX}, {4980150, 4192965, SWAP}, ANYWHERE(LINUX)}, 0},
+    {7, 0, 4980480, 4194304, 262144,
+     {{256, 4980480, LINUX}, {4980736, 4194304, SWAP}, ANYWHERE(LINUX)}, 0},
+    {8, 0, 4980480, 4194304, 260352,
+     {{2048, 4980480, LINUX}, {4982528, 4194304, SWAP}, ANYWHERE(LINUX)}, 0},
+    {1, 1, 1574307, 787185, 273105,
+     {{63, 1574307, RAID}, {1574370, 787185, RAID}, ANYWHERE(RAID)}, 0},
+    {2, 1, 4980087, 1044225, 257040,
+     {{63, 4980087, RAID}, {4980150, 1044225, RAID}, ANYWHERE(RAID)}, 0},
+    {6, 1, 4980087, 4192965, 257040,
+     {{63, 4980087, RAID}, {4980150, 4192965, RAID}, ANYWHERE(RAID)}, 0},
+    {7, 1, 4980480, 4194304, 262144,
+     {{256, 4980480, RAID}, {4980736, 4194304, RAID}, ANYWHERE(RAID)}, 0},
+    {8, 1, 4980480, 4194304, 260352,
+     {{2048, 4980480, RAID}, {4982528, 4194304, RAID}, ANYWHERE(RAID)}, 0},
+    {7, 0, 2097152, 5105569, 524288,
+     {{256, 2097152, LINUX}, {2097408, 5105569, LINUX}, {7202977, 524288, LINUX}}, 1},
+    {8, 0, 2097152, 5105569, 524288,
+     {{256, 2097152, LINUX}, {2097408, 5105569, LINUX}, {7202977, 524288, LINUX}}, 1},
+}};
+
+u32 IsBuildinStorage()
+{
+    return static_cast<u32>(NLIBCConfKeyIsYes("support_buildin_storage"));
+}
+
+// The number that an attribute's first line begins with.
+int SectorsRead(const char *szDirectory, const char *szAttr, u64 *pSectors)
+{
+    char szFile[PATH_SIZE + 8];
+    (void)snprintf(szFile, sizeof(szFile), "%s/%s", szDirectory, szAttr);
+    const STREAM_OWNER pFile(fopen(szFile, "r"));
+    if (pFile == nullptr) {
+        NLIBCErrSetHere(ERR_OPEN_FAILED);
+        return -1;
+    }
+    char szLine[LINE_SIZE];
+    if (NLIBCFgets(szLine, LINE_SIZE, pFile.get()) == nullptr) {
+        NLIBCErrSetHere(ERR_READ_FAILED);
+        return -1;
+    }
+    char *pchEnd = nullptr;
+    const u64 nSectors = strtoull(szLine, &pchEnd, 10);
+    if (pchEnd == szLine) {
+        NLIBCErrSetHere(ERR_READ_FAILED);
+        return -1;
+    }
+    *pSectors = nSectors;
+    return 0;
+}
+
+bool IsAt(const PARTITION_PLACE &place, const PARTITION_PLACE &expected)
+{
+    return place.start == expected.start && place.size == expected.size;
+}
+
+} // namespace
+
+int IsSupportRaid()
+{
+    static bool fAsked = false;
+    static int fSupportRaid = 0;
+    if (!fAsked) {
+        fSupportRaid = NLIBCConfKeyIsYes("supportraid");
+        fAsked = true;
+    }
+    return fSupportRaid;
+}
+
+int PartitionLayoutIndexGet(u32 version, int raid)
+{
+    const u32 wanted = version == 0 ? PARTITION_LAYOUT_NEWEST : version;
+    const u32 fBuildin = IsBuildinStorage();
+    for (size_t row = 0; row < LAYOUTS.size(); row++) {
+        const PARTITION_LAYOUT &layout = LAYOUTS[row];
+        if (layout.version == wanted && layout.raid == static_cast<u32>(raid) &&
+            layout.buildinStorage == fBuildin) {
+            return static_cast<int>(row);
+        }
+    }
+    return -1;
+}
+
+const PARTITION_LAYOUT *PartitionLayoutAt(int row)
+{
+    return row >= 0 && static_cast<size_t>(row) < LAYOUTS.size()
+               ? &LAYOUTS[static_cast<size_t>(row)]
+               : nullptr;
+}
+
+int PartitionStartSizeGet(const char *szDisk, int partNum, u64 *pStart, u64 *pSize)
+{
+    if (szDisk == nullptr || pStart == nullptr || pSize == nullptr) {
+        NLIBCErrSetHere(ERR_BAD_PARAMETER);
+        return -1;
+    }
+    const char *const szName = NLIBCStrSkipPrefix(szDisk, "/dev/");
+    char szPartition[NAME_SIZE];
+    if (DiskDevicePartitionNameGet(szName, partNum, szPartition, NAME_SIZE) != 0) {
+        return -1;
+    }
+    char szDirectory[PATH_SIZE];
+    (void)snprintf(szDirectory, sizeof(szDirectory), "/sys/block/%s/%s", szName, szPartition);
+    if (access(szDirectory, F_OK) != 0) {
+        return 0;
+    }
+    u64 start = 0;
+    u64 size = 0;
+    if (SectorsRead(szDirectory, "start", &start) != 0 ||
+        SectorsRead(szDirectory, "size", &size) != 0) {
+        return -1;
+    }
+    *pStart = start;
+    *pSize = size;
+    return 1;
+}
+
+int PartitionCheckLayout(const char *szDisk, int raid, u32 *pVersion)
+{
+    if (szDisk == nullptr) {
+        return 0;
+    }
+    const u32 fBuildin = IsBuildinStorage();
+    PARTITION_PLACE places[2] = {};
+    for (int partNum = 1; partNum <= 2; partNum++) {
+        PARTITION_PLACE &place = places[partNum - 1];
+        if (PartitionStartSizeGet(szDisk, partNum, &place.start, &place.size) != 1) {
+            NLIBCLog(LOG_DEBUG, "%s: dont contain partition [%d]", szDisk, partNum);
+            return 0;
+        }
+    }
+    for (const PARTITION_LAYOUT &layout : LAYOUTS) {
+        if (layout.raid != static_cast<u32>(raid) || layout.buildinStorage != fBuildin ||
+            !IsAt(places[0], layout.partitions[0]) || !IsAt(places[1], layout.partitions[1])) {
+            continue;
+        }
+        if (pVersion != nullptr) {
+            *pVersion = layout.version;
+        }
+        return 1;
+    }
+    return 0;
+}

@@ -1,0 +1,129 @@
+// SPDX-License-Identifier: MIT
+#include "nurostoragecore/partition_version.h"
+
+#include "hwcontrol/disk_port.h"
+#include "nurocore/conf.h"
+#include "nurocore/error.h"
+#include "nurocore/handle.h"
+#include "nurocore/log.h"
+#include "nurostoragecore/partition_layout.h"
+#include "nurostoragecore/raid_membership.h"
+
+#include <algorithm>
+#include <cstdio>
+#include <cstring>
+#include <glob.h>
+
+namespace
+{
+
+constexpr int LIST_SIZE = 1024;
+constexpr int DISK_NAME_SIZE = 64;
+constexpr int DISK_PATH_SIZE = 128;
+constexpr int RAID_MACHINE = 1;
+constexpr int DATA_MD_LAST = 99;
+constexpr char SYSTEM_MEMBERS_PATTERN[] = "/sys/block/md0/md/dev-*";
+
+// A member of the system array is always partition 1: its name less one character is the disk's.
+void MemberDiskName(const char *szMember, char *szDisk)
+{
+    const char *const pchDash = strrchr(szMember, '-'); // the pattern has one
+    (void)snprintf(szDisk, DISK_NAME_SIZE, "%s", pchDash + 1);
+    const size_t cchDisk = strlen(szDisk);
+    szDisk[cchDisk == 0 ? 0 : cchDisk - 1] = '\0';
+}
+
+// The running system array knows best: the first member with a known layout decides.
+void VersionOfMembers(const glob_t &members, u32 *pVersion)
+{
+    for (size_t i = 0; i < members.gl_pathc; i++) {
+        char szDisk[DISK_NAME_SIZE];
+        MemberDiskName(members.gl_pathv[i], szDisk);
+        if (PartitionCheckLayout(szDisk, RAID_MACHINE, pVersion) == 1 && *pVersion != 0) {
+            return;
+        }
+    }
+    if (*pVersion == 0) {
+        *pVersion = PARTITION_LAYOUT_NEWEST;
+    }
+}
+
+// Counts on a RAID machine only as a disk of a data array.
+bool IsCounted(const char *szDisk)
+{
+    int nMd = 0;
+    return IsSupportRaid() == 0 ||
+           (RAIDDiskIsUsedByRAID(szDisk, &nMd) == 1 && nMd <= DATA_MD_LAST);
+}
+
+// 0 for a disk that does not count.
+u32 VersionOfDisk(const char *szName)
+{
+    char szDisk[DISK_PATH_SIZE];
+    u32 version = 0;
+    (void)snprintf(szDisk, sizeof(szDisk), "/dev/%s", szName);
+    if (PartitionCheckLayout(szDisk, IsSupportRaid(), &version) == 0 || !IsCounted(szDisk)) {
+        return 0;
+    }
+    return version;
+}
+
+u32 VersionOfDisks(const NLIBSZLIST *pDisks, int fChooseBiggest)
+{
+    u32 biggest = 0;
+    for (int i = 0; i < pDisks->nItem; i++) {
+        const u32 version = VersionOfDisk(NLIBCSzListGet(pDisks, i));
+        if (version != 0 && fChooseBiggest == 0) {
+            return version;
+        }
+        biggest = std::max(biggest, version);
+    }
+    if (biggest != 0) {
+        NLIBCLog(LOG_ERR, "Choose biggest partition layout version %d.", static_cast<int>(biggest));
+    }
+    return biggest;
+}
+
+int VersionWithoutArray(u32 *pVersion, int fChooseBiggest)
+{
+    PNLIBSZLIST pDisks = NLIBCSzListAlloc(LIST_SIZE);
+    const LIST_OWNER owner(&pDisks);
+    if (pDisks == nullptr) {
+        NLIBCErrSetHere(ERR_OUT_OF_MEMORY);
+        return -1;
+    }
+    const DISK_PORT_TYPE type = NLIBCConfSupportDualHead() != 0 ? EUNIT_DEVICE : INTERNAL_DEVICE;
+    if (ExternalDiskPortEnum(type, &pDisks) != 0) {
+        return -1;
+    }
+    *pVersion = VersionOfDisks(pDisks, fChooseBiggest);
+    if (*pVersion == 0) {
+        *pVersion = PARTITION_LAYOUT_NEWEST;
+    }
+    return 0;
+}
+
+} // namespace
+
+int PartitionLayoutGetMax(u32 *pVersion, int fChooseBiggest)
+{
+    if (pVersion == nullptr) {
+        return -1;
+    }
+    glob_t members = {};
+    const GLOB_OWNER owner(&members);
+    const int globbed = glob(SYSTEM_MEMBERS_PATTERN, GLOB_NOSORT, nullptr, &members);
+    if (globbed != 0 && globbed != GLOB_NOMATCH) {
+        return -1;
+    }
+    if (globbed == 0 && members.gl_pathc > 0) {
+        VersionOfMembers(members, pVersion);
+        return 0;
+    }
+    return VersionWithoutArray(pVersion, fChooseBiggest);
+}
+
+int PartitionLayoutGet(u32 *pVersion)
+{
+    return PartitionLayoutGetMax(pVersion, 0);
+}

@@ -1,0 +1,412 @@
+// SPDX-License-Identifier: MIT
+#include "nurostoragecore/raid_info.h"
+
+#include "nurocore/error.h"
+#include "nurocore/handle.h"
+#include "nurocore/io.h"
+#include "nurocore/log.h"
+#include "nurocore/text.h"
+#include "raid/raid_owner.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <fcntl.h>
+#include <linux/fs.h>
+#include <linux/major.h>
+#include <string_view>
+#include <sys/ioctl.h>
+#include <sys/stat.h>
+#include <sys/sysmacros.h>
+
+namespace
+{
+
+struct SYNC_STATUS {
+    u64 activity;
+    u64 done;
+    u64 total;
+};
+
+// Requests of the appliance's own md driver.
+constexpr unsigned long MD_GET_SYNC_STATUS = _IOR(MD_MAJOR, 0x60, SYNC_STATUS);
+constexpr unsigned long MD_GET_ARRAY_STATUS = _IOR(MD_MAJOR, 0x61, i32);
+
+static_assert(sizeof(SYNC_STATUS) == 24 && sizeof(mdu_array_info_t) == 72);
+#if defined(__powerpc__)
+static_assert(GET_ARRAY_INFO == 0x40480911 && MD_GET_ARRAY_STATUS == 0x40040961 &&
+              MD_GET_SYNC_STATUS == 0x40180960);
+static_assert(sizeof(size_t) == 8 || BLKGETSIZE64 == 0x40041272);
+#else
+static_assert(GET_ARRAY_INFO == 0x80480911 && MD_GET_ARRAY_STATUS == 0x80040961 &&
+              MD_GET_SYNC_STATUS == 0x80180960);
+static_assert(sizeof(size_t) == 4 || BLKGETSIZE64 == 0x80081272);
+#endif
+
+constexpr u64 BYTES_PER_KIB = 1024;
+constexpr u64 SECTORS_PER_KIB = 2;
+constexpr int COMPONENT_SIZE_TEXT_SIZE = 50;
+constexpr int PATH_SIZE = 128;
+constexpr char DEVICES_PATH[] = "/proc/devices";
+
+struct LEVEL_ROW {
+    i32 mdLevel;
+    u32 level;
+};
+
+constexpr LEVEL_ROW LEVELS[] = {
+    {0, RAID_LEVEL_0}, {1, RAID_LEVEL_1},   {5, RAID_LEVEL_5},
+    {6, RAID_LEVEL_6}, {10, RAID_LEVEL_10}, {-1, RAID_LEVEL_LINEAR},
+};
+
+u32 LevelOf(i32 mdLevel)
+{
+    for (const LEVEL_ROW &row : LEVELS) {
+        if (row.mdLevel == mdLevel) {
+            return row.level;
+        }
+    }
+    NLIBCLog(LOG_DEBUG, "Not supported RAID level: %d", mdLevel);
+    return 0;
+}
+
+// A word that grows as it is read.
+struct WORD {
+    HEAP_OWNER<char> pszText;
+    size_t cch = 0;
+    size_t cb = 0;
+};
+
+constexpr size_t WORD_STEP = 100;
+
+bool WordAppend(WORD &word, char ch)
+{
+    if (word.cch + 1 >= word.cb) {
+        void *const pNew = realloc(word.pszText.get(), word.cb + WORD_STEP);
+        if (pNew == nullptr) {
+            return false;
+        }
+        (void)word.pszText.release();
+        word.pszText.reset(static_cast<char *>(pNew));
+        word.cb += WORD_STEP;
+    }
+    word.pszText.get()[word.cch++] = ch;
+    word.pszText.get()[word.cch] = '\0';
+    return true;
+}
+
+bool IsWord(const WORD &word, const char *szExpected)
+{
+    return word.cch > 0 && strcmp(word.pszText.get(), szExpected) == 0;
+}
+
+bool EndsInActive(const WORD &word)
+{
+    constexpr std::string_view ACTIVE = "active";
+    return std::string_view(word.pszText.get(), word.cch).ends_with(ACTIVE);
+}
+
+void CommentSkip(FILE *pFile)
+{
+    int ch = fgetc(pFile);
+    while (ch != EOF && ch != '\n') {
+        ch = fgetc(pFile);
+    }
+}
+
+// Two shapes of the md driver's reports are straightened out: "active(auto-read-only)" is two
+// words, and the second has its parenthesis again.
+void WordFixUp(WORD &word)
+{
+    constexpr char READ_ONLY_TORN[] = "auto-read-only)";
+    if (IsWord(word, READ_ONLY_TORN) && WordAppend(word, ')')) {
+        memmove(word.pszText.get() + 1, READ_ONLY_TORN, sizeof(READ_ONLY_TORN));
+        word.pszText.get()[0] = '(';
+    }
+}
+
+// The next word of the stream: blanks, tabs and new lines end one, '#' begins a comment up to the
+// line's end, quotes group blanks and are dropped. Empty at the end of the stream and without
+// memory.
+WORD WordRead(FILE *pFile)
+{
+    WORD word;
+    int chQuote = 0;
+    for (int ch = fgetc(pFile); ch != EOF; ch = fgetc(pFile)) {
+        if (chQuote == 0 && ch == '#') {
+            CommentSkip(pFile);
+            ch = '\n';
+        }
+        const bool fSeparator = chQuote == 0 && (ch == ' ' || ch == '\t' || ch == '\n');
+        const bool fTorn = chQuote == 0 && ch == '(' && EndsInActive(word);
+        if ((fSeparator || fTorn) && word.cch > 0) {
+            break;
+        }
+        if (fSeparator) {
+            continue;
+        }
+        if (ch == chQuote) {
+            chQuote = 0;
+        } else if (chQuote == 0 && (ch == '"' || ch == '\'')) {
+            chQuote = ch;
+        } else if (!WordAppend(word, static_cast<char>(ch))) {
+            return {};
+        }
+    }
+    WordFixUp(word);
+    return word;
+}
+
+constexpr i32 MAJOR_UNKNOWN = -1;
+
+// The major number that the kernel gave the partitionable md driver.
+i32 MdpMajorRead()
+{
+    const STREAM_OWNER pFile(fopen(DEVICES_PATH, "r"));
+    if (pFile == nullptr) {
+        return MAJOR_UNKNOWN;
+    }
+    bool fBlockSection = false;
+    bool fAfterBlock = false;
+    i32 number = MAJOR_UNKNOWN;
+    for (WORD word = WordRead(pFile.get()); word.cch > 0; word = WordRead(pFile.get())) {
+        const char chFirst = word.pszText.get()[0];
+        if (chFirst >= '0' && chFirst <= '9') {
+            number = NLIBCStrToI32(word.pszText.get());
+        }
+        if (fBlockSection && IsWord(word, "mdp")) {
+            return number;
+        }
+        fBlockSection = fBlockSection || (fAfterBlock && IsWord(word, "devices:"));
+        fAfterBlock = IsWord(word, "Block");
+    }
+    return MAJOR_UNKNOWN;
+}
+
+i32 MdpMajorGet()
+{
+    static i32 mdpMajor = MAJOR_UNKNOWN;
+    if (mdpMajor == MAJOR_UNKNOWN) {
+        mdpMajor = MdpMajorRead();
+    }
+    return mdpMajor;
+}
+
+// KiB used on each member. The driver's own field has 32 bits; beyond them sysfs knows.
+u64 DeviceSizeKiB(int fd, const mdu_array_info_t &array, u64 arraySize)
+{
+    constexpr u64 FIELD_LIMIT = 0xFFFFFFFF;
+    const bool fField = array.major_version == 0 || (arraySize < FIELD_LIMIT && array.size != 0);
+    return fField ? static_cast<u64>(static_cast<i64>(array.size))
+                  : RAIDComponentSizeGet(fd) / SECTORS_PER_KIB;
+}
+
+bool HasDeviceSize(u32 level)
+{
+    return (level & (RAID_LEVEL_0 | RAID_LEVEL_LINEAR)) == 0;
+}
+
+void GeometryStore(const mdu_array_info_t &array, RAID_INFO *pInfo)
+{
+    pInfo->majorVersion = array.major_version;
+    pInfo->minorVersion = array.minor_version;
+    pInfo->level = LevelOf(array.level);
+    pInfo->nRaidDisks = array.raid_disks;
+    pInfo->nActiveDisks = array.active_disks;
+    pInfo->nSpareDisks = array.spare_disks;
+}
+
+int InfoFill(int fd, RAID_INFO *pInfo)
+{
+    mdu_array_info_t array = {};
+    if (RAIDIoctlInfo(fd, &array) != 0) {
+        if (NLIBCErrGet() == ERR_DEVICE_ABSENT) {
+            return 0;
+        }
+        NLIBCLog(LOG_DEBUG, "Failed to ioctl for raid status, errno=0X%X", NLIBCErrGet());
+        return -1;
+    }
+    GeometryStore(array, pInfo);
+    if (RAIDIoctlSize(fd, &pInfo->arraySize) != 0) {
+        NLIBCLog(LOG_DEBUG, "Failed to ioctl for raid size, errno=0X%X", NLIBCErrGet());
+        return -1;
+    }
+    const u64 nKiB = DeviceSizeKiB(fd, array, pInfo->arraySize);
+    pInfo->deviceSize = HasDeviceSize(pInfo->level) ? nKiB * BYTES_PER_KIB : 0;
+    // Kept: a failed rebuild query is told in the words of the member list, a failed health query in
+    // those of the size.
+    if (RAIDDiskListGet(pInfo->szPath, &pInfo->pDisks) != 0 ||
+        RAIDRebuildStatusGet(fd, &pInfo->rebuild) != 0) {
+        NLIBCLog(LOG_DEBUG, "Failed to get disk list for /dev/md%d, errno=0X%X", pInfo->nMd,
+                 NLIBCErrGet());
+        return -1;
+    }
+    if (RAIDIoctlStatus(fd, &pInfo->status) != 0) {
+        NLIBCLog(LOG_DEBUG, "Failed to ioctl for raid size, errno=0X%X", NLIBCErrGet());
+        return -1;
+    }
+    return 1;
+}
+
+} // namespace
+
+int RAIDInfoGet(const char *szMd, RAID_INFO **ppInfo)
+{
+    if (szMd == nullptr || ppInfo == nullptr) {
+        NLIBCErrSetHere(ERR_BAD_PARAMETER);
+        return -1;
+    }
+    int nMd = 0;
+    if (sscanf(szMd, "/dev/md%d", &nMd) != 1) {
+        NLIBCLog(LOG_DEBUG, "invalide path %s, errno=%m", szMd);
+        NLIBCErrSetHere(ERR_BAD_FORMAT);
+        return -1;
+    }
+    RAID_INFO_OWNER pInfo(static_cast<RAID_INFO *>(calloc(1, sizeof(RAID_INFO))));
+    if (pInfo == nullptr) {
+        NLIBCLog(LOG_DEBUG, "Failed to calloc, errno=%m");
+        NLIBCErrSetHere(ERR_OUT_OF_MEMORY);
+        return -1;
+    }
+    pInfo->nMd = nMd;
+    (void)snprintf(pInfo->szPath, sizeof(pInfo->szPath), "%s", szMd);
+    const FD_OWNER fd(open(szMd, O_RDONLY | O_CLOEXEC));
+    if (!fd) {
+        NLIBCLog(LOG_DEBUG, "Failed to open %s, errno=%m", szMd);
+        NLIBCErrSetHere(ERR_OPEN_FAILED);
+        return -1;
+    }
+    const int result = InfoFill(fd.get(), pInfo.get());
+    if (result == 1) {
+        *ppInfo = pInfo.release();
+    }
+    return result;
+}
+
+void RAIDInfoFree(RAID_INFO *pInfo)
+{
+    if (pInfo == nullptr) {
+        return;
+    }
+    RAIDDiskListFree(pInfo->pDisks);
+    free(pInfo);
+}
+
+int RAIDIoctlInfo(int fd, mdu_array_info_t *pInfo)
+{
+    if (pInfo == nullptr) {
+        NLIBCErrSetHere(ERR_BAD_PARAMETER);
+        return -1;
+    }
+    if (ioctl(fd, GET_ARRAY_INFO, pInfo) == 0) {
+        return 0;
+    }
+    if (errno == EINTR) {
+        NLIBCErrSetHere(ERR_INTERRUPTED);
+        return -1;
+    }
+    if (errno == ENODEV) {
+        // Kept: overwritten below, so an inactive array is a failure to all callers, not absent.
+        NLIBCErrSetHere(ERR_DEVICE_ABSENT);
+    }
+    NLIBCLog(LOG_DEBUG, "Failed to ioctl for raid status, errno=%m");
+    NLIBCErrSetHere(ERR_SYSCALL_FAILED);
+    return -1;
+}
+
+int RAIDIoctlSize(int fd, u64 *pcbArray)
+{
+    if (pcbArray == nullptr) {
+        NLIBCErrSetHere(ERR_BAD_PARAMETER);
+        return -1;
+    }
+    *pcbArray = 0;
+    if (ioctl(fd, BLKGETSIZE64, pcbArray) == 0) {
+        return 0;
+    }
+    if (errno == ENODEV) {
+        NLIBCErrSetHere(ERR_DEVICE_ABSENT);
+        return -1;
+    }
+    NLIBCLog(LOG_DEBUG, "Failed to ioctl for raid status, errno=%m");
+    NLIBCErrSetHere(ERR_SYSCALL_FAILED);
+    return -1;
+}
+
+int RAIDIoctlStatus(int fd, u32 *pStatus)
+{
+    if (pStatus == nullptr) {
+        NLIBCErrSetHere(ERR_BAD_PARAMETER);
+        return -1;
+    }
+    i32 health = 0;
+    if (ioctl(fd, MD_GET_ARRAY_STATUS, &health) != 0) {
+        if (errno == ENODEV || errno == EINTR) {
+            NLIBCErrSetHere(errno == ENODEV ? ERR_DEVICE_ABSENT : ERR_INTERRUPTED);
+            return -1;
+        }
+        NLIBCLog(LOG_DEBUG, "Failed to ioctl for raid status, errno=%m");
+        NLIBCErrSetHere(ERR_SYSCALL_FAILED);
+        return -1;
+    }
+    // By what the driver answers.
+    constexpr u32 STATUSES[] = {RAID_STATUS_NORMAL, RAID_STATUS_DEGRADE, RAID_STATUS_CRASHED};
+    if (health < 0 || static_cast<size_t>(health) >= std::size(STATUSES)) {
+        NLIBCLog(LOG_DEBUG, "unknown raid status, status=%d", health);
+        NLIBCErrSetHere(ERR_SYSCALL_FAILED);
+        return -1;
+    }
+    *pStatus = STATUSES[health];
+    return 0;
+}
+
+int RAIDRebuildStatusGet(int fd, RAID_REBUILD_STATUS *pRebuild)
+{
+    if (fd < 0 || pRebuild == nullptr) {
+        NLIBCErrSetHere(ERR_BAD_PARAMETER);
+        return -1;
+    }
+    SYNC_STATUS sync = {};
+    if (ioctl(fd, MD_GET_SYNC_STATUS, &sync) != 0) {
+        if (errno == ENODEV) {
+            NLIBCErrSetHere(ERR_DEVICE_ABSENT);
+            return -1;
+        }
+        NLIBCLog(LOG_DEBUG, "Failed to ioctl for sync status, errno=%m");
+        NLIBCErrSetHere(ERR_SYSCALL_FAILED);
+        return -1;
+    }
+    *pRebuild = {};
+    if (sync.activity != 0) {
+        *pRebuild = {.state = sync.done == 0 ? REBUILD_WAITING : REBUILD_PROGRESSING,
+                     .done = sync.done,
+                     .total = sync.total};
+    }
+    return 0;
+}
+
+u64 RAIDComponentSizeGet(int fd)
+{
+    constexpr unsigned int MDP_MINOR_SHIFT = 6; // 64 minors an array, its partitions' among them
+    struct stat status = {};
+    if (fstat(fd, &status) != 0) {
+        return 0;
+    }
+    const unsigned int deviceMinor = minor(status.st_rdev);
+    char szFile[PATH_SIZE];
+    if (static_cast<i32>(major(status.st_rdev)) != MdpMajorGet()) {
+        (void)snprintf(szFile, sizeof(szFile), "/sys/block/md%u/md/component_size", deviceMinor);
+    } else {
+        (void)snprintf(szFile, sizeof(szFile), "/sys/block/md_d%u/md/component_size",
+                       deviceMinor >> MDP_MINOR_SHIFT);
+    }
+    const FD_OWNER fdFile(open(szFile, O_RDONLY | O_CLOEXEC));
+    char szSize[COMPONENT_SIZE_TEXT_SIZE + 1] = {};
+    const ssize_t cbRead = fdFile ? NLIBCRead(fdFile.get(), szSize, COMPONENT_SIZE_TEXT_SIZE) : -1;
+    if (cbRead < 0 || cbRead == COMPONENT_SIZE_TEXT_SIZE) {
+        return 0;
+    }
+    return strtoull(szSize, nullptr, 10) * SECTORS_PER_KIB;
+}

@@ -1,0 +1,112 @@
+// SPDX-License-Identifier: MIT
+#include "nurostoragecore/space.h"
+
+#include "nurocore/error.h"
+#include "nurocore/handle.h"
+#include "nurocore/log.h"
+#include "nurocore/pipe.h"
+#include "nurocore/process.h"
+
+#include <cstdarg>
+#include <cstring>
+#include <ctime>
+
+namespace
+{
+
+constexpr char ERROR_LOG_PATH[] = "/var/log/space_operation_error.log";
+constexpr size_t COMMAND_TEXT_SIZE = 1024;
+constexpr size_t ERROR_TEXT_SIZE = 2048;
+constexpr size_t LOG_LINE_SIZE = 2048;
+constexpr size_t TIME_STAMP_SIZE = 32;
+
+// Path and arguments with a blank between them; what does not fit is left out of the text, not of
+// the command.
+void CommandTextBuild(char *const argv[], char *szText)
+{
+    size_t cchText = 0;
+    szText[0] = '\0';
+    for (size_t i = 0; argv[i] != nullptr && cchText < COMMAND_TEXT_SIZE - 1; i++) {
+        (void)snprintf(szText + cchText, COMMAND_TEXT_SIZE - cchText, "%s ", argv[i]);
+        cchText += strlen(szText + cchText);
+    }
+    if (cchText > 0 && szText[cchText - 1] == ' ') {
+        szText[cchText - 1] = '\0';
+    }
+}
+
+// The first ERROR_TEXT_SIZE - 1 bytes as one line; the rest is read too, so that the tool never
+// waits for a reader. Returns false when there was nothing.
+bool ErrorTextRead(FILE *pStream, char *szText)
+{
+    size_t cchText = 0;
+    bool fAny = false;
+    for (int ch = fgetc(pStream); ch != EOF; ch = fgetc(pStream)) {
+        fAny = true;
+        if (cchText < ERROR_TEXT_SIZE - 1) {
+            szText[cchText++] = static_cast<char>(ch == '\n' ? ' ' : ch);
+        }
+    }
+    szText[cchText] = '\0';
+    return fAny;
+}
+
+void TimeStampBuild(char *szStamp)
+{
+    const time_t now = time(nullptr);
+    struct tm local = {};
+    if (localtime_r(&now, &local) == nullptr ||
+        strftime(szStamp, TIME_STAMP_SIZE, "%b %d %H:%M:%S", &local) == 0) {
+        szStamp[0] = '\0';
+    }
+}
+
+} // namespace
+
+int SpaceErrorLog(FILE *pStream, const char *szCommand)
+{
+    if (pStream == nullptr) {
+        NLIBCErrSetHere(ERR_BAD_PARAMETER);
+        return -1;
+    }
+    char szError[ERROR_TEXT_SIZE];
+    if (!ErrorTextRead(pStream, szError)) {
+        return 0;
+    }
+    char szStamp[TIME_STAMP_SIZE];
+    TimeStampBuild(szStamp);
+    char szLine[LOG_LINE_SIZE];
+    const int cchLine = snprintf(szLine, sizeof(szLine), "%s command=\"%s\" Error=\"%s\"", szStamp,
+                                 szCommand == nullptr ? "" : szCommand, szError);
+    if (cchLine < 0) {
+        return -1;
+    }
+    const STREAM_OWNER pLog(fopen(ERROR_LOG_PATH, "a+"));
+    if (pLog == nullptr) {
+        NLIBCLog(LOG_ERR, "Fail to open %s", ERROR_LOG_PATH);
+        return -1;
+    }
+    (void)fprintf(pLog.get(), "%s\n", szLine);
+    return 0;
+}
+
+int SpaceExecl(const char *szPath, ...)
+{
+    if (szPath == nullptr) {
+        NLIBCErrSetHere(ERR_BAD_PARAMETER);
+        return -1;
+    }
+    va_list arguments;
+    va_start(arguments, szPath);
+    HEAP_OWNER<char *> argv(NLIBCArgvAlloc(szPath, arguments));
+    va_end(arguments);
+    if (argv == nullptr) {
+        return -1;
+    }
+    char szCommand[COMMAND_TEXT_SIZE];
+    CommandTextBuild(argv.get(), szCommand);
+    FILE *const pStream = NLIBCPopenV(szPath, "rE", argv.get());
+    // The log is a record, not a judge: the tool's own status decides.
+    (void)SpaceErrorLog(pStream, szCommand);
+    return NLIBCPclose(pStream);
+}
