@@ -1,0 +1,877 @@
+// SPDX-License-Identifier: MIT
+//
+// The command line: words in, words out. What is meant for people goes to standard output, what is
+// meant for developers to syslog, nothing to standard error.
+#include "hwcontrol/disk_name.h"
+#include "hwcontrol/disk_path.h"
+#include "hwcontrol/disk_port.h"
+#include "nurocore/conf.h"
+#include "nurocore/error.h"
+#include "nurocore/handle.h"
+#include "nurocore/keyvalue.h"
+#include "nurocore/log.h"
+#include "nurocore/process.h"
+#include "nurocore/szlist.h"
+#include "nurocore/text.h"
+#include "nurocore/types.h"
+#include "nurostoragecore/lvm.h"
+#include "nurostoragecore/partition_edit.h"
+#include "nurostoragecore/partition_layout.h"
+#include "nurostoragecore/partition_version.h"
+#include "nurostoragecore/raid_info.h"
+#include "nurostoragecore/raid_membership.h"
+#include "nurostoragecore/raid_remove.h"
+
+#include <algorithm>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <span>
+#include <string_view>
+#include <sys/wait.h>
+#include <unistd.h>
+
+namespace
+{
+
+constexpr int STATUS_OK = 0;
+constexpr int STATUS_FAILED = 1;
+
+constexpr size_t MD_PATH_SIZE = 64;
+constexpr int DISK_LIST_SIZE = 1024;
+constexpr size_t DEVICE_PATH_SIZE = 32;
+constexpr size_t MEMBER_LIST_SIZE = 512;
+constexpr size_t CREATE_COMMAND_SIZE = 1024;
+
+constexpr char USAGE[] = "usage:\n"
+                         "\tarrayctl destroy <RAID ID> \n"
+                         "\tarrayctl status <RAID ID> \n"
+                         "\tarrayctl newvol \n"
+                         "\tarrayctl initsys \n"
+                         "\tarrayctl initsys-dd ";
+
+// --- status ------------------------------------------------------------------------------------
+
+// Kept: every word of the report lives in a field of 16 bytes, so its first 15 characters are
+// printed. The numbers of a running rebuild never show, and a crashing member's word ends early;
+// scripts compare with the words as they are.
+constexpr int WORD_FIELD_SIZE = 16;
+constexpr int WORD_LENGTH_MAX = WORD_FIELD_SIZE - 1;
+
+struct WORD_ROW {
+    u32 value;
+    const char *szWord;
+};
+
+constexpr WORD_ROW LEVEL_WORDS[] = {
+    {RAID_LEVEL_0, "RAID 0"}, {RAID_LEVEL_1, "RAID 1"},   {RAID_LEVEL_5, "RAID 5"},
+    {RAID_LEVEL_6, "RAID 6"}, {RAID_LEVEL_10, "RAID_10"}, {RAID_LEVEL_LINEAR, "JBOD"},
+};
+
+constexpr WORD_ROW STATUS_WORDS[] = {
+    {RAID_STATUS_NORMAL, "NORMAL"},
+    {RAID_STATUS_DEGRADE, "DEGRADE"},
+    {RAID_STATUS_CRASHED, "CRASHED"},
+};
+
+constexpr WORD_ROW REBUILD_WORDS[] = {
+    {REBUILD_NONE, "None"},
+    {REBUILD_PROGRESSING, "Progressing...["}, // "[done/total]" would follow
+    {REBUILD_WAITING, "Waiting..."},
+};
+
+constexpr WORD_ROW DISK_WORDS[] = {
+    {DISK_STATE_NORMAL, "Normal"},
+    {DISK_STATE_FAILED, "Failed"},
+    {DISK_STATE_CRASHING, "Failed(Which make RAID Crashed)"},
+    {DISK_STATE_REBUILDING, "Rebuilding"},
+    {DISK_STATE_SPARE, "Spare Disk"},
+    {DISK_STATE_NONE, "None"},
+};
+
+// The word of a value, szOther when it has none.
+const char *WordOf(std::span<const WORD_ROW> rows, u32 value, const char *szOther)
+{
+    for (const WORD_ROW &row : rows) {
+        if (row.value == value) {
+            return row.szWord;
+        }
+    }
+    return szOther;
+}
+
+void DisksPrint(const RAID_DISK *pDisks)
+{
+    const char *szWord = "";
+    for (const RAID_DISK *pDisk = pDisks; pDisk != nullptr; pDisk = pDisk->pNext) {
+        // Kept: one word field serves all members, so an unknown state shows the one before it.
+        szWord = WordOf(DISK_WORDS, pDisk->state, szWord);
+        (void)printf("\t [%s: %.*s]\n", pDisk->szPath, WORD_LENGTH_MAX, szWord);
+    }
+}
+
+void ReportPrint(const RAID_INFO &info)
+{
+    const auto cbArray = static_cast<unsigned long long>(info.arraySize);
+    // "is running" whatever the status: the array was found.
+    (void)printf("%s is running, status: %.*s, rebuilding: %.*s\n", info.szPath, WORD_LENGTH_MAX,
+                 WordOf(STATUS_WORDS, info.status, ""), WORD_LENGTH_MAX,
+                 WordOf(REBUILD_WORDS, info.rebuild.state, ""));
+    (void)printf("Device level: %.*s\n", WORD_LENGTH_MAX, WordOf(LEVEL_WORDS, info.level, ""));
+    (void)printf("Device size: %llu MB (%llu bytes) \n", cbArray >> 20U, cbArray);
+    (void)puts("Disk: ");
+    DisksPrint(info.pDisks);
+    (void)putchar('\n');
+}
+
+int StatusReport(const char *szMd)
+{
+    RAID_INFO *pInfo = nullptr;
+    if (RAIDInfoGet(szMd, &pInfo) <= 0) {
+        (void)printf("RAID %s is not found\n", szMd);
+        return STATUS_FAILED;
+    }
+    ReportPrint(*pInfo);
+    RAIDInfoFree(pInfo);
+    return STATUS_OK;
+}
+
+// --- destroy -----------------------------------------------------------------------------------
+
+constexpr unsigned int LVM_FAILED_PAUSE_SECONDS = 3;
+
+// Always 0: callers that need to know look at the array afterwards.
+int ArrayDestroy(const char *szMd)
+{
+    if (LVMRmLVPath(szMd) < 0) {
+        // Kept: this is said when the removal has failed, not when it went well.
+        (void)printf("Found LVM on %s, remove it \n", szMd);
+        (void)sleep(LVM_FAILED_PAUSE_SECONDS);
+    }
+    RAID_INFO *pInfo = nullptr;
+    if (RAIDInfoGet(szMd, &pInfo) <= 0) {
+        (void)printf("Not found %s \n", szMd);
+        return STATUS_OK;
+    }
+    (void)RAIDRemoveByInfo(pInfo);
+    RAIDInfoFree(pInfo);
+    return STATUS_OK;
+}
+
+// --- what the commands over all disks share ----------------------------------------------------
+
+// What becomes of a disk; the exit status of the child that decided it.
+constexpr int FORMAT_NONE = 0;         // left alone
+constexpr int FORMAT_WIPE = 1;         // all partitions go
+constexpr int FORMAT_KEEP_DATA = 2;    // the system partitions are renewed
+constexpr int FORMAT_UNRECOGNISED = 4; // as KEEP_DATA, unless some other disk keeps its data
+
+constexpr char FORCE_CLEAN_MARKER[] = "/.force_clean_all_disk";
+
+// The one pair of versions between which an upgrade keeps the data partitions.
+constexpr u32 UPGRADE_FROM_VERSION = 7;
+constexpr u32 UPGRADE_TO_VERSION = 8;
+constexpr u32 ALWAYS_WIPED_VERSION = 1;
+
+// One disk's child, and what its exit status has decided.
+struct DISK_CHILD {
+    pid_t pid;
+    int type;
+};
+
+constexpr pid_t NO_CHILD = -1;
+
+// A phase over all disks ends for this process with an exit status (a child's, or the parent's when
+// it cannot fork), or the parent goes on. A child returns through its callers, which release its
+// copies of their lists, and main ends it.
+constexpr int GOES_ON = -1;
+
+struct TEXT {
+    char sz[DEVICE_PATH_SIZE];
+};
+
+TEXT DiskPath(const char *szDisk)
+{
+    TEXT path;
+    const int cch = snprintf(path.sz, sizeof(path.sz), "/dev/%s", szDisk);
+    return cch < 0 ? TEXT{} : path;
+}
+
+PNLIBSZLIST DiskListAlloc()
+{
+    const PNLIBSZLIST pDisks = NLIBCSzListAlloc(DISK_LIST_SIZE);
+    if (pDisks == nullptr) {
+        NLIBCLog(LOG_ERR, "Out of memeory, failed to allocate memory for PNLIBSZLIST via "
+                          "NLIBCSzListAlloc");
+    }
+    return pDisks;
+}
+
+// The disks of the machine: a dual-head machine's are in its expansion unit.
+bool DisksEnum(PNLIBSZLIST *ppDisks)
+{
+    if (NLIBCConfSupportDualHead() != 0) {
+        if (ExternalDiskPortEnum(EUNIT_DEVICE, ppDisks) < 0) {
+            NLIBCLog(LOG_ERR, "Failed to enum EUNIT_DEVICE");
+            return false;
+        }
+        return true;
+    }
+    if (ExternalDiskPortEnum(INTERNAL_DEVICE, ppDisks) < 0) {
+        NLIBCLog(LOG_ERR, "Failed to enum INTERNAL_DEVICE");
+        return false;
+    }
+    return true;
+}
+
+// One entry a disk, none of them with a child. NULL without memory.
+DISK_CHILD *ChildrenAlloc(int nDisk)
+{
+    const auto nEntry = static_cast<size_t>(std::max(nDisk, 1));
+    const auto pChildren = static_cast<DISK_CHILD *>(calloc(nEntry, sizeof(DISK_CHILD)));
+    if (pChildren != nullptr) {
+        std::fill_n(pChildren, nEntry, DISK_CHILD{.pid = NO_CHILD, .type = FORMAT_NONE});
+    }
+    return pChildren;
+}
+
+bool HasPartition(int partNum, const char *szDisk)
+{
+    u64 start = 0;
+    u32 type = 0;
+    return PartitionGeometryGet(partNum, szDisk, &start, &type) != PARTITION_ABSENT;
+}
+
+int TypeOfOtherLayout(const char *szDisk, u32 version, u32 wanted)
+{
+    if (wanted == UPGRADE_TO_VERSION && version == UPGRADE_FROM_VERSION) {
+        return FORMAT_KEEP_DATA;
+    }
+    return RAIDDiskIsUsedByRAID(szDisk, nullptr) == 1 ? FORMAT_NONE : FORMAT_WIPE;
+}
+
+// What a disk needs to carry the system partitions of the wanted layout.
+int DiskFormatTypeGet(const char *szName, u32 wanted)
+{
+    constexpr int RAID_MACHINE = 1;
+    if (szName == nullptr) {
+        NLIBCLog(LOG_ERR, "Null List Error");
+        return FORMAT_NONE;
+    }
+    const TEXT disk = DiskPath(szName);
+    if (access(FORCE_CLEAN_MARKER, F_OK) == 0) {
+        return FORMAT_WIPE;
+    }
+    const bool fSystem = HasPartition(1, disk.sz);
+    const bool fSwap = HasPartition(2, disk.sz);
+    if (!fSystem && !fSwap) {
+        return FORMAT_WIPE;
+    }
+    u32 version = 0;
+    if (PartitionCheckLayout(disk.sz, RAID_MACHINE, &version) != 1) {
+        return FORMAT_UNRECOGNISED;
+    }
+    if (version != wanted) {
+        return TypeOfOtherLayout(disk.sz, version, wanted);
+    }
+    return wanted == ALWAYS_WIPED_VERSION ? FORMAT_WIPE : FORMAT_KEEP_DATA;
+}
+
+int DecideInChild(const char *szDisk, u32 version)
+{
+    const int type = DiskFormatTypeGet(szDisk, version);
+    if (type == FORMAT_NONE) {
+        NLIBCLog(LOG_ERR, "Failed to get format type");
+    }
+    return type;
+}
+
+// Starts the child of one disk. Returns false when it cannot be.
+bool ChildStart(DISK_CHILD &child)
+{
+    child.pid = NLIBCForkCloseIo();
+    if (child.pid < 0) {
+        NLIBCLog(LOG_ERR, "Failed to fork.");
+        return false;
+    }
+    return true;
+}
+
+int DecideStart(const NLIBSZLIST *pDisks, u32 version, DISK_CHILD *pChildren)
+{
+    for (int i = 0; i < pDisks->nItem; i++) {
+        if (!ChildStart(pChildren[i])) {
+            return STATUS_FAILED; // the children already started are left to themselves
+        }
+        if (pChildren[i].pid == 0) {
+            return DecideInChild(NLIBCSzListGet(pDisks, i), version);
+        }
+    }
+    return GOES_ON;
+}
+
+constexpr int CHILD_LOST = -1;
+
+// The exit status of a disk's child, CHILD_LOST when it has none.
+int ChildWait(pid_t pid, const char *szDisk)
+{
+    int status = 0;
+    if (waitpid(pid, &status, 0) < 0) {
+        NLIBCLog(LOG_ERR, "Wait pid failed. pid: %d disk: %s", pid, szDisk);
+        return CHILD_LOST;
+    }
+    if (!WIFEXITED(status)) {
+        NLIBCLog(LOG_ERR, "Child exit not normally, pid: %d disk: %s", pid, szDisk);
+        return CHILD_LOST;
+    }
+    return WEXITSTATUS(status);
+}
+
+// Bits 8 to 15 of what system() returned; a shell that could not start counts as failure.
+int ShellExitStatus(int result)
+{
+    return static_cast<int>((static_cast<u32>(result) >> 8U) & 0xFFU);
+}
+
+// Partition paths with a blank after each.
+struct MEMBER_LIST {
+    char sz[MEMBER_LIST_SIZE];
+};
+
+void MemberAppend(const char *szDisk, int partNum, MEMBER_LIST &members)
+{
+    char szPartition[DEVICE_PATH_SIZE] = "";
+    (void)DiskDevicePartitionPathGet(szDisk, partNum, szPartition, sizeof(szPartition));
+    const size_t cch = strlen(members.sz);
+    (void)snprintf(members.sz + cch, sizeof(members.sz) - cch, "%s ", szPartition);
+}
+
+// --- initsys, initsys-dd -----------------------------------------------------------------------
+
+constexpr int CHILD_PARTITIONED = 1;
+constexpr int PARTITION_SYSTEM = 1;
+constexpr int PARTITION_SWAP = 2;
+constexpr unsigned int ARRAY_PAUSE_SECONDS = 3;
+constexpr size_t MISSING_TEXT_SIZE = 256;
+constexpr size_t DUPLICATE_LIST_SIZE = 1024;
+constexpr size_t DUPLICATE_COMMAND_SIZE = 512;
+
+void DecideCollect(const NLIBSZLIST *pDisks, DISK_CHILD *pChildren)
+{
+    for (int i = 0; i < pDisks->nItem; i++) {
+        const int status = ChildWait(pChildren[i].pid, NLIBCSzListGet(pDisks, i));
+        pChildren[i].type = status == CHILD_LOST ? FORMAT_NONE : status;
+        pChildren[i].pid = NO_CHILD;
+    }
+}
+
+int PartitionInChild(const char *szDisk, int type, u32 version)
+{
+    const TEXT disk = DiskPath(szDisk);
+    switch (type) {
+    case FORMAT_KEEP_DATA:
+    case FORMAT_UNRECOGNISED:
+        (void)PartitionClean(disk.sz, PARTITION_CLEAN_SYSTEM);
+        break;
+    case FORMAT_WIPE:
+        (void)PartitionClean(disk.sz, PARTITION_CLEAN_ALL);
+        break;
+    default:
+        return CHILD_STATUS_FAILED;
+    }
+    if (PartitionCreate(disk.sz, PARTITION_KIND_SYSTEM, &version) < 0) {
+        NLIBCLog(LOG_ERR, "Failed to create system partition of %s, newlayout=%d, errno=0x%X",
+                 disk.sz, static_cast<int>(version), NLIBCErrGet());
+        return CHILD_STATUS_FAILED;
+    }
+    return CHILD_PARTITIONED;
+}
+
+int PartitionStart(const NLIBSZLIST *pDisks, u32 version, std::span<DISK_CHILD> children)
+{
+    const bool fSomeKeepData = std::any_of(children.begin(), children.end(), [](DISK_CHILD child) {
+        return child.type == FORMAT_KEEP_DATA;
+    });
+    for (int i = 0; i < pDisks->nItem; i++) {
+        DISK_CHILD &child = children[static_cast<size_t>(i)];
+        if (child.type == FORMAT_NONE || (fSomeKeepData && child.type == FORMAT_UNRECOGNISED)) {
+            continue;
+        }
+        if (!ChildStart(child)) {
+            return STATUS_FAILED;
+        }
+        if (child.pid == 0) {
+            return PartitionInChild(NLIBCSzListGet(pDisks, i), child.type, version);
+        }
+    }
+    return GOES_ON;
+}
+
+// The disks whose partitions stand, as members of the two system arrays.
+struct SYSTEM_MEMBERS {
+    int nDisk;
+    MEMBER_LIST system;
+    MEMBER_LIST swap;
+};
+
+void SystemDiskTake(const char *szDisk, int nSlot, SYSTEM_MEMBERS &members)
+{
+    const TEXT disk = DiskPath(szDisk);
+    if (members.nDisk >= nSlot) {
+        // One too many: it must not look like a member of an array that it is not in.
+        (void)PartitionZeroSuperblock(disk.sz, PARTITION_SYSTEM);
+        (void)PartitionZeroSuperblock(disk.sz, PARTITION_SWAP);
+        return;
+    }
+    members.nDisk++;
+    MemberAppend(disk.sz, PARTITION_SYSTEM, members.system);
+    MemberAppend(disk.sz, PARTITION_SWAP, members.swap);
+}
+
+void PartitionCollect(const NLIBSZLIST *pDisks, const DISK_CHILD *pChildren, int nSlot,
+                      SYSTEM_MEMBERS &members)
+{
+    for (int i = 0; i < pDisks->nItem; i++) {
+        const char *const szDisk = NLIBCSzListGet(pDisks, i);
+        if (pChildren[i].pid != NO_CHILD &&
+            ChildWait(pChildren[i].pid, szDisk) == CHILD_PARTITIONED) {
+            SystemDiskTake(szDisk, nSlot, members);
+        }
+    }
+}
+
+// What the duplication tool makes of the partitions does not change the outcome.
+void PartitionsDuplicate(const SYSTEM_MEMBERS &members)
+{
+    char szMembers[DUPLICATE_LIST_SIZE];
+    char szCommand[DUPLICATE_COMMAND_SIZE];
+    (void)snprintf(szMembers, sizeof(szMembers), "%s %s", members.system.sz, members.swap.sz);
+    const int cch =
+        snprintf(szCommand, sizeof(szCommand), "/bin/nurodd %s > /dev/null 2>&1", szMembers);
+    const int result = cch < 0 ? -1 : system(szCommand);
+    if (result == -1) {
+        (void)puts("can not fork to nurodd");
+    } else if (ShellExitStatus(result) != 0) {
+        (void)puts("system init with nurodd failed");
+    }
+}
+
+// The system arrays carry the old superblock format. Kept: compared over the given path's length,
+// so whatever the two paths begin with counts too.
+const char *MetadataOption(const char *szMd)
+{
+    const size_t cchMd = strlen(szMd);
+    const bool fSystemArray =
+        strncmp(szMd, "/dev/md0", cchMd) == 0 || strncmp(szMd, "/dev/md1", cchMd) == 0;
+    return fSystemArray ? "-e 0.9" : "";
+}
+
+void MissingTextBuild(int nMissing, char *szText)
+{
+    size_t cch = 0;
+    szText[0] = '\0';
+    for (int i = 0; i < nMissing && cch < MISSING_TEXT_SIZE - 1; i++) {
+        (void)snprintf(szText + cch, MISSING_TEXT_SIZE - cch, " missing");
+        cch = strlen(szText);
+    }
+}
+
+int SystemRaidCreate(const char *szMd, int nDisk, int nSlot, const char *szMembers)
+{
+    if (szMd == nullptr || szMembers == nullptr) {
+        return -1;
+    }
+    char szMissing[MISSING_TEXT_SIZE];
+    MissingTextBuild(nSlot - nDisk, szMissing);
+    char szCommand[CREATE_COMMAND_SIZE];
+    const int cch = snprintf(szCommand, sizeof(szCommand),
+                             "/sbin/mdadm -C %s %s -amd -R -l1 %s -n%d %s %s> /dev/null 2>&1", szMd,
+                             MetadataOption(szMd), nDisk == 1 ? "-f" : "", nSlot, szMembers,
+                             szMissing);
+    (void)sleep(ARRAY_PAUSE_SECONDS);
+    if (cch < 0 || ShellExitStatus(system(szCommand)) != 0) {
+        NLIBCLog(LOG_ERR, "Failed to create RAID '%s' on '%s' ", szMd, szMembers);
+        NLIBCLog(LOG_ERR, "szCmd=[%s]", szCommand);
+        return -1;
+    }
+    return 0;
+}
+
+// The arrays are attempted; the partitions alone decide the outcome.
+int SystemArraysCreate(const SYSTEM_MEMBERS &members, int nSlot)
+{
+    if (members.nDisk == 0) {
+        NLIBCLog(LOG_ERR, "No disk to create system and swap partition, initsys fail!");
+        return STATUS_FAILED;
+    }
+    (void)SystemRaidCreate("/dev/md0", members.nDisk, nSlot, members.system.sz);
+    (void)SystemRaidCreate("/dev/md1", members.nDisk, nSlot, members.swap.sz);
+    NLIBCLog(LOG_ERR, "system inited on [%s], [%s]", members.system.sz, members.swap.sz);
+    return STATUS_OK;
+}
+
+int SystemInit(bool fDuplicate)
+{
+    PNLIBSZLIST pDisks = DiskListAlloc();
+    const LIST_OWNER disksOwner(&pDisks);
+    if (pDisks == nullptr) {
+        return STATUS_FAILED;
+    }
+    const int nSlot = NLIBCConfMaxSysRaidDisksGet();
+    u32 version = 0;
+    (void)PartitionLayoutGetMax(&version, 1);
+    if (version == 0) {
+        NLIBCLog(LOG_ERR, "Failed to find partition layout");
+        return STATUS_FAILED;
+    }
+    if (!DisksEnum(&pDisks)) {
+        return STATUS_FAILED;
+    }
+    const HEAP_OWNER<DISK_CHILD> pChildren(ChildrenAlloc(pDisks->nItem));
+    if (pChildren == nullptr) {
+        NLIBCLog(LOG_ERR, "failed to alloc");
+        return STATUS_FAILED;
+    }
+    int status = DecideStart(pDisks, version, pChildren.get());
+    if (status != GOES_ON) {
+        return status;
+    }
+    DecideCollect(pDisks, pChildren.get());
+    status = PartitionStart(pDisks, version, {pChildren.get(), static_cast<size_t>(pDisks->nItem)});
+    if (status != GOES_ON) {
+        return status;
+    }
+    SYSTEM_MEMBERS members = {};
+    PartitionCollect(pDisks, pChildren.get(), nSlot, members);
+    if (fDuplicate) {
+        PartitionsDuplicate(members);
+    }
+    return SystemArraysCreate(members, nSlot);
+}
+
+// --- newvol ------------------------------------------------------------------------------------
+
+constexpr char DATA_MD_PATH[] = "/dev/md2";
+constexpr int PARTITION_DATA = 3;
+constexpr int NEWVOL_ARGUMENT_COUNT = 2;
+constexpr int SPLIT_UNITS_DEFAULT = 12;
+constexpr int SPLIT_UNITS_VALUE_SIZE = 16;
+constexpr int MIRROR_DISKS_MAX = 2;
+
+struct LEVEL_MARKER {
+    const char *szMarker;
+    int level;
+};
+
+// The first one that is there decides.
+constexpr LEVEL_MARKER LEVEL_MARKERS[] = {
+    {"/tmp/raid.0", 0},
+    {"/tmp/raid.1", 1},
+    {"/tmp/raid.5", 5},
+};
+
+// How many disks of an expansion unit one data array may have.
+int RaidGroupSplitUnitsGet()
+{
+    char szValue[SPLIT_UNITS_VALUE_SIZE];
+    const int cbFound = NLIBCFileGetKeyValue(NUROINFO_CONF_PATH, "raidgroup_split_units", szValue,
+                                             SPLIT_UNITS_VALUE_SIZE, KEYVALUE_FIRST_MATCH);
+    return cbFound < 1 ? SPLIT_UNITS_DEFAULT : NLIBCStrToI32(szValue);
+}
+
+int NoDisk()
+{
+    (void)puts("No disk to create RAID... ");
+    return STATUS_FAILED;
+}
+
+bool DataPartitionRenew(const char *szDisk)
+{
+    const u32 versionNewest = 0;
+    if (PartitionClean(szDisk, PARTITION_CLEAN_DATA) < 0) {
+        NLIBCLog(LOG_ERR, "Failed to clean all partition of %s, errno=0x%X", szDisk, NLIBCErrGet());
+        return false;
+    }
+    if (PartitionCreate(szDisk, PARTITION_KIND_DATA, &versionNewest) < 0) {
+        NLIBCLog(LOG_ERR, "Failed to create data partition of %s, errno=0x%X", szDisk,
+                 NLIBCErrGet());
+        return false;
+    }
+    return true;
+}
+
+// Prepares the disks one after the other; the first that fails ends it. Returns how many are
+// members, -1 on failure.
+int DataMembersPrepare(const NLIBSZLIST *pDisks, MEMBER_LIST &members)
+{
+    int nUsed = 0;
+    for (; nUsed < pDisks->nItem; nUsed++) {
+        const TEXT disk = DiskPath(NLIBCSzListGet(pDisks, nUsed));
+        if (NLIBCConfSupportDualHead() != 0 && RaidGroupSplitUnitsGet() <= nUsed) {
+            NLIBCLog(LOG_ERR, "Get %d disks, more than raid group split unit", nUsed);
+            break;
+        }
+        if (!DataPartitionRenew(disk.sz)) {
+            return -1;
+        }
+        MemberAppend(disk.sz, PARTITION_DATA, members);
+    }
+    return nUsed;
+}
+
+int LevelChoose(int nDisk)
+{
+    for (const LEVEL_MARKER &row : LEVEL_MARKERS) {
+        if (access(row.szMarker, R_OK) == 0) {
+            return row.level;
+        }
+    }
+    return nDisk > MIRROR_DISKS_MAX ? 5 : 1;
+}
+
+int DataArrayCreate(int nDisk, const MEMBER_LIST &members)
+{
+    const int level = LevelChoose(nDisk);
+    (void)printf("Creating RAID %d volume... \n", level);
+
+    char szCommand[CREATE_COMMAND_SIZE];
+    (void)snprintf(szCommand, sizeof(szCommand),
+                   "/sbin/mdadm -C %s -amd -R -l%d %s -n%d %s> /dev/null 2>&1", DATA_MD_PATH, level,
+                   nDisk == 1 ? "-f" : "", nDisk, members.sz);
+    const int status = ShellExitStatus(system(szCommand));
+    if (status != 0) {
+        NLIBCLog(LOG_ERR, "Failed to create RAID '%s' on '%s', errno=%d", DATA_MD_PATH, members.sz,
+                 status);
+        return STATUS_FAILED;
+    }
+    return STATUS_OK;
+}
+
+int DataVolumeCreate(int argc)
+{
+    PNLIBSZLIST pDisks = NLIBCSzListAlloc(DISK_LIST_SIZE);
+    const LIST_OWNER owner(&pDisks);
+    if (argc != NEWVOL_ARGUMENT_COUNT) {
+        (void)puts(USAGE);
+        return STATUS_FAILED;
+    }
+    if (pDisks == nullptr) {
+        NLIBCLog(LOG_ERR, "Out of memeory, failed to allocate memory for PNLIBSZLIST via "
+                          "NLIBCSzListAlloc");
+        return STATUS_FAILED;
+    }
+    if (!DisksEnum(&pDisks)) {
+        return STATUS_FAILED;
+    }
+    if (pDisks->nItem == 0) {
+        return NoDisk();
+    }
+    MEMBER_LIST members = {};
+    const int nUsed = DataMembersPrepare(pDisks, members);
+    if (nUsed < 0) {
+        return STATUS_FAILED;
+    }
+    return nUsed == 0 ? NoDisk() : DataArrayCreate(nUsed, members);
+}
+
+// --- enumformatalldisks, enumformatalldisks_indualhead_install ---------------------------------
+
+constexpr size_t NUMBERS_TEXT_SIZE = 4096;
+constexpr int STATUS_PUSH_FAILED = -1; // 255 to whoever started the tool
+
+struct FORMAT_LISTS {
+    PNLIBSZLIST pAll;
+    PNLIBSZLIST pKeepData;
+    PNLIBSZLIST pFormatAll;
+};
+
+int PushDecided(PNLIBSZLIST *ppList, const char *szDisk)
+{
+    if (NLIBCSzListPush(ppList, szDisk) < 0) {
+        NLIBCLog(LOG_ERR, "Push %s into FormatAllList failed", DiskPath(szDisk).sz);
+        return -1;
+    }
+    return 0;
+}
+
+int FormatTypesCollect(const DISK_CHILD *pChildren, FORMAT_LISTS &lists)
+{
+    for (int i = 0; i < lists.pAll->nItem; i++) {
+        const char *const szDisk = NLIBCSzListGet(lists.pAll, i);
+        const int type = ChildWait(pChildren[i].pid, szDisk);
+        if (type == FORMAT_KEEP_DATA && PushDecided(&lists.pKeepData, szDisk) != 0) {
+            return -1;
+        }
+        if (type == FORMAT_WIPE && PushDecided(&lists.pFormatAll, szDisk) != 0) {
+            return -1;
+        }
+    }
+    return 0;
+}
+
+void NumbersBuild(const NLIBSZLIST *pDisks, char *szNumbers)
+{
+    size_t cch = 0;
+    szNumbers[0] = '\0';
+    for (int i = 0; i < pDisks->nItem && cch < NUMBERS_TEXT_SIZE - 1; i++) {
+        const TEXT disk = DiskPath(NLIBCSzListGet(pDisks, i));
+        DISK_PATH_INFO info = {};
+        if (DiskPathParse(disk.sz, &info) != 0) {
+            NLIBCLog(LOG_ERR, "DiskPathParse(%s) fail", disk.sz);
+        }
+        (void)snprintf(szNumbers + cch, NUMBERS_TEXT_SIZE - cch, "%d ", info.diskIndex);
+        cch = strlen(szNumbers);
+    }
+}
+
+// Prints the numbers and returns how many; one is also the status of a failure, and callers tell
+// them apart by what is printed.
+int FormatAllPrint(const FORMAT_LISTS &lists, bool fDualHeadInstall)
+{
+    // Without any disk that keeps its data, all are formatted, the unrecognised ones too.
+    const NLIBSZLIST *const pChosen = lists.pKeepData->nItem > 0 ? lists.pFormatAll : lists.pAll;
+    char szNumbers[NUMBERS_TEXT_SIZE];
+    NumbersBuild(pChosen, szNumbers);
+    const bool fAll =
+        fDualHeadInstall && NLIBCConfSupportDualHead() != 0 && szNumbers[0] != '\0';
+    (void)printf("%s", fAll ? "all" : szNumbers);
+    return pChosen->nItem;
+}
+
+int FormatAllDisksEnum(bool fDualHeadInstall)
+{
+    FORMAT_LISTS lists = {};
+    const LIST_OWNER allOwner(&lists.pAll);
+    const LIST_OWNER keepDataOwner(&lists.pKeepData);
+    const LIST_OWNER formatAllOwner(&lists.pFormatAll);
+    for (PNLIBSZLIST *const ppList : {&lists.pAll, &lists.pKeepData, &lists.pFormatAll}) {
+        *ppList = DiskListAlloc();
+        if (*ppList == nullptr) {
+            return STATUS_FAILED;
+        }
+    }
+    if (!DisksEnum(&lists.pAll)) {
+        return STATUS_FAILED;
+    }
+    u32 version = 0;
+    (void)PartitionLayoutGet(&version);
+    if (version == 0) {
+        NLIBCLog(LOG_ERR, "Failed to find partition layout");
+        return STATUS_FAILED;
+    }
+    const HEAP_OWNER<DISK_CHILD> pChildren(ChildrenAlloc(lists.pAll->nItem));
+    if (pChildren == nullptr) {
+        NLIBCLog(LOG_ERR, "Failed to alloc");
+        return STATUS_FAILED;
+    }
+    const int status = DecideStart(lists.pAll, version, pChildren.get());
+    if (status != GOES_ON) {
+        return status;
+    }
+    if (FormatTypesCollect(pChildren.get(), lists) != 0) {
+        return STATUS_PUSH_FAILED;
+    }
+    return FormatAllPrint(lists, fDualHeadInstall);
+}
+
+// --- dispatch ----------------------------------------------------------------------------------
+
+// What a command says about its RAID ID.
+enum class RAID_ID {
+    NONE,            // it takes none; further arguments are its own business
+    EXACTLY_ONE,     // anything else is answered with the usage
+    ONE_AND_IGNORED, // without one, it says so; further arguments are ignored
+};
+
+struct COMMAND {
+    std::string_view word;
+    RAID_ID raidId;
+    int (*pRun)(int argc, const char *szMd);
+};
+
+int RunDestroy(int /*argc*/, const char *szMd)
+{
+    return ArrayDestroy(szMd);
+}
+
+int RunStatus(int /*argc*/, const char *szMd)
+{
+    return StatusReport(szMd);
+}
+
+int RunNewvol(int argc, const char * /*szMd*/)
+{
+    return DataVolumeCreate(argc);
+}
+
+int RunInitsys(int /*argc*/, const char * /*szMd*/)
+{
+    return SystemInit(false);
+}
+
+int RunInitsysDuplicate(int /*argc*/, const char * /*szMd*/)
+{
+    return SystemInit(true);
+}
+
+int RunEnumFormatAll(int /*argc*/, const char * /*szMd*/)
+{
+    return FormatAllDisksEnum(false);
+}
+
+int RunEnumFormatAllDualHead(int /*argc*/, const char * /*szMd*/)
+{
+    return FormatAllDisksEnum(true);
+}
+
+// The last two are for the installer and not in the usage.
+constexpr COMMAND COMMANDS[] = {
+    {"destroy", RAID_ID::EXACTLY_ONE, RunDestroy},
+    {"status", RAID_ID::ONE_AND_IGNORED, RunStatus},
+    {"newvol", RAID_ID::NONE, RunNewvol},
+    {"initsys", RAID_ID::NONE, RunInitsys},
+    {"initsys-dd", RAID_ID::NONE, RunInitsysDuplicate},
+    {"enumformatalldisks", RAID_ID::NONE, RunEnumFormatAll},
+    {"enumformatalldisks_indualhead_install", RAID_ID::NONE, RunEnumFormatAllDualHead},
+};
+
+constexpr int RAID_ID_ARGUMENT = 2;
+constexpr int RAID_ID_ARGUMENT_COUNT = RAID_ID_ARGUMENT + 1;
+
+int Usage()
+{
+    (void)puts(USAGE);
+    return STATUS_FAILED;
+}
+
+int CommandRun(const COMMAND &command, int argc, char *argv[])
+{
+    char szMd[MD_PATH_SIZE] = "";
+    if (command.raidId == RAID_ID::EXACTLY_ONE && argc != RAID_ID_ARGUMENT_COUNT) {
+        return Usage();
+    }
+    if (command.raidId == RAID_ID::ONE_AND_IGNORED && argc < RAID_ID_ARGUMENT_COUNT) {
+        (void)puts("parameters not enough");
+        return Usage();
+    }
+    if (command.raidId != RAID_ID::NONE) {
+        (void)snprintf(szMd, sizeof(szMd), "/dev/md%d", NLIBCStrToI32(argv[RAID_ID_ARGUMENT]));
+    }
+    return command.pRun(argc, szMd);
+}
+
+} // namespace
+
+int main(int argc, char *argv[])
+{
+    if (argc <= 1) {
+        return Usage();
+    }
+    for (const COMMAND &command : COMMANDS) {
+        if (command.word == argv[1]) {
+            return CommandRun(command, argc, argv);
+        }
+    }
+    (void)puts("command not recognized");
+    return Usage();
+}
