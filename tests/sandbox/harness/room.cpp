@@ -1,0 +1,576 @@
+// SPDX-License-Identifier: MIT
+#include "room.h"
+
+#include "wire.h"
+
+#include <cerrno>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <dirent.h>
+#include <fcntl.h>
+#include <linux/mount.h>
+#include <sched.h>
+#include <sys/mount.h>
+#include <sys/socket.h>
+#include <sys/stat.h>
+#include <sys/syscall.h>
+#include <sys/un.h>
+#include <unistd.h>
+
+namespace
+{
+
+std::string g_szRoot;
+int g_fdLog = -1;
+
+constexpr const char *HOST_FOLDERS[] = {"/usr", "/lib", "/lib32", "/lib64", "/libx32"};
+constexpr const char *ROOM_FOLDERS[] = {"/bin", "/dev", "/sbin", WIRE_FOLDER, WIRE_PROC};
+constexpr const char *TOOL_PATHS[] = {
+    "/sbin/mdadm",    "/sbin/sfdisk",   "/sbin/pvs",   "/sbin/lvremove",
+    "/sbin/vgremove", "/sbin/pvremove", "/bin/umount", "/bin/nurodd",
+};
+
+// The host's shell, unless the machine has another.
+constexpr const char *SHELL_PATH = "/bin/sh";
+
+// What survives the emptying of the room, folder by folder.
+const std::set<std::string> KEPT_TOP = {"usr", "lib", "lib32", "lib64",   "libx32",
+                                        "bin", "dev", "sbin",  ".sandbox"};
+const std::set<std::string> KEPT_DEV = {"null", "log", "log.away"};
+
+constexpr const char *HINT =
+    "; this kernel or container refuses what the sandbox needs: run the ring in the virtual "
+    "appliance";
+
+[[noreturn]] void Die(const std::string &szWhat)
+{
+    fprintf(stderr, "sandbox: %s: %s\n", szWhat.c_str(), strerror(errno));
+    abort();
+}
+
+std::string Inside(const std::string &szPath)
+{
+    return g_szRoot + szPath;
+}
+
+void TextWrite(const std::string &szPath, std::string_view szText, mode_t mode)
+{
+    const int fd = open(szPath.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, 0600);
+    if (fd < 0 || write(fd, szText.data(), szText.size()) != static_cast<ssize_t>(szText.size()) ||
+        fchmod(fd, mode) != 0) {
+        Die("write " + szPath);
+    }
+    close(fd);
+}
+
+void FoldersMake(const std::string &szFolder)
+{
+    for (size_t i = szFolder.find('/', 1); i != std::string::npos; i = szFolder.find('/', i + 1)) {
+        (void)mkdir(Inside(szFolder.substr(0, i)).c_str(), 0755);
+    }
+    if (mkdir(Inside(szFolder).c_str(), 0755) != 0 && errno != EEXIST) {
+        Die("mkdir " + szFolder);
+    }
+}
+
+std::string ParentOf(const std::string &szPath)
+{
+    return szPath.substr(0, std::max<size_t>(szPath.rfind('/'), 1));
+}
+
+// ---- entering ----------------------------------------------------------------------------------
+
+std::string Refused(const std::string &szWhat)
+{
+    return szWhat + ": " + strerror(errno) + HINT;
+}
+
+bool MapWrite(const char *szPath, const std::string &szText)
+{
+    const int fd = open(szPath, O_WRONLY | O_CLOEXEC);
+    const bool fDone =
+        fd >= 0 && write(fd, szText.data(), szText.size()) == static_cast<ssize_t>(szText.size());
+    if (fd >= 0) {
+        close(fd);
+    }
+    return fDone;
+}
+
+std::string NamespacesEnter()
+{
+    const std::string szUser = std::to_string(getuid());
+    const std::string szGroup = std::to_string(getgid());
+    if (unshare(CLONE_NEWUSER | CLONE_NEWNS) != 0) {
+        return Refused("unshare of the user and mount namespaces");
+    }
+    (void)MapWrite("/proc/self/setgroups", "deny");
+    if (!MapWrite("/proc/self/uid_map", "0 " + szUser + " 1") ||
+        !MapWrite("/proc/self/gid_map", "0 " + szGroup + " 1")) {
+        return Refused("map of the user namespace");
+    }
+    if (mount(nullptr, "/", nullptr, MS_REC | MS_PRIVATE, nullptr) != 0) {
+        return Refused("private mounts");
+    }
+    return "";
+}
+
+void RootRemove()
+{
+    (void)umount2(g_szRoot.c_str(), MNT_DETACH);
+    (void)rmdir(g_szRoot.c_str());
+}
+
+std::string RootMount()
+{
+    if (mount("sandbox", g_szRoot.c_str(), "tmpfs", 0, "mode=755,size=512m") != 0) {
+        return Refused("tmpfs");
+    }
+    for (const char *const szFolder : ROOM_FOLDERS) {
+        FoldersMake(szFolder);
+    }
+    return "";
+}
+
+std::string ReadOnlyBind(const std::string &szFolder)
+{
+    FoldersMake(szFolder);
+    const std::string szTarget = Inside(szFolder);
+    if (mount(szFolder.c_str(), szTarget.c_str(), nullptr, MS_BIND | MS_REC, nullptr) != 0) {
+        return Refused("bind of " + szFolder);
+    }
+    struct mount_attr attributes = {};
+    attributes.attr_set = MOUNT_ATTR_RDONLY;
+    if (syscall(SYS_mount_setattr, -1, szTarget.c_str(), AT_RECURSIVE, &attributes,
+                sizeof(attributes)) != 0) {
+        return Refused("read-only bind of " + szFolder);
+    }
+    return "";
+}
+
+// The host's libraries and programs; a folder that is a link on the host is the same link inside.
+std::string HostFoldersBind()
+{
+    for (const std::string szFolder : HOST_FOLDERS) {
+        struct stat info = {};
+        char szTarget[256] = "";
+        if (lstat(szFolder.c_str(), &info) != 0) {
+            continue;
+        }
+        if (S_ISLNK(info.st_mode)) {
+            (void)!readlink(szFolder.c_str(), szTarget, sizeof(szTarget) - 1);
+            (void)!symlink(szTarget, Inside(szFolder).c_str());
+            continue;
+        }
+        const std::string szRefused = ReadOnlyBind(szFolder);
+        if (!szRefused.empty()) {
+            return szRefused;
+        }
+    }
+    return "";
+}
+
+std::string NullBind()
+{
+    TextWrite(Inside("/dev/null"), "", 0666);
+    if (mount("/dev/null", Inside("/dev/null").c_str(), nullptr, MS_BIND, nullptr) != 0) {
+        return Refused("bind of /dev/null");
+    }
+    return "";
+}
+
+// A coverage build writes its counts beside its object files, wherever it runs.
+std::string CoverageBind()
+{
+#ifdef SANDBOX_COVERAGE
+    const std::string szFolder = SANDBOX_COVERAGE;
+    FoldersMake(szFolder);
+    if (mount(szFolder.c_str(), Inside(szFolder).c_str(), nullptr, MS_BIND, nullptr) != 0) {
+        return Refused("bind of " + szFolder);
+    }
+#endif
+    return "";
+}
+
+std::string FileCopy(const std::string &szFrom, const std::string &szTo)
+{
+    FILE *const p = fopen(szFrom.c_str(), "re");
+    if (p == nullptr) {
+        return "cannot read " + szFrom + ": " + strerror(errno);
+    }
+    std::string szBytes;
+    char ach[65536];
+    for (size_t cb = 0; (cb = fread(ach, 1, sizeof(ach), p)) > 0;) {
+        szBytes.append(ach, cb);
+    }
+    (void)fclose(p);
+    TextWrite(Inside(szTo), szBytes, 0755);
+    return "";
+}
+
+std::string FromEnvironment(const char *szName, const char *szDefault)
+{
+    const char *const sz = getenv(szName);
+    return sz != nullptr && *sz != '\0' ? sz : szDefault;
+}
+
+std::string ProgramsCopy()
+{
+    const struct {
+        std::string szFrom;
+        std::string szTo;
+    } copies[] = {
+        {FromEnvironment("ARRAYCTL_BINARY", ARRAYCTL_BINARY), WIRE_PROGRAM},
+        {FromEnvironment("ARRAYCTL_INTERPOSE", SANDBOX_INTERPOSE), WIRE_INTERPOSE},
+        {SANDBOX_STANDIN, WIRE_STANDIN},
+        {"/bin/sh", WIRE_SHELL},
+    };
+    for (const auto &copy : copies) {
+        const std::string szProblem = FileCopy(copy.szFrom, copy.szTo);
+        if (!szProblem.empty()) {
+            return szProblem;
+        }
+    }
+    return "";
+}
+
+std::string LogSocketMake()
+{
+    struct sockaddr_un address = {};
+    address.sun_family = AF_UNIX;
+    snprintf(address.sun_path, sizeof(address.sun_path), "%s", Inside("/dev/log").c_str());
+    g_fdLog = socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0);
+    if (g_fdLog < 0 ||
+        bind(g_fdLog, reinterpret_cast<const struct sockaddr *>(&address), sizeof(address)) != 0) {
+        return Refused("/dev/log");
+    }
+    return "";
+}
+
+std::string RoomMake()
+{
+    char szRoot[] = "/tmp/arrayctl-sandbox.XXXXXX";
+    if (mkdtemp(szRoot) == nullptr) {
+        return Refused("folder for the private root");
+    }
+    g_szRoot = szRoot;
+    (void)atexit(RootRemove);
+    using STEP = std::string (*)();
+    constexpr STEP STEPS[] = {NamespacesEnter, RootMount,    HostFoldersBind, NullBind,
+                              CoverageBind,    ProgramsCopy, LogSocketMake};
+    for (const STEP step : STEPS) {
+        std::string szRefused = step();
+        if (!szRefused.empty()) {
+            return szRefused;
+        }
+    }
+    return "";
+}
+
+// ---- emptying ----------------------------------------------------------------------------------
+
+const std::set<std::string> &KeptNothing()
+{
+    static const std::set<std::string> none;
+    return none;
+}
+
+// Removes what is in the folder, never leaving its file system, so that nothing that is bound into
+// the room can be reached.
+void FolderEmpty(int fdParent, const char *szName, dev_t device, const std::set<std::string> &kept)
+{
+    const int fd = openat(fdParent, szName, O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
+    struct stat info = {};
+    if (fd < 0 || fstat(fd, &info) != 0 || info.st_dev != device) {
+        if (fd >= 0) {
+            close(fd);
+        }
+        return;
+    }
+    DIR *const pFolder = fdopendir(fd);
+    for (struct dirent *pEntry = readdir(pFolder); pEntry != nullptr; pEntry = readdir(pFolder)) {
+        const std::string szEntry = pEntry->d_name;
+        if (szEntry == "." || szEntry == ".." || kept.contains(szEntry)) {
+            continue;
+        }
+        if (pEntry->d_type == DT_DIR) {
+            FolderEmpty(dirfd(pFolder), pEntry->d_name, device, KeptNothing());
+            (void)unlinkat(dirfd(pFolder), pEntry->d_name, AT_REMOVEDIR);
+        } else {
+            (void)unlinkat(dirfd(pFolder), pEntry->d_name, 0);
+        }
+    }
+    (void)closedir(pFolder);
+}
+
+void RoomEmpty()
+{
+    const int fdRoot = open(g_szRoot.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+    struct stat info = {};
+    if (fdRoot < 0 || fstat(fdRoot, &info) != 0) {
+        Die("open " + g_szRoot);
+    }
+    FolderEmpty(fdRoot, ".", info.st_dev, KEPT_TOP);
+    FolderEmpty(fdRoot, "bin", info.st_dev, KeptNothing());
+    FolderEmpty(fdRoot, "sbin", info.st_dev, KeptNothing());
+    FolderEmpty(fdRoot, "dev", info.st_dev, KEPT_DEV);
+    close(fdRoot);
+}
+
+// ---- laying out --------------------------------------------------------------------------------
+
+void ProgramLink(const std::string &szProgram, const std::string &szPath)
+{
+    if (link(Inside(szProgram).c_str(), Inside(szPath).c_str()) != 0) {
+        Die("link " + szPath);
+    }
+}
+
+void ToolLayOut(const std::string &szPath, TOOL_KIND kind)
+{
+    FoldersMake(ParentOf(szPath));
+    switch (kind) {
+    case TOOL_KIND::STANDIN:
+        ProgramLink(WIRE_STANDIN, szPath);
+        return;
+    case TOOL_KIND::MISSING:
+        return;
+    case TOOL_KIND::FOLDER:
+        FoldersMake(szPath);
+        return;
+    case TOOL_KIND::NOT_EXECUTABLE:
+        TextWrite(Inside(szPath), "#!/bin/sh\n", 0644);
+        return;
+    }
+}
+
+void ToolsLayOut(const MACHINE &machine)
+{
+    std::map<std::string, TOOL_KIND> tools = machine.tools;
+    for (const char *const szPath : TOOL_PATHS) {
+        tools.emplace(szPath, TOOL_KIND::STANDIN);
+    }
+    for (const auto &[szPath, kind] : tools) {
+        ToolLayOut(szPath, kind);
+    }
+    if (!tools.contains(SHELL_PATH)) {
+        FoldersMake(ParentOf(SHELL_PATH));
+        ProgramLink(WIRE_SHELL, SHELL_PATH);
+    }
+}
+
+void LogLayOut(bool fNoLog)
+{
+    const std::string szHere = Inside("/dev/log");
+    const std::string szAway = Inside("/dev/log.away");
+    (void)(fNoLog ? rename(szHere.c_str(), szAway.c_str())
+                  : rename(szAway.c_str(), szHere.c_str()));
+}
+
+#ifdef SANDBOX_SANITIZED
+// A sanitizer looks at its own process below /proc by number; runs have small numbers.
+void ProcLinksLayOut()
+{
+    constexpr int PROCESS_NUMBERS = 32;
+    FoldersMake("/proc");
+    (void)!symlink(WIRE_PROC "/self", Inside("/proc/self").c_str());
+    for (int pid = 1; pid <= PROCESS_NUMBERS; pid++) {
+        const std::string szPid = std::to_string(pid);
+        (void)!symlink((WIRE_PROC "/" + szPid).c_str(), Inside("/proc/" + szPid).c_str());
+    }
+}
+#endif
+
+// ---- what stand-ins and driver answer -----------------------------------------------------------
+
+void FieldAdd(std::string &szRecord, std::string_view szText)
+{
+    szRecord += std::to_string(szText.size());
+    szRecord += ':';
+    szRecord += szText;
+}
+
+template <typename NUMBER>
+void NumberAdd(std::string &szRecord, NUMBER number)
+{
+    FieldAdd(szRecord, std::to_string(number) + " ");
+}
+
+std::string RowRecord(const TOOL_ROW &row)
+{
+    std::string szRecord;
+    NumberAdd(szRecord, row.answer.nTimes);
+    NumberAdd(szRecord, row.argv.size());
+    for (const std::string &szArgument : row.argv) {
+        FieldAdd(szRecord, szArgument);
+    }
+    FieldAdd(szRecord, row.answer.szOut);
+    FieldAdd(szRecord, row.answer.szErr);
+    NumberAdd(szRecord, row.answer.status);
+    NumberAdd(szRecord, row.answer.signal);
+    NumberAdd(szRecord, row.answer.msDelay);
+    NumberAdd(szRecord, row.answer.cbFlood);
+    NumberAdd(szRecord, row.answer.msGrandchild);
+    NumberAdd(szRecord, row.answer.writes.size());
+    for (const auto &[szPath, szText] : row.answer.writes) {
+        FieldAdd(szRecord, szPath);
+        FieldAdd(szRecord, szText);
+    }
+    NumberAdd(szRecord, row.answer.removes.size());
+    for (const std::string &szPath : row.answer.removes) {
+        FieldAdd(szRecord, szPath);
+    }
+    return szRecord;
+}
+
+std::string ArrayRecord(const MACHINE_MD &md)
+{
+    std::string szRecord;
+    FieldAdd(szRecord, "device ");
+    FieldAdd(szRecord, "/dev/md" + std::to_string(md.nMd) + " ");
+    NumberAdd(szRecord, 1);
+    NumberAdd(szRecord, md.deviceMajor);
+    NumberAdd(szRecord, md.deviceMinor.value_or(static_cast<unsigned int>(md.nMd)));
+    NumberAdd(szRecord, md.errnoInfo);
+    // In the order of the driver's record; what the program has no use for is 0.
+    const int words[18] = {md.majorVersion,
+                           md.minorVersion,
+                           0,
+                           0,
+                           md.level,
+                           md.size,
+                           0,
+                           md.nRaidDisks,
+                           md.nMd,
+                           0,
+                           0,
+                           1,
+                           md.nActiveDisks,
+                           0,
+                           0,
+                           md.nSpareDisks,
+                           0,
+                           0};
+    for (const int word : words) {
+        NumberAdd(szRecord, word);
+    }
+    NumberAdd(szRecord, md.errnoSize);
+    NumberAdd(szRecord, md.arraySize);
+    NumberAdd(szRecord, md.errnoHealth);
+    NumberAdd(szRecord, md.health);
+    NumberAdd(szRecord, md.errnoSync);
+    NumberAdd(szRecord, md.activity);
+    NumberAdd(szRecord, md.done);
+    NumberAdd(szRecord, md.total);
+    return szRecord;
+}
+
+std::string NodeRecord(const MACHINE_DEVICE_SIZE &node)
+{
+    constexpr int DISK_MAJOR = 8;
+    constexpr int ARRAY_INFO_FIELDS = 19;
+    std::string szRecord;
+    FieldAdd(szRecord, "device ");
+    FieldAdd(szRecord, node.szPath + " ");
+    NumberAdd(szRecord, 0);
+    NumberAdd(szRecord, DISK_MAJOR);
+    NumberAdd(szRecord, 0);
+    for (int i = 0; i < ARRAY_INFO_FIELDS; i++) {
+        NumberAdd(szRecord, 0);
+    }
+    NumberAdd(szRecord, node.errnoSize);
+    NumberAdd(szRecord, node.cb);
+    return szRecord;
+}
+
+std::string FaultRecord(const MACHINE_FAULT &fault)
+{
+    std::string szRecord;
+    FieldAdd(szRecord, "fault ");
+    FieldAdd(szRecord, fault.szFunction + " ");
+    NumberAdd(szRecord, fault.nCall);
+    NumberAdd(szRecord, fault.error);
+    NumberAdd(szRecord, fault.fGoOn ? 1 : 0);
+    return szRecord;
+}
+
+std::string DriverText(const MACHINE &machine)
+{
+    std::string szText;
+    for (const MACHINE_MD &md : machine.arrays) {
+        FieldAdd(szText, ArrayRecord(md));
+    }
+    for (const MACHINE_DEVICE_SIZE &node : machine.deviceSizes) {
+        FieldAdd(szText, NodeRecord(node));
+    }
+    for (const MACHINE_FAULT &fault : machine.faults) {
+        FieldAdd(szText, FaultRecord(fault));
+    }
+    if (machine.fRealSleep) {
+        std::string szRecord;
+        FieldAdd(szRecord, "realsleep ");
+        FieldAdd(szText, szRecord);
+    }
+    return szText;
+}
+
+} // namespace
+
+const std::string &RoomEnter()
+{
+    static const std::string szRefused = RoomMake();
+    return szRefused;
+}
+
+const std::string &RoomRoot()
+{
+    return g_szRoot;
+}
+
+int RoomLogSocket()
+{
+    return g_fdLog;
+}
+
+void RoomAnswersWrite(const MACHINE &machine)
+{
+    std::string szRows;
+    for (const TOOL_ROW &row : machine.rows) {
+        FieldAdd(szRows, RowRecord(row));
+    }
+    TextWrite(Inside(WIRE_ROWS), szRows, 0644);
+    TextWrite(Inside(WIRE_USED), std::string(machine.rows.size() * sizeof(std::uint32_t), '\0'),
+              0644);
+    TextWrite(Inside(WIRE_DRIVER), DriverText(machine), 0644);
+    TextWrite(Inside(WIRE_TRANSCRIPT), "", 0666);
+    LogLayOut(machine.fNoLog);
+}
+
+void RoomLayOut(const MACHINE &machine)
+{
+    RoomEmpty();
+#ifdef SANDBOX_SANITIZED
+    ProcLinksLayOut();
+#endif
+    for (const std::string &szFolder : machine.folders) {
+        FoldersMake(szFolder);
+    }
+    for (const auto &[szPath, file] : machine.files) {
+        FoldersMake(ParentOf(szPath));
+        TextWrite(Inside(szPath), file.szText, file.mode);
+    }
+    for (const auto &[szPath, szTarget] : machine.links) {
+        FoldersMake(ParentOf(szPath));
+        if (symlink(szTarget.c_str(), Inside(szPath).c_str()) != 0) {
+            Die("symlink " + szPath);
+        }
+    }
+    for (const std::string &szPath : machine.fifos) {
+        FoldersMake(ParentOf(szPath));
+        if (mkfifo(Inside(szPath).c_str(), 0644) != 0) {
+            Die("mkfifo " + szPath);
+        }
+    }
+    ToolsLayOut(machine);
+    RoomAnswersWrite(machine);
+}

@@ -1,0 +1,452 @@
+// SPDX-License-Identifier: MIT
+#include "sandbox.h"
+
+#include "interpose.h"
+#include "room.h"
+#include "transcript.h"
+#include "wire.h"
+
+#include <gtest/gtest.h>
+
+#include <cerrno>
+#include <chrono>
+#include <csignal>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <fcntl.h>
+#include <poll.h>
+#include <sched.h>
+#include <sys/mman.h>
+#include <sys/mount.h>
+#include <sys/prctl.h>
+#include <sys/socket.h>
+#include <sys/stat.h>
+#include <sys/syscall.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+extern char **environ;
+
+#ifdef SANDBOX_COVERAGE
+extern "C" void __gcov_dump();
+#endif
+
+namespace
+{
+
+constexpr int STATUS_NOT_STARTED = 126;
+constexpr size_t LOG_LINE_SIZE = 65536;
+
+// What the supervisor of a run tells at its end.
+struct CHILD_REPORT {
+    int status; // as wait gives it
+    int nUnreaped;
+    int nRunning;
+};
+
+// The descriptors that a run writes to.
+struct RUN_STREAMS {
+    int fdIn;
+    int fdOut;
+    int fdErr;
+    int fdFailures; // of the body of MachineCall
+};
+
+using BODY = std::function<void(const RUN_STREAMS &)>;
+
+int MemoryFile(const char *szName, std::string_view szText = {})
+{
+    const int fd = memfd_create(szName, MFD_CLOEXEC);
+    if (fd < 0 || write(fd, szText.data(), szText.size()) != static_cast<ssize_t>(szText.size()) ||
+        lseek(fd, 0, SEEK_SET) != 0) {
+        perror("sandbox: memfd");
+        abort();
+    }
+    return fd;
+}
+
+std::string MemoryFileTake(int fd)
+{
+    struct stat info = {};
+    (void)fstat(fd, &info);
+    std::string szText(static_cast<size_t>(info.st_size), '\0');
+    const ssize_t cb = pread(fd, szText.data(), szText.size(), 0);
+    szText.resize(cb < 0 ? 0 : static_cast<size_t>(cb));
+    close(fd);
+    return szText;
+}
+
+// ---- the process that is watched ---------------------------------------------------------------
+
+void RoomGoInside()
+{
+    if (chroot(RoomRoot().c_str()) != 0 || chdir("/") != 0) {
+        perror("sandbox: chroot");
+        _exit(STATUS_NOT_STARTED);
+    }
+}
+
+void StreamsTake(const RUN_STREAMS &streams)
+{
+    (void)dup2(streams.fdIn, STDIN_FILENO);
+    (void)dup2(streams.fdOut, STDOUT_FILENO);
+    (void)dup2(streams.fdErr, STDERR_FILENO);
+    for (int fd = STDERR_FILENO + 1; fd < streams.fdFailures; fd++) {
+        (void)close(fd);
+    }
+}
+
+std::vector<char *> Pointers(std::vector<std::string> &strings)
+{
+    std::vector<char *> pointers;
+    for (std::string &sz : strings) {
+        pointers.push_back(sz.data());
+    }
+    pointers.push_back(nullptr);
+    return pointers;
+}
+
+std::vector<std::string> WordsOf(const char *szText)
+{
+    std::vector<std::string> words;
+    for (const char *pch = szText; pch != nullptr && *pch != '\0';) {
+        const size_t cb = strcspn(pch, " ");
+        words.emplace_back(pch, cb);
+        pch += cb + strspn(pch + cb, " ");
+    }
+    return words;
+}
+
+std::vector<std::string> EnvironmentOf(const MACHINE &machine)
+{
+    std::vector<std::string> environment;
+    for (const auto &[szName, szValue] : machine.environment) {
+        environment.push_back(szName + "=" + szValue);
+    }
+    environment.push_back("LD_PRELOAD=" WIRE_INTERPOSE);
+#ifdef SANDBOX_SANITIZED
+    environment.push_back("ASAN_OPTIONS=verify_asan_link_order=0:allocator_may_return_null=1");
+    environment.push_back("UBSAN_OPTIONS=print_stacktrace=1");
+#endif
+    return environment;
+}
+
+// ARRAYCTL_RUNNER is a program, with arguments, that runs the tool: an emulator of its processor.
+[[noreturn]] void ProgramBecome(const MACHINE &machine, const std::vector<std::string> &arguments)
+{
+    std::vector<std::string> argv = WordsOf(getenv("ARRAYCTL_RUNNER"));
+    const std::string szProgram = argv.empty() ? WIRE_PROGRAM : argv[0];
+    if (argv.empty()) {
+        argv.emplace_back("arrayctl");
+    } else {
+        argv.insert(argv.end(), {"-0", "arrayctl", WIRE_PROGRAM});
+    }
+    argv.insert(argv.end(), arguments.begin(), arguments.end());
+    std::vector<std::string> environment = EnvironmentOf(machine);
+    if (machine.prepare) {
+        machine.prepare();
+    }
+    (void)execve(szProgram.c_str(), Pointers(argv).data(), Pointers(environment).data());
+    fprintf(stderr, "sandbox: %s: %s\n", szProgram.c_str(), strerror(errno));
+    _exit(STATUS_NOT_STARTED);
+}
+
+// ---- its supervisor ----------------------------------------------------------------------------
+
+// A sanitizer needs the kernel's /proc of this process namespace.
+void ProcMount()
+{
+#ifdef SANDBOX_SANITIZED
+    const std::string szProc = RoomRoot() + WIRE_PROC;
+    if (unshare(CLONE_NEWNS) != 0 ||
+        mount("proc", szProc.c_str(), "proc", MS_NOSUID | MS_NODEV | MS_NOEXEC, nullptr) != 0) {
+        perror("sandbox: proc of the run");
+        _exit(STATUS_NOT_STARTED);
+    }
+#endif
+}
+
+// The first process of the run's process namespace: what the program leaves behind becomes its
+// child, and is killed when it ends.
+[[noreturn]] void Supervise(const RUN_STREAMS &streams, int fdReport, const BODY &body)
+{
+    (void)prctl(PR_SET_PDEATHSIG, SIGKILL);
+    ProcMount();
+    CHILD_REPORT report = {};
+    const pid_t pid = fork();
+    if (pid == 0) {
+        StreamsTake(streams);
+        RoomGoInside();
+        body(streams);
+        _exit(0);
+    }
+    for (pid_t waited = 0; waited != pid;) {
+        int status = 0;
+        waited = waitpid(-1, &status, 0);
+        if (waited == pid) {
+            report.status = status;
+        } else if (waited > 0) {
+            report.nUnreaped++;
+        } else if (errno != EINTR) {
+            _exit(STATUS_NOT_STARTED);
+        }
+    }
+    while (waitpid(-1, nullptr, WNOHANG) > 0) {
+        report.nUnreaped++;
+    }
+    (void)kill(-1, SIGKILL);
+    while (waitpid(-1, nullptr, 0) > 0) {
+        report.nRunning++;
+    }
+    (void)!write(fdReport, &report, sizeof(report));
+    _exit(0);
+}
+
+// ---- and who watches both ----------------------------------------------------------------------
+
+void LogTake(RUN_RESULT &result)
+{
+    static char ach[LOG_LINE_SIZE];
+    for (ssize_t cb = 0; (cb = recv(RoomLogSocket(), ach, sizeof(ach), MSG_DONTWAIT)) > 0;) {
+        result.log.push_back(LogLineParse({ach, static_cast<size_t>(cb)}));
+    }
+}
+
+bool ReportAwait(int fdReport, int msBound, RUN_RESULT &result, CHILD_REPORT &report)
+{
+    using CLOCK = std::chrono::steady_clock;
+    const CLOCK::time_point start = CLOCK::now();
+    struct pollfd polled[] = {{fdReport, POLLIN, 0}, {RoomLogSocket(), POLLIN, 0}};
+    bool fReported = false;
+    while ((polled[0].revents & (POLLIN | POLLHUP)) == 0) {
+        const auto spent = CLOCK::now() - start;
+        const auto msSpent = std::chrono::duration_cast<std::chrono::milliseconds>(spent).count();
+        if (msSpent >= msBound) {
+            result.fTimedOut = true;
+            break;
+        }
+        (void)poll(polled, std::size(polled), msBound - static_cast<int>(msSpent));
+        LogTake(result);
+    }
+    if (!result.fTimedOut) {
+        fReported = read(fdReport, &report, sizeof(report)) == sizeof(report);
+    }
+    LogTake(result);
+    result.seconds = std::chrono::duration<double>(CLOCK::now() - start).count();
+    return fReported;
+}
+
+void StatusTake(const CHILD_REPORT &report, RUN_RESULT &result)
+{
+    if (WIFEXITED(report.status)) {
+        result.status = WEXITSTATUS(report.status);
+    } else {
+        result.signal = WTERMSIG(report.status);
+    }
+    result.nUnreaped = report.nUnreaped;
+    result.nRunning = report.nRunning;
+}
+
+void RunProblemsAdd(const MACHINE &machine, bool fReported, RUN_RESULT &result)
+{
+    if (result.fTimedOut) {
+        result.problems.push_back("it hangs: not done after " + std::to_string(machine.msBound) +
+                                  " ms");
+    } else if (!fReported) {
+        result.problems.emplace_back("the sandbox itself broke down");
+    }
+    if (!machine.fMayLeaveChildren && result.nUnreaped + result.nRunning > 0) {
+        result.problems.push_back("it left " + std::to_string(result.nUnreaped) +
+                                  " children unreaped and " + std::to_string(result.nRunning) +
+                                  " running");
+    }
+    for (const char *const szReport : {"Sanitizer", "runtime error: "}) {
+        if (result.szErr.find(szReport) != std::string::npos) {
+            result.problems.push_back("a sanitizer reports:\n" + result.szErr);
+            break;
+        }
+    }
+}
+
+// The supervisor's process number in this namespace; 0 in the supervisor. Not through fork: the
+// process namespace has to be new for each run.
+pid_t NamespaceFork()
+{
+    const long pid = syscall(SYS_clone, CLONE_NEWPID | SIGCHLD, 0, 0, 0, 0);
+    if (pid < 0) {
+        perror("sandbox: clone");
+        abort();
+    }
+    return static_cast<pid_t>(pid);
+}
+
+RUN_RESULT Watch(const MACHINE &machine, const BODY &body, std::string &szFailures)
+{
+    RUN_RESULT result;
+    LogTake(result);
+    result.log.clear();
+    RUN_STREAMS streams = {};
+    streams.fdIn = MemoryFile("in", machine.szInput);
+    streams.fdOut = MemoryFile("out");
+    streams.fdErr = MemoryFile("err");
+    int fdReport[2] = {-1, -1};
+    if (pipe2(fdReport, O_CLOEXEC) != 0) {
+        perror("sandbox: pipe2");
+        abort();
+    }
+    streams.fdFailures = MemoryFile("failures"); // the highest: all below are closed inside
+    (void)fflush(nullptr);
+
+    const pid_t pid = NamespaceFork();
+    if (pid == 0) {
+        Supervise(streams, fdReport[1], body);
+    }
+    close(fdReport[1]);
+    CHILD_REPORT report = {};
+    const bool fReported = ReportAwait(fdReport[0], machine.msBound, result, report);
+    (void)kill(pid, SIGKILL);
+    (void)waitpid(pid, nullptr, 0);
+    close(fdReport[0]);
+    close(streams.fdIn);
+
+    result.szOut = MemoryFileTake(streams.fdOut);
+    result.szErr = MemoryFileTake(streams.fdErr);
+    szFailures = MemoryFileTake(streams.fdFailures);
+    if (fReported) {
+        StatusTake(report, result);
+    }
+    TranscriptTake(machine, result);
+    RunProblemsAdd(machine, fReported, result);
+    return result;
+}
+
+RUN_RESULT ProgramWatch(const MACHINE &machine, const std::vector<std::string> &arguments,
+                        void (*pLayOut)(const MACHINE &))
+{
+    RUN_RESULT result;
+    if (!RoomEnter().empty()) {
+        result.problems.push_back(RoomEnter());
+        return result;
+    }
+    pLayOut(machine);
+    std::string szFailures;
+    return Watch(
+        machine, [&](const RUN_STREAMS &) { ProgramBecome(machine, arguments); }, szFailures);
+}
+
+RUN_RESULT ProblemsFail(RUN_RESULT result)
+{
+    for (const std::string &szProblem : result.problems) {
+        ADD_FAILURE() << szProblem << "\ntranscript:\n" << TranscriptText(result);
+    }
+    return result;
+}
+
+// ---- failures of a body, handed to the test that called it --------------------------------------
+
+int FailuresCount()
+{
+    return testing::UnitTest::GetInstance()->current_test_info()->result()->total_part_count();
+}
+
+void FailuresSend(int fd, int iFirst)
+{
+    const testing::TestResult *const pResult =
+        testing::UnitTest::GetInstance()->current_test_info()->result();
+    std::string szAll;
+    for (int i = iFirst; i < pResult->total_part_count(); i++) {
+        const testing::TestPartResult &part = pResult->GetTestPartResult(i);
+        if (part.failed()) {
+            szAll += std::string(part.file_name() == nullptr ? "" : part.file_name()) + '\n' +
+                     std::to_string(part.line_number()) + '\n' + part.message() + '\0';
+        }
+    }
+    (void)!write(fd, szAll.data(), szAll.size());
+}
+
+void FailuresReport(const std::string &szFailures)
+{
+    for (size_t iStart = 0; iStart < szFailures.size();) {
+        const size_t iEnd = szFailures.find('\0', iStart);
+        const std::string szOne = szFailures.substr(iStart, iEnd - iStart);
+        const size_t iLine = szOne.find('\n') + 1;
+        const size_t iMessage = szOne.find('\n', iLine) + 1;
+        ADD_FAILURE_AT(szOne.substr(0, iLine - 1).c_str(), atoi(szOne.c_str() + iLine))
+            << szOne.substr(iMessage);
+        iStart = iEnd + 1;
+    }
+}
+
+[[noreturn]] void BodyRun(const MACHINE &machine, const std::function<void()> &body, int fdFailures)
+{
+    const int iFirst = FailuresCount();
+    (void)clearenv();
+    for (const auto &[szName, szValue] : machine.environment) {
+        (void)setenv(szName.c_str(), szValue.c_str(), 1);
+    }
+    if (machine.prepare) {
+        machine.prepare();
+    }
+    InterposeActivate();
+    body();
+    InterposeDeactivate();
+    (void)fflush(nullptr);
+    FailuresSend(fdFailures, iFirst);
+#ifdef SANDBOX_COVERAGE
+    __gcov_dump();
+#endif
+    _exit(0);
+}
+
+} // namespace
+
+RUN_RESULT MachineTry(const MACHINE &machine, const std::vector<std::string> &arguments)
+{
+    return ProgramWatch(machine, arguments, RoomLayOut);
+}
+
+RUN_RESULT MachineTryAgain(const MACHINE &machine, const std::vector<std::string> &arguments)
+{
+    return ProgramWatch(machine, arguments, RoomAnswersWrite);
+}
+
+RUN_RESULT MachineRun(const MACHINE &machine, const std::vector<std::string> &arguments)
+{
+    return ProblemsFail(MachineTry(machine, arguments));
+}
+
+RUN_RESULT MachineRunAgain(const MACHINE &machine, const std::vector<std::string> &arguments)
+{
+    return ProblemsFail(MachineTryAgain(machine, arguments));
+}
+
+RUN_RESULT MachineCall(const MACHINE &machine, const std::function<void()> &body)
+{
+    RUN_RESULT result;
+    if (!RoomEnter().empty()) {
+        ADD_FAILURE() << RoomEnter();
+        return result;
+    }
+    RoomLayOut(machine);
+    std::string szFailures;
+    result = Watch(
+        machine, [&](const RUN_STREAMS &streams) { BodyRun(machine, body, streams.fdFailures); },
+        szFailures);
+    FailuresReport(szFailures);
+    if (result.status != 0 && !result.fTimedOut) {
+        ADD_FAILURE() << "the body ended with status " << result.status << ", signal "
+                      << result.signal << "\n"
+                      << result.szOut << result.szErr;
+    }
+    return ProblemsFail(std::move(result));
+}
+
+std::optional<std::string> MachineFileRead(const std::string &szPath)
+{
+    const int fd = open((RoomRoot() + szPath).c_str(), O_RDONLY | O_CLOEXEC);
+    if (fd < 0) {
+        return std::nullopt;
+    }
+    return MemoryFileTake(fd);
+}

@@ -1,0 +1,198 @@
+// SPDX-License-Identifier: MIT
+#include "transcript.h"
+
+#include "wire.h"
+
+#include <cctype>
+#include <cstdlib>
+#include <cstring>
+
+namespace
+{
+
+constexpr size_t TIME_STAMP_SIZE = sizeof("Jan  1 00:00:00 ") - 1;
+
+// "file.cpp:123 text" becomes "file.cpp:# text".
+std::string LineMasked(std::string_view szText)
+{
+    const size_t iColon = szText.find(':');
+    size_t iEnd = iColon == std::string_view::npos ? iColon : iColon + 1;
+    while (iEnd < szText.size() && isdigit(static_cast<unsigned char>(szText[iEnd])) != 0) {
+        iEnd++;
+    }
+    if (iColon == std::string_view::npos || iEnd == iColon + 1 || iEnd >= szText.size() ||
+        szText[iEnd] != ' ') {
+        return std::string(szText);
+    }
+    return std::string(szText.substr(0, iColon)) + ":#" + std::string(szText.substr(iEnd));
+}
+
+// False at the end, and when what is there is no field.
+bool FieldTake(std::string_view &szRecord, std::string &szField)
+{
+    const size_t iColon = szRecord.find(':');
+    if (iColon == std::string_view::npos) {
+        return false;
+    }
+    const size_t cb = strtoul(std::string(szRecord.substr(0, iColon)).c_str(), nullptr, 10);
+    if (szRecord.size() - iColon - 1 < cb) {
+        return false;
+    }
+    szField = szRecord.substr(iColon + 1, cb);
+    szRecord.remove_prefix(iColon + 1 + cb);
+    return true;
+}
+
+int NumberTake(std::string_view &szRecord)
+{
+    std::string szField;
+    return FieldTake(szRecord, szField) ? atoi(szField.c_str()) : -1;
+}
+
+void CommandParse(std::string_view szRecord, RUN_EVENT &event)
+{
+    (void)FieldTake(szRecord, event.szExecuted);
+    event.fNullInput = NumberTake(szRecord) == 1;
+    event.fNullOutput = NumberTake(szRecord) == 1;
+    event.fNullError = NumberTake(szRecord) == 1;
+    event.nDescriptors = NumberTake(szRecord);
+    std::string szField;
+    for (int n = NumberTake(szRecord); n > 0 && FieldTake(szRecord, szField); n--) {
+        event.argv.push_back(szField);
+    }
+    while (FieldTake(szRecord, szField)) {
+        event.environment.push_back(szField);
+    }
+}
+
+void EventParse(std::string_view szRecord, RUN_EVENT &event)
+{
+    std::string szKind;
+    (void)FieldTake(szRecord, szKind);
+    if (szKind == WIRE_COMMAND || szKind == WIRE_UNEXPECTED) {
+        event.fExpected = szKind == WIRE_COMMAND;
+        CommandParse(szRecord, event);
+        return;
+    }
+    event.kind = szKind == WIRE_SLEEP ? EVENT_KIND::SLEEP : EVENT_KIND::FAULT;
+    event.argv.push_back(szKind);
+    std::string szField;
+    while (FieldTake(szRecord, szField) && !szField.empty()) {
+        event.argv.push_back(szField);
+    }
+}
+
+std::string WordQuoted(const std::string &szWord)
+{
+    if (!szWord.empty() && szWord.find_first_of(" \t\n\"\\") == std::string::npos) {
+        return szWord;
+    }
+    std::string szQuoted = "\"";
+    for (const char ch : szWord) {
+        if (ch == '\n') {
+            szQuoted += "\\n";
+            continue;
+        }
+        if (ch == '"' || ch == '\\') {
+            szQuoted += '\\';
+        }
+        szQuoted += ch;
+    }
+    return szQuoted + "\"";
+}
+
+std::string WordsText(const std::vector<std::string> &words)
+{
+    std::string szText;
+    for (const std::string &szWord : words) {
+        szText += (szText.empty() ? "" : " ") + WordQuoted(szWord);
+    }
+    return szText;
+}
+
+void RowProblemsAdd(const MACHINE &machine, RUN_RESULT &result)
+{
+    const std::string szUsed = MachineFileRead(WIRE_USED).value_or("");
+    for (size_t i = 0; i < machine.rows.size(); i++) {
+        std::uint32_t nUsed = 0;
+        if (szUsed.size() >= (i + 1) * sizeof(nUsed)) {
+            memcpy(&nUsed, szUsed.data() + i * sizeof(nUsed), sizeof(nUsed));
+        }
+        const TOOL_ROW &row = machine.rows[i];
+        if (row.answer.nTimes >= 0 && nUsed != static_cast<std::uint32_t>(row.answer.nTimes)) {
+            result.problems.push_back("expected " + std::to_string(row.answer.nTimes) +
+                                      " times, run " + std::to_string(nUsed) +
+                                      " times: " + WordsText(row.argv));
+        }
+    }
+}
+
+void EventProblemsAdd(const RUN_EVENT &event, RUN_RESULT &result)
+{
+    if (event.kind != EVENT_KIND::COMMAND) {
+        return;
+    }
+    if (!event.fExpected) {
+        result.problems.push_back("a command that no row expects: " + WordsText(event.argv));
+    }
+    if (event.argv.empty() || event.argv[0] != event.szExecuted) {
+        result.problems.push_back("not called by its own path: " + WordsText(event.argv) + " is " +
+                                  event.szExecuted);
+    }
+}
+
+} // namespace
+
+LOG_LINE LogLineParse(std::string_view szDatagram)
+{
+    LOG_LINE line;
+    const size_t iEnd = szDatagram.find('>');
+    if (szDatagram.empty() || szDatagram[0] != '<' || iEnd == std::string_view::npos) {
+        line.szText = szDatagram;
+        return line;
+    }
+    line.priority = atoi(std::string(szDatagram.substr(1, iEnd - 1)).c_str());
+    szDatagram.remove_prefix(std::min(iEnd + 1 + TIME_STAMP_SIZE, szDatagram.size()));
+    const size_t iTagEnd = szDatagram.find(": ");
+    if (iTagEnd != std::string_view::npos) {
+        line.szTag = szDatagram.substr(0, iTagEnd);
+        szDatagram.remove_prefix(iTagEnd + 2);
+    }
+    line.szText = LineMasked(szDatagram);
+    return line;
+}
+
+void TranscriptTake(const MACHINE &machine, RUN_RESULT &result)
+{
+    const std::string szAll = MachineFileRead(WIRE_TRANSCRIPT).value_or("");
+    std::string_view szRest = szAll;
+    std::string szRecord;
+    while (FieldTake(szRest, szRecord)) {
+        RUN_EVENT event;
+        EventParse(szRecord, event);
+        EventProblemsAdd(event, result);
+        result.events.push_back(std::move(event));
+    }
+    if (!szRest.empty()) {
+        result.problems.emplace_back("the transcript cannot be read");
+    }
+    RowProblemsAdd(machine, result);
+}
+
+std::string LogText(const RUN_RESULT &result)
+{
+    std::string szText;
+    for (const LOG_LINE &line : result.log) {
+        szText += "<" + std::to_string(line.priority) + ">" + line.szText + "\n";
+    }
+    return szText;
+}
+
+std::string TranscriptText(const RUN_RESULT &result)
+{
+    std::string szText;
+    for (const RUN_EVENT &event : result.events) {
+        szText += WordsText(event.argv) + "\n";
+    }
+    return szText;
+}
