@@ -199,7 +199,7 @@ TEXT DiskPath(const char *szDisk)
 
 PNLIBSZLIST DiskListAlloc()
 {
-    const PNLIBSZLIST pDisks = NLIBCSzListAlloc(DISK_LIST_SIZE);
+    NLIBSZLIST *const pDisks = NLIBCSzListAlloc(DISK_LIST_SIZE);
     if (pDisks == nullptr) {
         NLIBCLog(LOG_ERR, "Out of memeory, failed to allocate memory for PNLIBSZLIST via "
                           "NLIBCSzListAlloc");
@@ -484,10 +484,10 @@ int SystemRaidCreate(const char *szMd, int nDisk, int nSlot, const char *szMembe
     char szMissing[MISSING_TEXT_SIZE];
     MissingTextBuild(nSlot - nDisk, szMissing);
     char szCommand[CREATE_COMMAND_SIZE];
-    const int cch = snprintf(szCommand, sizeof(szCommand),
-                             "/sbin/mdadm -C %s %s -amd -R -l1 %s -n%d %s %s> /dev/null 2>&1", szMd,
-                             MetadataOption(szMd), nDisk == 1 ? "-f" : "", nSlot, szMembers,
-                             szMissing);
+    const int cch =
+        snprintf(szCommand, sizeof(szCommand),
+                 "/sbin/mdadm -C %s %s -amd -R -l1 %s -n%d %s %s> /dev/null 2>&1", szMd,
+                 MetadataOption(szMd), nDisk == 1 ? "-f" : "", nSlot, szMembers, szMissing);
     (void)sleep(ARRAY_PAUSE_SECONDS);
     if (cch < 0 || ShellExitStatus(system(szCommand)) != 0) {
         NLIBCLog(LOG_ERR, "Failed to create RAID '%s' on '%s' ", szMd, szMembers);
@@ -732,8 +732,7 @@ int FormatAllPrint(const FORMAT_LISTS &lists, bool fDualHeadInstall)
     const NLIBSZLIST *const pChosen = lists.pKeepData->nItem > 0 ? lists.pFormatAll : lists.pAll;
     char szNumbers[NUMBERS_TEXT_SIZE];
     NumbersBuild(pChosen, szNumbers);
-    const bool fAll =
-        fDualHeadInstall && NLIBCConfSupportDualHead() != 0 && szNumbers[0] != '\0';
+    const bool fAll = fDualHeadInstall && NLIBCConfSupportDualHead() != 0 && szNumbers[0] != '\0';
     (void)printf("%s", fAll ? "all" : szNumbers);
     return pChosen->nItem;
 }

@@ -59,8 +59,7 @@ size_t DiskLength(const char *szPart)
 bool IsPartitionRequestValid(const char *szDisk, int partNum, const char *szOut, size_t cbOut)
 {
     if (cbOut == 0 || szOut == nullptr || szDisk == nullptr || partNum <= 0) {
-        NLIBCLog(LOG_ERR,
-                 "out put szPartitionPath can not be NULL and path length can't be zero");
+        NLIBCLog(LOG_ERR, "out put szPartitionPath can not be NULL and path length can't be zero");
         return false;
     }
     return true;
@@ -90,8 +89,8 @@ int DiskPartitionNumGet(const char *szName, char *szDisk, int cbDisk)
     // Kept: the disk ends at the first 1 to 9 here, not at a 0 (sda10 is sda and 10; mmcblk0 is
     // whole), while DiskPartitionNumRemove ends it at any digit.
     const bool fMmc = IsMmc(szName);
-    const size_t cchDisk = std::min(strcspn(szName, fMmc ? "p" : "123456789"),
-                                    static_cast<size_t>(cbDisk) - 1);
+    const size_t cchDisk =
+        std::min(strcspn(szName, fMmc ? "p" : "123456789"), static_cast<size_t>(cbDisk) - 1);
     memcpy(szDisk, szName, cchDisk);
     szDisk[cchDisk] = '\0';
     if (cchDisk == 0) {

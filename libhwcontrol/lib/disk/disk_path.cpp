@@ -17,16 +17,16 @@ constexpr int NAME_SIZE = 32;
 
 // By port type.
 constexpr std::array<u32, 10> CONTAINERS = {
-    CONTAINER_NONE,           // UNKNOWN_DEVICE
-    DISK_CONTAINER_INTERNAL,  // INTERNAL_DEVICE
-    DISK_CONTAINER_ESATA,     // ESATA_DEVICE
-    DISK_CONTAINER_EUNIT,     // EUNIT_DEVICE
-    DISK_CONTAINER_USB,       // USB_DEVICE
-    CONTAINER_NONE,           // BOOT_DEVICE
-    CONTAINER_NONE,           // ISD_DEVICE
-    DISK_CONTAINER_CACHE,     // CACHE_DEVICE
-    DISK_CONTAINER_USB,       // OTHER_DEVICE
-    CONTAINER_NONE,           // MMC_DEVICE
+    CONTAINER_NONE,          // UNKNOWN_DEVICE
+    DISK_CONTAINER_INTERNAL, // INTERNAL_DEVICE
+    DISK_CONTAINER_ESATA,    // ESATA_DEVICE
+    DISK_CONTAINER_EUNIT,    // EUNIT_DEVICE
+    DISK_CONTAINER_USB,      // USB_DEVICE
+    CONTAINER_NONE,          // BOOT_DEVICE
+    CONTAINER_NONE,          // ISD_DEVICE
+    DISK_CONTAINER_CACHE,    // CACHE_DEVICE
+    DISK_CONTAINER_USB,      // OTHER_DEVICE
+    CONTAINER_NONE,          // MMC_DEVICE
 };
 
 // Kept: a parsed path tells other containers than DiskContainerFromPortType for the types that it

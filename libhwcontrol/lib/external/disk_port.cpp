@@ -24,9 +24,9 @@ namespace
 
 constexpr int DISK_NAME_SIZE = 32;
 constexpr int MASK_VALUE_SIZE = 65;
-constexpr int EUNIT_LIST_SIZE = 1024;  // all disks that expansion units report
-constexpr int HOST_LIST_SIZE = 256;    // those that one SCSI host reports
-constexpr size_t EUNIT_NAME_MAX = 15;  // letters of one reported name
+constexpr int EUNIT_LIST_SIZE = 1024; // all disks that expansion units report
+constexpr int HOST_LIST_SIZE = 256;   // those that one SCSI host reports
+constexpr size_t EUNIT_NAME_MAX = 15; // letters of one reported name
 constexpr int PATH_SIZE = 512;
 
 constexpr char SCSI_HOST_DIRECTORY[] = "/sys/class/scsi_host/";
@@ -115,8 +115,8 @@ struct PORT_PATTERN {
 
 constexpr char SD_PATTERN[] = "/sys/block/sd*";
 constexpr PORT_PATTERN PORT_PATTERNS[] = {
-    {INTERNAL_DEVICE, SD_PATTERN},       {ESATA_DEVICE, SD_PATTERN},
-    {EUNIT_DEVICE, SD_PATTERN},          {USB_DEVICE, SD_PATTERN},
+    {INTERNAL_DEVICE, SD_PATTERN},        {ESATA_DEVICE, SD_PATTERN},
+    {EUNIT_DEVICE, SD_PATTERN},           {USB_DEVICE, SD_PATTERN},
     {BOOT_DEVICE, "/sys/block/nuroboot"}, {ISD_DEVICE, "/sys/block/isd*"},
     {CACHE_DEVICE, SD_PATTERN},
 };

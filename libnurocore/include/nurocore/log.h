@@ -9,5 +9,5 @@
 
 // __extension__: "%m" is syslog's own, and not to be warned of as foreign to the language.
 #define NLIBCLog(priority, format, ...)                                                            \
-    __extension__(syslog((priority), "%s:%d " format, __FILE_NAME__,                               \
-                         __LINE__ __VA_OPT__(, ) __VA_ARGS__))
+    __extension__(                                                                                 \
+        syslog((priority), "%s:%d " format, __FILE_NAME__, __LINE__ __VA_OPT__(, ) __VA_ARGS__))

@@ -88,7 +88,7 @@ void PairStore(PNLIBHASH pHash, int index, const char *szKey, const char *szValu
 // only ever grow.
 PNLIBHASH Rebuild(const NLIBHASH *pHash, i64 nSlot, i64 cbPool)
 {
-    const PNLIBHASH pNew = TableAlloc(nSlot, cbPool);
+    NLIBHASH *const pNew = TableAlloc(nSlot, cbPool);
     if (pNew == nullptr) {
         return nullptr;
     }
@@ -116,10 +116,9 @@ PNLIBHASH MakeRoom(PNLIBHASH pHash, i64 nNeeded)
     if (fFits) {
         return Rebuild(pHash, nSlot, pHash->cbPool);
     }
-    const i64 cbPerEntry = pHash->nEntry == 0
-                               ? nNeeded
-                               : static_cast<i64>(static_cast<float>(pHash->cbPool) /
-                                                  static_cast<float>(pHash->nEntry));
+    const i64 cbPerEntry = pHash->nEntry == 0 ? nNeeded
+                                              : static_cast<i64>(static_cast<float>(pHash->cbPool) /
+                                                                 static_cast<float>(pHash->nEntry));
     const i64 nUnused = static_cast<i64>(pHash->nSlot) - pHash->nEntry;
     return Rebuild(pHash, nSlot, pHash->cbPool + cbPerEntry * nUnused + nNeeded);
 }
@@ -146,7 +145,7 @@ int NLIBCHashSet(PNLIBHASH *ppHash, const char *szKey, const char *szValue)
     if (ppHash == nullptr || *ppHash == nullptr || szKey == nullptr || szValue == nullptr) {
         return -1;
     }
-    const PNLIBHASH pOld = *ppHash;
+    NLIBHASH *const pOld = *ppHash;
     int index = SlotFor(pOld, szKey);
     if (index < 0) {
         return -1;
@@ -158,7 +157,7 @@ int NLIBCHashSet(PNLIBHASH *ppHash, const char *szKey, const char *szValue)
         return index;
     }
     const size_t cbNeeded = cbValue + (fNewKey ? strlen(szKey) + 1 : 0);
-    const PNLIBHASH pHash = MakeRoom(pOld, static_cast<i64>(cbNeeded));
+    NLIBHASH *const pHash = MakeRoom(pOld, static_cast<i64>(cbNeeded));
     if (pHash == nullptr) {
         return -1;
     }

@@ -176,7 +176,7 @@ PNLIBSZLIST Grow(const NLIBSZLIST *pList)
         NLIBCErrSetHere(ERR_OUT_OF_MEMORY);
         return nullptr;
     }
-    const PNLIBSZLIST pNew = BlockAlloc(pList->nSize * 2);
+    NLIBSZLIST *const pNew = BlockAlloc(pList->nSize * 2);
     if (pNew == nullptr) {
         return nullptr;
     }
@@ -200,7 +200,7 @@ PNLIBSZLIST Grow(const NLIBSZLIST *pList)
 bool MakeRoom(PNLIBSZLIST *ppList, i64 nNeeded, HEAP_OWNER<NLIBSZLIST> &pStart)
 {
     while (nNeeded > (*ppList)->nFree) {
-        const PNLIBSZLIST pNew = Grow(*ppList);
+        NLIBSZLIST *const pNew = Grow(*ppList);
         if (pNew == nullptr) {
             return false;
         }
@@ -329,14 +329,15 @@ int NLIBCSzListInsert(PNLIBSZLIST *ppList, int index, const char *szItem)
     }
     const size_t cbItem = strlen(szItem) + 1;
     const int place = InsertPlace(*ppList, index, szItem);
-    const i64 nSlots = place < (*ppList)->nItem ? 1 : static_cast<i64>(place) - (*ppList)->nItem + 1;
+    const i64 nSlots =
+        place < (*ppList)->nItem ? 1 : static_cast<i64>(place) - (*ppList)->nItem + 1;
     const i64 nNeeded = nSlots * LIST_SLOT_SIZE + static_cast<i64>(cbItem);
 
     HEAP_OWNER<NLIBSZLIST> pStart;
     if (!MakeRoom(ppList, nNeeded, pStart)) {
         return -1;
     }
-    const PNLIBSZLIST pList = *ppList;
+    NLIBSZLIST *const pList = *ppList;
     SlotPut(pList, place, StringStore(pList, szItem, cbItem));
     pList->nFree -= static_cast<i32>(nNeeded);
     return place;
@@ -409,7 +410,7 @@ int NLIBCSzListSet(PNLIBSZLIST *ppList, int index, const char *szItem)
         NLIBCErrSetHere(ERR_BAD_PARAMETER);
         return -1;
     }
-    const PNLIBSZLIST pList = *ppList;
+    NLIBSZLIST *const pList = *ppList;
     const size_t cbItem = strlen(szItem) + 1;
     if (cbItem <= strlen(Item(pList, index)) + 1) {
         memmove(At(pList, Slots(pList)[index]), szItem, cbItem);
@@ -470,7 +471,7 @@ PNLIBSZLIST NLIBCSzListExpand(PNLIBSZLIST pList)
         NLIBCErrSetHere(ERR_BAD_PARAMETER);
         return nullptr;
     }
-    const PNLIBSZLIST pNew = Grow(pList);
+    NLIBSZLIST *const pNew = Grow(pList);
     if (pNew != nullptr) {
         NLIBCSzListFree(pList);
     }
@@ -486,7 +487,8 @@ bool JoinBufferEnlarge(char **pszBuf, int *pcbBuf, i64 cbNeeded)
     if (cbNeeded <= *pcbBuf) {
         return true;
     }
-    void *const pNew = cbNeeded > INT_MAX ? nullptr : realloc(*pszBuf, static_cast<size_t>(cbNeeded));
+    void *const pNew =
+        cbNeeded > INT_MAX ? nullptr : realloc(*pszBuf, static_cast<size_t>(cbNeeded));
     if (pNew == nullptr) {
         free(*pszBuf);
         *pszBuf = nullptr;
@@ -699,8 +701,8 @@ PNLIBSZLIST NLIBCSzListOr(PNLIBSZLIST *ppList, const NLIBSZLIST *pOther, int fla
         NLIBCSzListCompact(*ppList);
         return Or(ppList, pOther, flags, ppList) ? *ppList : nullptr;
     }
-    const i64 nUsed = static_cast<i64>((*ppList)->nSize) - (*ppList)->nFree + pOther->nSize -
-                      pOther->nFree;
+    const i64 nUsed =
+        static_cast<i64>((*ppList)->nSize) - (*ppList)->nFree + pOther->nSize - pOther->nFree;
     PNLIBSZLIST pNew = NLIBCSzListAlloc(static_cast<int>(std::min<i64>(nUsed, INT_MAX)));
     if (pNew == nullptr) {
         return nullptr;

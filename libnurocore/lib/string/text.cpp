@@ -93,6 +93,6 @@ const char *NLIBCStrSkipPrefix(const char *szText, std::string_view prefix)
 i32 NLIBCStrToI32(const char *szText)
 {
     const i64 value = strtol(szText, nullptr, 10);
-    return static_cast<i32>(std::clamp<i64>(value, std::numeric_limits<i32>::min(),
-                                            std::numeric_limits<i32>::max()));
+    return static_cast<i32>(
+        std::clamp<i64>(value, std::numeric_limits<i32>::min(), std::numeric_limits<i32>::max()));
 }

@@ -9,9 +9,9 @@
 // RAIDRemove without a map.
 int RAIDRemoveByInfo(const RAID_INFO *pInfo);
 
-// Stops the array, in up to three attempts a second apart, and wipes its superblocks; pUuidHash maps
-// partitions to UUIDs and stays the caller's, NULL makes one for the purpose. Returns 0 when the
-// array was stopped, whatever became of the superblocks, else -1.
+// Stops the array, in up to three attempts a second apart, and wipes its superblocks; pUuidHash
+// maps partitions to UUIDs and stays the caller's, NULL makes one for the purpose. Returns 0 when
+// the array was stopped, whatever became of the superblocks, else -1.
 int RAIDRemove(const RAID_INFO *pInfo, PNLIBHASH pUuidHash);
 
 // "mdadm -S" and "mdadm --zero-superblock". 0, or -1 with the code of the runner.

@@ -10,12 +10,12 @@
 // Frees both records and sets both pointers to NULL; a NULL pair is ignored.
 void RAIDInfoPairFree(RAID_INFO **ppPair);
 
-// The disk's member state in each array, DISK_STATE_NONE where it is no member. Returns 1 when it is
-// in one of them at least, 0 when in neither, -1 with ERR_BAD_PARAMETER for a NULL pair, record or
-// disk.
+// The disk's member state in each array, DISK_STATE_NONE where it is no member. Returns 1 when it
+// is in one of them at least, 0 when in neither, -1 with ERR_BAD_PARAMETER for a NULL pair, record
+// or disk.
 int RAIDSystemDiskStatusDetailGet(RAID_INFO *const *ppPair, const char *szDisk, u32 *pRootState,
                                   u32 *pSwapState);
 
-// DISK_STATE_NORMAL when its system partitions are healthy, DISK_STATE_FAILED when they need repair,
-// DISK_STATE_NONE when it has none; pStatus may be NULL. Returns as above.
+// DISK_STATE_NORMAL when its system partitions are healthy, DISK_STATE_FAILED when they need
+// repair, DISK_STATE_NONE when it has none; pStatus may be NULL. Returns as above.
 int RAIDSystemDiskStatusGet(RAID_INFO *const *ppPair, const char *szDisk, u32 *pStatus);

@@ -112,8 +112,8 @@ int SystemPartitionsCreate(const char *szDisk, const PARTITION_LAYOUT &layout)
         return 0;
     }
     char szCommand[COMMAND_TEXT_SIZE];
-    (void)snprintf(szCommand, sizeof(szCommand), "%s -N2 -uS -q -f -j0 %s %s -F %.256s", SFDISK_PATH,
-                   swapSize.szText, swapType.szText, szDisk);
+    (void)snprintf(szCommand, sizeof(szCommand), "%s -N2 -uS -q -f -j0 %s %s -F %.256s",
+                   SFDISK_PATH, swapSize.szText, swapType.szText, szDisk);
     return CommandFailed(szCommand, result);
 }
 

@@ -27,8 +27,7 @@ bool IsKept(const PARTITION_ENUM_FILTER *pFilter, const char *szName)
     if (pFilter == nullptr) {
         return true;
     }
-    if (pFilter->szPrefix != nullptr &&
-        !std::string_view(szName).starts_with(pFilter->szPrefix)) {
+    if (pFilter->szPrefix != nullptr && !std::string_view(szName).starts_with(pFilter->szPrefix)) {
         return false;
     }
     if (pFilter->containerMask == 0) {

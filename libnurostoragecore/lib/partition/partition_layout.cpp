@@ -20,47 +20,60 @@ namespace
 constexpr int NAME_SIZE = 128;
 constexpr int PATH_SIZE = 512;
 constexpr int LINE_SIZE = 129; // a line of at most 128 bytes
-constexpr PARTITION_PLACE ANYWHERE(u32 type)
+
+constexpr u32 TYPE_LINUX = 0x83;
+constexpr u32 TYPE_SWAP = 0x82;
+constexpr u32 TYPE_RAID = 0xfd;
+
+// The swap partition begins where the system partition ends; the data partition is not fixed.
+constexpr PARTITION_LAYOUT Row(u32 version, u32 raid, u64 start, u64 systemSize, u64 swapSize,
+                               u64 dataGap)
 {
-    return {.start = PARTITION_NOT_FIXED, .size = PARTITION_NOT_FIXED, .type = type};
+    const u32 typeLinux = raid != 0 ? TYPE_RAID : TYPE_LINUX;
+    const u32 typeSwap = raid != 0 ? TYPE_RAID : TYPE_SWAP;
+    return {.version = version,
+            .raid = raid,
+            .systemSize = systemSize,
+            .swapSize = swapSize,
+            .dataGap = dataGap,
+            .partitions = {{start, systemSize, typeLinux},
+                           {start + systemSize, swapSize, typeSwap},
+                           {PARTITION_NOT_FIXED, PARTITION_NOT_FIXED, typeLinux}},
+            .buildinStorage = 0};
 }
 
-constexpr u32 LINUX = 0x83;
-constexpr u32 SWAP = 0x82;
-constexpr u32 RAID = 0xfd;
+// With built-in storage all three partitions are fixed, whatever the version.
+constexpr PARTITION_LAYOUT BuildinStorageRow(u32 version)
+{
+    return {.version = version,
+            .raid = 0,
+            .systemSize = 2097152,
+            .swapSize = 5105569,
+            .dataGap = 524288,
+            .partitions = {{256, 2097152, TYPE_LINUX},
+                           {2097408, 5105569, TYPE_LINUX},
+                           {7202977, 524288, TYPE_LINUX}},
+            .buildinStorage = 1};
+}
 
-// The product's own values, the odd ones too: there is no version 4, 3 and 5 are without RAID only,
-// and with built-in storage 7 and 8 are alike. The first row that fits is taken.
-constexpr std::array<PARTITION_LAYOUT, 14> LAYOUTS = {{
-    {1, 0, 273042, 787185, 273042,
-     {{63, 273042, LINUX}, {273105, 787185, SWAP}, ANYWHERE(LINUX)}, 0},
-    {2, 0, 4980087, 1044225, 257040,
-     {{63, 4980087, LINUX}, {4980150, 1044225, SWAP}, ANYWHERE(LINUX)}, 0},
-    {3, 0, 530082, 787185, 16002,
-     {{63, 530082, LINUX}, {530145, 787185, SWAP}, ANYWHERE(LINUX)}, 0},
-    {5, 0, 722862, 594405, 16002,
-     {{63, 722862, LINUX}, {722925, 594405, SWAP}, ANYWHERE(LINUX)}, 0},
-    {6, 0, 4980087, 4192965, 257040,
-     {{63, 4980087, LINUX}, {4980150, 4192965, SWAP}, ANYWHERE(LINUX)}, 0},
-    {7, 0, 4980480, 4194304, 262144,
-     {{256, 4980480, LINUX}, {4980736, 4194304, SWAP}, ANYWHERE(LINUX)}, 0},
-    {8, 0, 4980480, 4194304, 260352,
-     {{2048, 4980480, LINUX}, {4982528, 4194304, SWAP}, ANYWHERE(LINUX)}, 0},
-    {1, 1, 1574307, 787185, 273105,
-     {{63, 1574307, RAID}, {1574370, 787185, RAID}, ANYWHERE(RAID)}, 0},
-    {2, 1, 4980087, 1044225, 257040,
-     {{63, 4980087, RAID}, {4980150, 1044225, RAID}, ANYWHERE(RAID)}, 0},
-    {6, 1, 4980087, 4192965, 257040,
-     {{63, 4980087, RAID}, {4980150, 4192965, RAID}, ANYWHERE(RAID)}, 0},
-    {7, 1, 4980480, 4194304, 262144,
-     {{256, 4980480, RAID}, {4980736, 4194304, RAID}, ANYWHERE(RAID)}, 0},
-    {8, 1, 4980480, 4194304, 260352,
-     {{2048, 4980480, RAID}, {4982528, 4194304, RAID}, ANYWHERE(RAID)}, 0},
-    {7, 0, 2097152, 5105569, 524288,
-     {{256, 2097152, LINUX}, {2097408, 5105569, LINUX}, {7202977, 524288, LINUX}}, 1},
-    {8, 0, 2097152, 5105569, 524288,
-     {{256, 2097152, LINUX}, {2097408, 5105569, LINUX}, {7202977, 524288, LINUX}}, 1},
-}};
+// The product's own values, the odd ones too: there is no version 4, and 3 and 5 are without RAID
+// only. The first row that fits is taken.
+constexpr std::array<PARTITION_LAYOUT, 14> LAYOUTS = {
+    Row(1, 0, 63, 273042, 787185, 273042),
+    Row(2, 0, 63, 4980087, 1044225, 257040),
+    Row(3, 0, 63, 530082, 787185, 16002),
+    Row(5, 0, 63, 722862, 594405, 16002),
+    Row(6, 0, 63, 4980087, 4192965, 257040),
+    Row(7, 0, 256, 4980480, 4194304, 262144),
+    Row(8, 0, 2048, 4980480, 4194304, 260352),
+    Row(1, 1, 63, 1574307, 787185, 273105),
+    Row(2, 1, 63, 4980087, 1044225, 257040),
+    Row(6, 1, 63, 4980087, 4192965, 257040),
+    Row(7, 1, 256, 4980480, 4194304, 262144),
+    Row(8, 1, 2048, 4980480, 4194304, 260352),
+    BuildinStorageRow(7),
+    BuildinStorageRow(8),
+};
 
 u32 IsBuildinStorage()
 {

@@ -52,8 +52,7 @@ void VersionOfMembers(const glob_t &members, u32 *pVersion)
 bool IsCounted(const char *szDisk)
 {
     int nMd = 0;
-    return IsSupportRaid() == 0 ||
-           (RAIDDiskIsUsedByRAID(szDisk, &nMd) == 1 && nMd <= DATA_MD_LAST);
+    return IsSupportRaid() == 0 || (RAIDDiskIsUsedByRAID(szDisk, &nMd) == 1 && nMd <= DATA_MD_LAST);
 }
 
 // 0 for a disk that does not count.

@@ -17,8 +17,8 @@ constexpr u32 LEVELS_WITH_REDUNDANCY = RAID_LEVEL_1 | RAID_LEVEL_5 | RAID_LEVEL_
 
 void CommandTextBuild(const char *szOption, const char *szMd, const char *szDisk, char *szText)
 {
-    const int cch = snprintf(szText, COMMAND_TEXT_SIZE, "%s %s%s -a %s", MDADM_PATH, szOption, szMd,
-                             szDisk);
+    const int cch =
+        snprintf(szText, COMMAND_TEXT_SIZE, "%s %s%s -a %s", MDADM_PATH, szOption, szMd, szDisk);
     if (cch < 0) {
         szText[0] = '\0';
     }

@@ -235,8 +235,8 @@ int InfoFill(int fd, RAID_INFO *pInfo)
     }
     const u64 nKiB = DeviceSizeKiB(fd, array, pInfo->arraySize);
     pInfo->deviceSize = HasDeviceSize(pInfo->level) ? nKiB * BYTES_PER_KIB : 0;
-    // Kept: a failed rebuild query is told in the words of the member list, a failed health query in
-    // those of the size.
+    // Kept: a failed rebuild query is told in the words of the member list, a failed health query
+    // in those of the size.
     if (RAIDDiskListGet(pInfo->szPath, &pInfo->pDisks) != 0 ||
         RAIDRebuildStatusGet(fd, &pInfo->rebuild) != 0) {
         NLIBCLog(LOG_DEBUG, "Failed to get disk list for /dev/md%d, errno=0X%X", pInfo->nMd,

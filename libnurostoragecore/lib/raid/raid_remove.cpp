@@ -200,8 +200,7 @@ int RAIDRemove(const RAID_INFO *pInfo, PNLIBHASH pUuidHash)
     // Read before the stop: it takes the running array to tell its members.
     char szUuid[RAID_UUID_SIZE];
     (void)snprintf(szUuid, sizeof(szUuid), "%s", pInfo->szUuid);
-    const bool fUuid =
-        szUuid[0] != '\0' || RAIDUUIDGet(pInfo->szPath, szUuid, RAID_UUID_SIZE) == 1;
+    const bool fUuid = szUuid[0] != '\0' || RAIDUUIDGet(pInfo->szPath, szUuid, RAID_UUID_SIZE) == 1;
     if (!StopRetried(pInfo->szPath)) {
         return -1;
     }

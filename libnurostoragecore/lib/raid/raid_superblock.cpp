@@ -106,7 +106,7 @@ struct REPORT_KEY {
 };
 
 constexpr REPORT_KEY REPORT_KEYS[] = {
-    {"Version", VersionTake},          {"Array UUID", UuidTake}, {"UUID", UuidTake},
+    {"Version", VersionTake},          {"Array UUID", UuidTake},  {"UUID", UuidTake},
     {"Raid Devices", RaidDevicesTake}, {"Raid Level", LevelTake}, {"Name", MdPathTake},
     {"Preferred Minor", MdPathTake},   {"Events", EventsTake},    {"Device Role", DeviceRoleTake},
 };

@@ -1,0 +1,81 @@
+#!/usr/bin/env python3
+# SPDX-License-Identifier: MIT
+"""Includes point down only: fails on one that points up or sideways.
+
+Usage: include_direction.py [ROOT]; prints what is wrong and ends with 'N passed, M failed'.
+"""
+import os
+import re
+import sys
+
+# Who may use whom; a floor may always use itself.
+FLOORS = {
+    "libnurocore": set(),
+    "libhwcontrol": {"libnurocore"},
+    "libnurostoragecore": {"libnurocore", "libhwcontrol"},
+    "tool": {"libnurocore", "libhwcontrol", "libnurostoragecore"},
+}
+# The folder of a public header tells its floor.
+HEADER_FOLDERS = {
+    "nurocore": "libnurocore",
+    "hwcontrol": "libhwcontrol",
+    "nurostoragecore": "libnurostoragecore",
+}
+# Inside a floor two subjects look circular; this is how they are cut: room -> rooms it may not use.
+ROOMS = {
+    "disk_name": {"disk_port", "disk_path"},
+    "disk_port": {"disk_path"},
+    "partition_layout": {"raid_membership", "partition_version", "raid_info"},
+    "raid_membership": {"partition_version"},
+}
+INCLUDE = re.compile(r'^\s*#\s*include\s+"([^"]+)"')
+
+
+def sources(root, floor):
+    for folder, _, names in os.walk(os.path.join(root, floor)):
+        for name in sorted(names):
+            if name.endswith((".h", ".cpp")):
+                yield os.path.join(folder, name)
+
+
+def fault(floor, path, target):
+    """What is wrong with an include, or None."""
+    head = target.split("/")[0]
+    owner = HEADER_FOLDERS.get(head)
+    room = os.path.splitext(os.path.basename(path))[0]
+    used = os.path.splitext(os.path.basename(target))[0]
+    if used in ROOMS.get(room, set()):
+        return f"{room} knows nothing of {used}"
+    if owner is not None:
+        if owner == floor or owner in FLOORS[floor]:
+            return None
+        return f"{floor} may not use {owner}"
+    folder = os.path.dirname(path)
+    while os.path.basename(folder) not in ("lib", "tool", floor):
+        folder = os.path.dirname(folder)
+    for base in (os.path.dirname(path), folder):
+        if os.path.exists(os.path.join(base, target)):
+            return None
+    return "neither a public header of a floor below nor a private one of this floor"
+
+
+def main():
+    root = sys.argv[1] if len(sys.argv) > 1 else "."
+    passed = failed = 0
+    for floor in FLOORS:
+        for path in sources(root, floor):
+            for number, line in enumerate(open(path, encoding="utf-8"), 1):
+                match = INCLUDE.match(line)
+                if not match:
+                    continue
+                wrong = fault(floor, path, match.group(1))
+                if wrong is None:
+                    passed += 1
+                else:
+                    failed += 1
+                    print(f"{os.path.relpath(path, root)}:{number}: includes {match.group(1)}: {wrong}")
+    print(f"{passed} passed, {failed} failed")
+    return 1 if failed or not passed else 0
+
+
+sys.exit(main())
