@@ -286,76 +286,85 @@ struct SfdiskTest : testing::Test {
 
 // ---- the command line
 
+struct MALFORMED {
+    Words words; // DISK stands for the image
+    string szLine;
+};
+
+const std::vector<MALFORMED> MALFORMED_WORDS = {
+    {{}, "these options make no command"},
+    {{"DISK"}, "these options make no command"},
+    {{"-M1"}, "no " DISK " is named"},
+    {{"-M1", ""}, "no " DISK " is named"},
+    {{"-M1", "a", "b"}, "more than one " DISK ": 'a' and 'b'"},
+    {{"-M", "DISK"}, "unknown option '-M'"},
+    {{"-M2", "DISK"}, "unknown option '-M2'"},
+    {{"-M1", "-M1", "DISK"}, "option '-M1' is given twice"},
+    {{"-M1", "-l", "DISK"}, "these options make no command"},
+    {{"-x", "DISK"}, "unknown option '-x'"},
+    {{"-", "DISK"}, "unknown option '-'"},
+    {{"--", "-M1", "DISK"}, "unknown option '--'"},
+    {{"-uM", "-l", "-N1", "DISK"}, "unknown option '-uM'"},
+    {{"-qq", "-M1", "DISK"}, "unknown option '-qq'"},
+    {{"-l", "-N1", "DISK"}, "these options make no command"},
+    {{"-l", "-uS", "DISK"}, "these options make no command"},
+    {{"-l", "-uS", "-N", "DISK"}, "bad value '' of option '-N'"},
+    {{"-l", "-uS", "-N0", "DISK"}, "bad value '0' of option '-N'"},
+    {{"-l", "-uS", "-N-1", "DISK"}, "bad value '-1' of option '-N'"},
+    {{"-l", "-uS", "-N+1", "DISK"}, "bad value '+1' of option '-N'"},
+    {{"-l", "-uS", "-N 1", "DISK"}, "bad value ' 1' of option '-N'"},
+    {{"-l", "-uS", "-N1x", "DISK"}, "bad value '1x' of option '-N'"},
+    {{"-l", "-uS", "-N4294967297", "DISK"}, "bad value '4294967297' of option '-N'"},
+    {{"--fast-delete", "DISK"}, "bad value 'DISK' of option '--fast-delete'"},
+    {{"--fast-delete", "", "DISK"}, "bad value '' of option '--fast-delete'"},
+    {{"--fast-delete", "3", "DISK"}, "bad value '3' of option '--fast-delete'"},
+    {{"--fast-delete", "2:1", "DISK"}, "bad value '2:1' of option '--fast-delete'"},
+    {{"--fast-delete", "0:2", "DISK"}, "bad value '0:2' of option '--fast-delete'"},
+    {{"--fast-delete", "1:2:3", "DISK"}, "bad value '1:2:3' of option '--fast-delete'"},
+    {{"--fast-delete", ":2", "DISK"}, "bad value ':2' of option '--fast-delete'"},
+    {{"--fast-delete", "1:", "DISK"}, "bad value '1:' of option '--fast-delete'"},
+    {{"--fast-delete", "-2", "DISK"}, "bad value '-2' of option '--fast-delete'"},
+    {{"--fast-delete"}, "bad value '' of option '--fast-delete'"},
+    {{"--fast-delete=-1", "DISK"}, "unknown option '--fast-delete=-1'"},
+    {{"-N1", "-uS", "-z1", "-tfd", "DISK"}, "these options make no command"},
+    {{"-N1", "-uS", "-j1", "-tfd", "DISK"}, "these options make no command"},
+    {{"-N1", "-uS", "-j1", "-z1", "DISK"}, "these options make no command"},
+    {{"-N1", "-j1", "-z1", "-tfd", "DISK"}, "these options make no command"},
+    {{"-N1", "-l", "-uS", "-j1", "-z1", "-tfd", "DISK"}, "these options make no command"},
+    {{"-N1", "-uS", "-j-1", "-z1", "-tfd", "DISK"}, "bad value '-1' of option '-j'"},
+    {{"-N1", "-uS", "-j18446744073709551616", "-z1", "-tfd", "DISK"},
+     "bad value '18446744073709551616' of option '-j'"},
+    {{"-N1", "-uS", "-j1", "-z0", "-tfd", "DISK"}, "bad value '0' of option '-z'"},
+    {{"-N1", "-uS", "-j1", "-z-2", "-tfd", "DISK"}, "bad value '-2' of option '-z'"},
+    {{"-N1", "-uS", "-j1", "-z99999999999999999999", "-tfd", "DISK"},
+     "bad value '99999999999999999999' of option '-z'"},
+    {{"-N1", "-uS", "-j1", "-z18446744073709551615", "-tfd", "DISK"},
+     "bad value '18446744073709551615' of option '-z'"},
+    {{"-N1", "-uS", "-j1", "-z1", "-t0", "DISK"}, "bad value '0' of option '-t'"},
+    {{"-N1", "-uS", "-j1", "-z1", "-t100", "DISK"}, "bad value '100' of option '-t'"},
+    {{"-N1", "-uS", "-j1", "-z1", "-t0xfd", "DISK"}, "bad value '0xfd' of option '-t'"},
+    {{"-N1", "-uS", "-j1", "-z1", "-tg", "DISK"}, "bad value 'g' of option '-t'"},
+    {{"-N1", "-uS", "-j1", "-z1", "-t5", "DISK"}, "bad value '5' of option '-t'"},
+    {{"-N1", "-uS", "-j1", "-z1", "-tF", "DISK"}, "bad value 'F' of option '-t'"},
+    {{"-N1", "-uS", "-j1", "-z1", "-tee", "DISK"}, "bad value 'ee' of option '-t'"},
+};
+
+string DiskFill(string szText, const string &szDisk)
+{
+    const size_t at = szText.find("DISK");
+    return at == string::npos ? szText : szText.replace(at, 4, szDisk);
+}
+
 TEST_F(SfdiskTest, MalformedWordsAreRefusedWithOneLine)
 {
-    struct ROW {
-        Words words;
-        const char *szLine;
-    };
-    const string &disk = szImage;
     ImageMake(MEBIBYTE);
-    const std::vector<ROW> rows = {
-        {{}, "these options make no command"},
-        {{disk}, "these options make no command"},
-        {{"-M1"}, "no disk is named"},
-        {{"-M1", ""}, "no disk is named"},
-        {{"-M1", "a", "b"}, "more than one disk: 'a' and 'b'"},
-        {{"-M", disk}, "unknown option '-M'"},
-        {{"-M2", disk}, "unknown option '-M2'"},
-        {{"-M1", "-M1", disk}, "option '-M1' is given twice"},
-        {{"-M1", "-l", disk}, "these options make no command"},
-        {{"-x", disk}, "unknown option '-x'"},
-        {{"-", disk}, "unknown option '-'"},
-        {{"--", "-M1", disk}, "unknown option '--'"},
-        {{"-uM", "-l", "-N1", disk}, "unknown option '-uM'"},
-        {{"-qq", "-M1", disk}, "unknown option '-qq'"},
-        {{"-l", "-N1", disk}, "these options make no command"},
-        {{"-l", "-uS", disk}, "these options make no command"},
-        {{"-l", "-uS", "-N", disk}, "bad value '' of option '-N'"},
-        {{"-l", "-uS", "-N0", disk}, "bad value '0' of option '-N'"},
-        {{"-l", "-uS", "-N-1", disk}, "bad value '-1' of option '-N'"},
-        {{"-l", "-uS", "-N+1", disk}, "bad value '+1' of option '-N'"},
-        {{"-l", "-uS", "-N 1", disk}, "bad value ' 1' of option '-N'"},
-        {{"-l", "-uS", "-N1x", disk}, "bad value '1x' of option '-N'"},
-        {{"-l", "-uS", "-N4294967297", disk}, "bad value '4294967297' of option '-N'"},
-        {{"--fast-delete", disk}, nullptr},
-        {{"--fast-delete", "", disk}, "bad value '' of option '--fast-delete'"},
-        {{"--fast-delete", "3", disk}, "bad value '3' of option '--fast-delete'"},
-        {{"--fast-delete", "2:1", disk}, "bad value '2:1' of option '--fast-delete'"},
-        {{"--fast-delete", "0:2", disk}, "bad value '0:2' of option '--fast-delete'"},
-        {{"--fast-delete", "1:2:3", disk}, "bad value '1:2:3' of option '--fast-delete'"},
-        {{"--fast-delete", ":2", disk}, "bad value ':2' of option '--fast-delete'"},
-        {{"--fast-delete", "1:", disk}, "bad value '1:' of option '--fast-delete'"},
-        {{"--fast-delete", "-2", disk}, "bad value '-2' of option '--fast-delete'"},
-        {{"--fast-delete"}, "bad value '' of option '--fast-delete'"},
-        {{"--fast-delete=-1", disk}, "unknown option '--fast-delete=-1'"},
-        {{"-N1", "-uS", "-z1", "-tfd", disk}, "these options make no command"},
-        {{"-N1", "-uS", "-j1", "-tfd", disk}, "these options make no command"},
-        {{"-N1", "-uS", "-j1", "-z1", disk}, "these options make no command"},
-        {{"-N1", "-j1", "-z1", "-tfd", disk}, "these options make no command"},
-        {{"-N1", "-l", "-uS", "-j1", "-z1", "-tfd", disk}, "these options make no command"},
-        {{"-N1", "-uS", "-j-1", "-z1", "-tfd", disk}, "bad value '-1' of option '-j'"},
-        {{"-N1", "-uS", "-j18446744073709551616", "-z1", "-tfd", disk},
-         "bad value '18446744073709551616' of option '-j'"},
-        {{"-N1", "-uS", "-j1", "-z0", "-tfd", disk}, "bad value '0' of option '-z'"},
-        {{"-N1", "-uS", "-j1", "-z-2", "-tfd", disk}, "bad value '-2' of option '-z'"},
-        {{"-N1", "-uS", "-j1", "-z99999999999999999999", "-tfd", disk},
-         "bad value '99999999999999999999' of option '-z'"},
-        {{"-N1", "-uS", "-j1", "-z18446744073709551615", "-tfd", disk},
-         "bad value '18446744073709551615' of option '-z'"},
-        {{"-N1", "-uS", "-j1", "-z1", "-t0", disk}, "bad value '0' of option '-t'"},
-        {{"-N1", "-uS", "-j1", "-z1", "-t100", disk}, "bad value '100' of option '-t'"},
-        {{"-N1", "-uS", "-j1", "-z1", "-t0xfd", disk}, "bad value '0xfd' of option '-t'"},
-        {{"-N1", "-uS", "-j1", "-z1", "-tg", disk}, "bad value 'g' of option '-t'"},
-        {{"-N1", "-uS", "-j1", "-z1", "-t5", disk}, "bad value '5' of option '-t'"},
-        {{"-N1", "-uS", "-j1", "-z1", "-tF", disk}, "bad value 'F' of option '-t'"},
-        {{"-N1", "-uS", "-j1", "-z1", "-tee", disk}, "bad value 'ee' of option '-t'"},
-    };
     Sign();
-    for (const ROW &row : rows) {
-        // Without a range the disk is taken for it.
-        RunBadly(row.words,
-                 row.szLine ? row.szLine : "bad value '" + disk + "' of option '--fast-delete'");
+    for (const MALFORMED &row : MALFORMED_WORDS) {
+        Words words;
+        for (const string &szWord : row.words) {
+            words.push_back(DiskFill(szWord, szImage));
+        }
+        RunBadly(words, DiskFill(row.szLine, szImage));
     }
 }
 

@@ -210,6 +210,13 @@ logical_partitions() {
     check "5 stays" knows sdc 5 10240 2048
     blockdev --rereadpt /dev/sdc
     check "the kernel reads the same" knows sdc 6 18432 4096
+    must dd if=/dev/sdc of=/tmp/tables bs=512 count=20000
+    check "delete all" does --fast-delete -1 /dev/sdc
+    must dd if=/tmp/tables of=/dev/sdc bs=512 conv=notrunc
+    check "sign" does -M1 /dev/sdc
+    check "5 is known again" knows sdc 5 10240 2048
+    check "6 is known again" knows sdc 6 18432 4096
+    check "of 4 only its beginning" knows sdc 4 8192 2
     check "delete 3:128" does --fast-delete 3:128 /dev/sdc
     for part in 4 5 6; do
         check "$part is gone" forgot sdc "$part"
