@@ -294,9 +294,9 @@ struct MALFORMED {
 const std::vector<MALFORMED> MALFORMED_WORDS = {
     {{}, "these options make no command"},
     {{"DISK"}, "these options make no command"},
-    {{"-M1"}, "no " DISK " is named"},
-    {{"-M1", ""}, "no " DISK " is named"},
-    {{"-M1", "a", "b"}, "more than one " DISK ": 'a' and 'b'"},
+    {{"-M1"}, "no disk is named"},
+    {{"-M1", ""}, "no disk is named"},
+    {{"-M1", "a", "b"}, "more than one disk: 'a' and 'b'"},
     {{"-M", "DISK"}, "unknown option '-M'"},
     {{"-M2", "DISK"}, "unknown option '-M2'"},
     {{"-M1", "-M1", "DISK"}, "option '-M1' is given twice"},
