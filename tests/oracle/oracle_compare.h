@@ -1,0 +1,27 @@
+// SPDX-License-Identifier: MIT
+// Compares what a run left behind with what the model says. Children of one phase run side by side,
+// so the commands of each disk are compared in their order, and their lines without one.
+#pragma once
+
+#include "oracle_model.h"
+
+#include <string>
+#include <utility>
+#include <vector>
+
+// What was seen of one run.
+struct ORACLE_SEEN {
+    std::vector<ORACLE_WORDS> commands{}; // in order; a pause is "sleep" and its seconds
+    bool fShellText =
+        false; // the shell's own call ("sh", "-c", text) is seen, not what comes of it
+    std::vector<std::pair<int, std::string>> lines{}; // priority and whole syslog line, in order
+    std::vector<std::string> errorLog{};              // lines without their time stamp
+    std::string szOut{};
+    std::string szErr{};
+    int nStatus = 0;
+    std::set<std::string> markers{};
+    std::vector<std::string> problems{}; // anything that is wrong by itself
+};
+
+// One text for each difference; none when model and run agree.
+std::vector<std::string> OracleDifferences(const ORACLE_ANSWER &answer, const ORACLE_SEEN &seen);
