@@ -1,0 +1,312 @@
+// SPDX-License-Identifier: MIT
+#include "nurocore/error.h"
+#include "nurocore/pipe.h"
+#include "nurocore/process.h"
+#include "nurocore/szlist.h"
+#include "nurocore/types.h"
+#include "sandbox.h"
+
+#include <cerrno>
+#include <climits>
+#include <cstdio>
+#include <cstdlib>
+#include <gtest/gtest.h>
+#include <string>
+#include <unistd.h>
+
+// What the core library says in the log when a process cannot be made as asked, or a list is asked
+// for what it cannot do. How these functions work otherwise is tested in the unit ring.
+
+namespace
+{
+
+constexpr u32 OLD_CODE = 0xFFFFFF00; // stands in the record before every call
+
+MACHINE MachineWithFault(const MACHINE_FAULT &fault)
+{
+    MACHINE machine = MachineMake();
+    machine.faults = {fault};
+    return machine;
+}
+
+void RecordReset()
+{
+    NLIBCErrSet(OLD_CODE, "before", 1);
+}
+
+std::string StreamRead(FILE *pStream)
+{
+    std::string text;
+    for (int ch = fgetc(pStream); ch != EOF; ch = fgetc(pStream)) {
+        text += static_cast<char>(ch);
+    }
+    return text;
+}
+
+// ---- fork --------------------------------------------------------------------------------------
+
+TEST(ForkCloseIo, LogsAFailedFork)
+{
+    const MACHINE machine = MachineWithFault({.szFunction = "fork", .error = EAGAIN});
+    const RUN_RESULT result = MachineCall(machine, [] {
+        RecordReset();
+        EXPECT_EQ(NLIBCForkCloseIo(), -1);
+        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
+    });
+    EXPECT_EQ(LogText(result),
+              "<11>process.cpp:# fork error, errno=Resource temporarily unavailable\n");
+}
+
+TEST(Fork, SetsACodeAndLogsNothing)
+{
+    const MACHINE machine = MachineWithFault({.szFunction = "fork", .error = ENOMEM});
+    const RUN_RESULT result = MachineCall(machine, [] {
+        RecordReset();
+        EXPECT_EQ(NLIBCFork(0), -1);
+        EXPECT_EQ(NLIBCErrGet(), ERR_FORK_FAILED);
+        EXPECT_STREQ(NLIBCErrGetFile(), "process.cpp");
+    });
+    EXPECT_EQ(LogText(result), "");
+}
+
+// The first child is the process that the fork of the grandchild fails in.
+TEST(Fork, LogsWhenTheGrandchildOfADaemonCannotBeMade)
+{
+    const MACHINE machine = MachineWithFault({.szFunction = "fork", .nCall = 2, .error = ENOMEM});
+    const RUN_RESULT result = MachineCall(machine, [] {
+        RecordReset();
+        EXPECT_EQ(NLIBCFork(FORK_DAEMONIZE), -1);
+        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
+    });
+    EXPECT_EQ(LogText(result),
+              "<11>process.cpp:# Failed to fork(). errno=[12/Cannot allocate memory]\n");
+}
+
+TEST(Execl, LeavesTheCodeOfTheRunWhenItCannotFork)
+{
+    const MACHINE machine = MachineWithFault({.szFunction = "fork", .error = EAGAIN});
+    const RUN_RESULT result = MachineCall(machine, [] {
+        RecordReset();
+        EXPECT_EQ(NLIBCExecl("/bin/umount", "/dev/md2", NULL), -1);
+        EXPECT_EQ(NLIBCErrGet(), ERR_CHILD_FAILED);
+    });
+    EXPECT_EQ(LogText(result), "");
+}
+
+// ---- pipe streams ------------------------------------------------------------------------------
+
+constexpr char FCNTL_FAILED[] = "<11>pipe.cpp:# fcntl failed, Permission denied\n";
+
+TEST(Popen, LogsThatItsEndStaysCloseOnExecAndGoesOn)
+{
+    MACHINE machine = MachineWithFault({.szFunction = "fcntl", .error = EACCES});
+    MachineTool(machine, "/sbin/pvs", {.szOut = "row\n", .status = 1});
+    const RUN_RESULT result = MachineCall(machine, [] {
+        RecordReset();
+        FILE *const pStream = NLIBCPopen("/sbin/pvs", "r", NULL);
+        ASSERT_NE(pStream, nullptr);
+        EXPECT_EQ(StreamRead(pStream), "row\n");
+        EXPECT_EQ(NLIBCPclose(pStream), 256);
+        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
+    });
+    EXPECT_EQ(LogText(result), FCNTL_FAILED);
+}
+
+TEST(Popen, DoesNotTouchItsEndWhenAskedNotTo)
+{
+    MACHINE machine = MachineWithFault({.szFunction = "fcntl", .error = EACCES});
+    MachineTool(machine, "/sbin/pvs", {.szOut = "row\n"});
+    const RUN_RESULT result = MachineCall(machine, [] {
+        FILE *const pStream = NLIBCPopen("/sbin/pvs", "re", NULL);
+        ASSERT_NE(pStream, nullptr);
+        EXPECT_EQ(StreamRead(pStream), "row\n");
+        EXPECT_EQ(NLIBCPclose(pStream), 0);
+    });
+    EXPECT_EQ(LogText(result), "");
+}
+
+// With standard input and output closed the pipe's ends are 0 and 1, so the tool's end has its
+// number already and only has to survive the exec.
+void PopenOnClosedOutput(const std::string &expected)
+{
+    const int fdIn = dup(STDIN_FILENO);
+    const int fdOut = dup(STDOUT_FILENO);
+    (void)close(STDIN_FILENO);
+    (void)close(STDOUT_FILENO);
+    FILE *const pStream = NLIBCPopen("/sbin/pvs", "re", NULL);
+    const std::string text = pStream == nullptr ? "no stream" : StreamRead(pStream);
+    const int status = NLIBCPclose(pStream);
+    (void)dup2(fdIn, STDIN_FILENO);
+    (void)dup2(fdOut, STDOUT_FILENO);
+    EXPECT_EQ(text, expected);
+    EXPECT_EQ(status, 0);
+}
+
+TEST(Popen, LetsTheToolsEndSurviveWhereItHasTheNumberAlready)
+{
+    MACHINE machine = MachineMake();
+    MachineTool(machine, "/sbin/pvs", {.szOut = "row\n"});
+    const RUN_RESULT result = MachineCall(machine, [] { PopenOnClosedOutput("row\n"); });
+    EXPECT_EQ(LogText(result), "");
+}
+
+TEST(Popen, LogsInTheChildWhenTheToolsEndWillNotSurvive)
+{
+    MACHINE machine = MachineWithFault({.szFunction = "fcntl", .error = EACCES});
+    MachineTool(machine, "/sbin/pvs", {.szOut = "row\n"});
+    const RUN_RESULT result = MachineCall(machine, [] { PopenOnClosedOutput(""); });
+    EXPECT_EQ(LogText(result), FCNTL_FAILED);
+}
+
+struct POPEN_CASE {
+    const char *szFunction;
+    int error;
+    u32 code;
+};
+
+constexpr POPEN_CASE POPEN_CASES[] = {
+    {"pipe2", EMFILE, ERR_PIPE_FAILED},
+    {"fork", EAGAIN, ERR_FORK_FAILED},
+    {"fdopen", EMFILE, ERR_OPEN_FAILED},
+};
+
+TEST(Popen, SetsACodeAndLogsNothingWhenItFails)
+{
+    for (const POPEN_CASE &row : POPEN_CASES) {
+        SCOPED_TRACE(row.szFunction);
+        MACHINE machine = MachineWithFault({.szFunction = row.szFunction, .error = row.error});
+        MachineTool(machine, "/sbin/pvs", {.nTimes = ANY_TIMES});
+        machine.fMayLeaveChildren = true;
+        const RUN_RESULT result = MachineCall(machine, [&row] {
+            RecordReset();
+            EXPECT_EQ(NLIBCPopen("/sbin/pvs", "r", NULL), nullptr);
+            EXPECT_EQ(NLIBCErrGet(), row.code);
+            EXPECT_STREQ(NLIBCErrGetFile(), "pipe.cpp");
+        });
+        EXPECT_EQ(LogText(result), "");
+    }
+}
+
+// ---- lists -------------------------------------------------------------------------------------
+
+constexpr char PARAMETER_ERROR[] = "<11>szlist.cpp:# Parameter error\n";
+constexpr char OUT_OF_MEMORY[] = "<11>szlist.cpp:# Out of memory!!\n";
+
+PNLIBSZLIST ListOfTwo()
+{
+    PNLIBSZLIST pList = NLIBCSzListAlloc(512);
+    (void)NLIBCSzListPush(&pList, "a");
+    (void)NLIBCSzListPush(&pList, "b");
+    return pList;
+}
+
+TEST(SzListJoin, LogsEachBadParameter)
+{
+    PNLIBSZLIST pList = ListOfTwo();
+    char achText[16] = "old";
+    char *pszText = achText;
+    char *pszNone = nullptr;
+    int cbText = sizeof(achText);
+    int cbNegative = -1;
+    const struct {
+        PNLIBSZLIST pList;
+        const char *szSeparator;
+        char **pszText;
+        int *pcbText;
+    } rows[] = {
+        {nullptr, ",", &pszText, &cbText}, {pList, nullptr, &pszText, &cbText},
+        {pList, ",", nullptr, &cbText},    {pList, ",", &pszNone, &cbText},
+        {pList, ",", &pszText, nullptr},   {pList, ",", &pszText, &cbNegative},
+    };
+    for (const auto &row : rows) {
+        const RUN_RESULT result = MachineCall(MachineMake(), [&row, &achText] {
+            RecordReset();
+            EXPECT_EQ(NLIBCSzListJoin(row.pList, row.szSeparator, row.pszText, row.pcbText), -1);
+            EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
+            EXPECT_STREQ(NLIBCErrGetFile(), "szlist.cpp");
+            EXPECT_STREQ(achText, "old");
+        });
+        EXPECT_EQ(LogText(result), PARAMETER_ERROR);
+    }
+    NLIBCSzListFree(pList);
+}
+
+TEST(SzListDump2Str, LogsEachBadParameter)
+{
+    PNLIBSZLIST pList = ListOfTwo();
+    char achText[16] = "old";
+    const struct {
+        PNLIBSZLIST pList;
+        const char *szSeparator;
+        char *szText;
+        int cbText;
+    } rows[] = {
+        {nullptr, ",", achText, 16}, {pList, nullptr, achText, 16}, {pList, ",", nullptr, 16},
+        {pList, ",", achText, 0},    {pList, ",", achText, -1},     {pList, ",", achText, INT_MIN},
+    };
+    for (const auto &row : rows) {
+        const RUN_RESULT result = MachineCall(MachineMake(), [&row, &achText] {
+            RecordReset();
+            EXPECT_EQ(NLIBCSzListDump2Str(row.pList, row.szSeparator, row.szText, row.cbText), -1);
+            EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
+            EXPECT_STREQ(achText, "old");
+        });
+        EXPECT_EQ(LogText(result), PARAMETER_ERROR);
+    }
+    NLIBCSzListFree(pList);
+}
+
+TEST(SzListJoin, LogsNothingWhenItWorks)
+{
+    PNLIBSZLIST pList = ListOfTwo();
+    const RUN_RESULT result = MachineCall(MachineMake(), [&pList] {
+        int cbText = 0;
+        char *pszText = static_cast<char *>(malloc(1));
+        EXPECT_EQ(NLIBCSzListJoin(pList, ",", &pszText, &cbText), 5);
+        EXPECT_STREQ(pszText, "a,b");
+        free(pszText);
+        char achText[3] = "";
+        EXPECT_EQ(NLIBCSzListDump2Str(pList, ",", achText, 3), -1);
+        EXPECT_EQ(NLIBCErrGet(), ERR_OUT_OF_SPACE);
+    });
+    EXPECT_EQ(LogText(result), "");
+    NLIBCSzListFree(pList);
+}
+
+TEST(SzListJoin, LogsWhenItsBufferCannotGrow)
+{
+    PNLIBSZLIST pList = ListOfTwo();
+    const MACHINE machine = MachineWithFault({.szFunction = "realloc", .error = ENOMEM});
+    const RUN_RESULT result = MachineCall(machine, [&pList] {
+        int cbText = 4; // a byte less than it needs
+        char *pszText = static_cast<char *>(malloc(4));
+        RecordReset();
+        EXPECT_EQ(NLIBCSzListJoin(pList, ",", &pszText, &cbText), -1);
+        EXPECT_EQ(NLIBCErrGet(), ERR_OUT_OF_MEMORY);
+        EXPECT_STREQ(NLIBCErrGetFile(), "szlist.cpp");
+        EXPECT_EQ(pszText, nullptr); // freed, which a sanitizer build proves
+    });
+    EXPECT_EQ(LogText(result), OUT_OF_MEMORY);
+    NLIBCSzListFree(pList);
+}
+
+TEST(SzListJoin, LogsWhenItCannotMeasure)
+{
+    PNLIBSZLIST pList = ListOfTwo();
+    const MACHINE machine = MachineWithFault({.szFunction = "calloc", .error = ENOMEM});
+    const RUN_RESULT result = MachineCall(machine, [&pList] {
+        char achText[16] = "old";
+        char *pszText = achText;
+        int cbText = sizeof(achText);
+        RecordReset();
+        EXPECT_EQ(NLIBCSzListJoin(pList, ",", &pszText, &cbText), -1);
+        EXPECT_EQ(NLIBCErrGet(), ERR_OUT_OF_MEMORY);
+        EXPECT_EQ(pszText, achText); // the buffer stays the caller's
+        EXPECT_STREQ(achText, "old");
+        EXPECT_EQ(cbText, 16);
+    });
+    EXPECT_EQ(LogText(result), OUT_OF_MEMORY);
+    NLIBCSzListFree(pList);
+}
+
+} // namespace
