@@ -1,0 +1,102 @@
+// SPDX-License-Identifier: MIT
+#pragma once
+
+// What the cases of taking an array down share: disks, reports of superblocks, the commands.
+
+#include "sandbox.h"
+
+#include "nurocore/error.h"
+#include "nurostoragecore/raid_info.h"
+
+#include <cstdio>
+#include <regex>
+#include <string>
+#include <vector>
+
+inline constexpr u32 OLD_CODE = 0xFFFFFF00; // stands in the record before a call
+
+inline void RecordReset()
+{
+    NLIBCErrSet(OLD_CODE, "before", 1);
+}
+
+inline constexpr char UUID_MD2[] = "5b1f2c3d:4e5f6071:8293a4b5:00000002";
+inline constexpr char UUID_MD3[] = "5b1f2c3d:4e5f6071:8293a4b5:00000003";
+
+// A report that says no more than the UUID.
+inline std::string ReportOf(const std::string &szUuid)
+{
+    return "/dev/sdx3:\n          Magic : a92b4efc\n     Array UUID : " + szUuid + "\n";
+}
+
+inline std::string ExamineCommand(const std::string &szName)
+{
+    return "/sbin/mdadm -E /dev/" + szName;
+}
+
+inline std::string WipeCommand(const std::string &szName)
+{
+    return "/sbin/mdadm --zero-superblock /dev/" + szName;
+}
+
+inline void ExamineExpect(MACHINE &machine, const std::string &szName, const std::string &szUuid,
+                          int nTimes = 1)
+{
+    MachineTool(machine, ExamineCommand(szName), {.szOut = ReportOf(szUuid), .nTimes = nTimes});
+}
+
+inline void BlankMemberExpect(MACHINE &machine, const std::string &szName, int nTimes = 1)
+{
+    MachineTool(machine, ExamineCommand(szName),
+                {.szErr = "mdadm: No md superblock detected on /dev/" + szName + ".\n",
+                 .status = 1,
+                 .nTimes = nTimes});
+}
+
+// Partitions 1 to nPartition.
+inline void DiskWithPartitionsAdd(MACHINE &machine, const std::string &szDisk, int nPartition)
+{
+    constexpr std::uint64_t SECTORS = 1048576;
+    MachineDiskAdd(machine, szDisk);
+    for (int i = 1; i <= nPartition; i++) {
+        const std::uint64_t start = 2048 + SECTORS * static_cast<std::uint64_t>(i - 1);
+        MachinePartitionAdd(machine, szDisk, i, start, SECTORS);
+    }
+}
+
+// Two disks with three partitions, md2 on the third of each.
+inline MACHINE MachineWithMirror()
+{
+    MACHINE machine = MachineMake();
+    DiskWithPartitionsAdd(machine, "sda", 3);
+    DiskWithPartitionsAdd(machine, "sdb", 3);
+    MachineMdAdd(machine, {.nMd = 2, .members = {{"sda3"}, {"sdb3", "in_sync\n", "1\n"}}});
+    return machine;
+}
+
+inline RAID_INFO RecordOf(const std::string &szPath, const std::string &szUuid = "")
+{
+    RAID_INFO info = {};
+    (void)snprintf(info.szPath, sizeof(info.szPath), "%s", szPath.c_str());
+    (void)snprintf(info.szUuid, sizeof(info.szUuid), "%s", szUuid.c_str());
+    return info;
+}
+
+inline std::string TextOf(const std::vector<std::string> &lines)
+{
+    std::string szText;
+    for (const std::string &szLine : lines) {
+        szText += szLine + "\n";
+    }
+    return szText;
+}
+
+// The operation error log with its time stamps masked; one that is not of the form stays.
+inline std::string OperationErrors()
+{
+    static const std::regex stamp(
+        "(^|\n)(Jan|Feb|Mar|Apr|May|Jun|Jul|Aug|Sep|Oct|Nov|Dec) [0-3][0-9] "
+        "[0-2][0-9]:[0-5][0-9]:[0-6][0-9] ");
+    const std::string szLog = MachineFileRead("/var/log/space_operation_error.log").value_or("");
+    return std::regex_replace(szLog, stamp, "$1<time> ");
+}
