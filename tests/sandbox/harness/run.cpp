@@ -6,6 +6,7 @@
 #include "transcript.h"
 #include "wire.h"
 
+#include <gtest/gtest-spi.h>
 #include <gtest/gtest.h>
 
 #include <cerrno>
@@ -92,9 +93,8 @@ void StreamsTake(const RUN_STREAMS &streams)
     (void)dup2(streams.fdIn, STDIN_FILENO);
     (void)dup2(streams.fdOut, STDOUT_FILENO);
     (void)dup2(streams.fdErr, STDERR_FILENO);
-    for (int fd = STDERR_FILENO + 1; fd < streams.fdFailures; fd++) {
-        (void)close(fd);
-    }
+    (void)close_range(STDERR_FILENO + 1, static_cast<unsigned int>(streams.fdFailures) - 1, 0);
+    (void)close_range(static_cast<unsigned int>(streams.fdFailures) + 1, ~0U, 0);
 }
 
 std::vector<char *> Pointers(std::vector<std::string> &strings)
@@ -295,7 +295,7 @@ RUN_RESULT Watch(const MACHINE &machine, const BODY &body, std::string &szFailur
         perror("sandbox: pipe2");
         abort();
     }
-    streams.fdFailures = MemoryFile("failures"); // the highest: all below are closed inside
+    streams.fdFailures = MemoryFile("failures");
     (void)fflush(nullptr);
 
     const pid_t pid = NamespaceFork();
@@ -345,18 +345,11 @@ RUN_RESULT ProblemsFail(RUN_RESULT result)
 
 // ---- failures of a body, handed to the test that called it --------------------------------------
 
-int FailuresCount()
+void FailuresSend(int fd, const testing::TestPartResultArray &parts)
 {
-    return testing::UnitTest::GetInstance()->current_test_info()->result()->total_part_count();
-}
-
-void FailuresSend(int fd, int iFirst)
-{
-    const testing::TestResult *const pResult =
-        testing::UnitTest::GetInstance()->current_test_info()->result();
     std::string szAll;
-    for (int i = iFirst; i < pResult->total_part_count(); i++) {
-        const testing::TestPartResult &part = pResult->GetTestPartResult(i);
+    for (int i = 0; i < parts.size(); i++) {
+        const testing::TestPartResult &part = parts.GetTestPartResult(i);
         if (part.failed()) {
             szAll += std::string(part.file_name() == nullptr ? "" : part.file_name()) + '\n' +
                      std::to_string(part.line_number()) + '\n' + part.message() + '\0';
@@ -380,7 +373,9 @@ void FailuresReport(const std::string &szFailures)
 
 [[noreturn]] void BodyRun(const MACHINE &machine, const std::function<void()> &body, int fdFailures)
 {
-    const int iFirst = FailuresCount();
+    testing::TestPartResultArray parts;
+    const testing::ScopedFakeTestPartResultReporter reporter(
+        testing::ScopedFakeTestPartResultReporter::INTERCEPT_ONLY_CURRENT_THREAD, &parts);
     (void)clearenv();
     for (const auto &[szName, szValue] : machine.environment) {
         (void)setenv(szName.c_str(), szValue.c_str(), 1);
@@ -392,7 +387,7 @@ void FailuresReport(const std::string &szFailures)
     body();
     InterposeDeactivate();
     (void)fflush(nullptr);
-    FailuresSend(fdFailures, iFirst);
+    FailuresSend(fdFailures, parts);
 #ifdef SANDBOX_COVERAGE
     __gcov_dump();
 #endif
