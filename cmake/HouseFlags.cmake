@@ -34,7 +34,9 @@ target_compile_options(house_tool INTERFACE
     $<$<COMPILE_LANGUAGE:CXX>:-fno-exceptions;-fno-rtti;-fno-threadsafe-statics>
     -fvisibility=hidden -fstack-protector-strong)
 target_compile_options(house_tool INTERFACE
-    $<$<CONFIG:Release>:-U_FORTIFY_SOURCE;-D_FORTIFY_SOURCE=2;-ffunction-sections;-fdata-sections>)
+    $<$<CONFIG:Release>:-U_FORTIFY_SOURCE;-D_FORTIFY_SOURCE=2;-ffunction-sections;-fdata-sections>
+    # Nothing unwinds: there are no exceptions, and a debugger has its own tables.
+    $<$<CONFIG:Release>:-fno-unwind-tables;-fno-asynchronous-unwind-tables>)
 
 # A library of the house: NAME, the floors below it, and its sources.
 function(add_house_library szName)
