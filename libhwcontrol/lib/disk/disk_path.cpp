@@ -43,12 +43,18 @@ u32 ParsedContainer(DISK_PORT_TYPE type)
     return container;
 }
 
+// Counted from 1, and modulo 2^32 like the index itself.
+i32 DiskNumber(const char *szPath)
+{
+    return static_cast<i32>(static_cast<u32>(DiskIndexGet(szPath)) + 1U);
+}
+
 // Disks of an expansion unit are named by unit, then by bay: sdga is the first of the unit g. A
 // name of one letter stands for the unit itself.
 void UnitDiskPlace(const char *szPath, const char *szLetters, DISK_PATH_INFO *pInfo)
 {
     pInfo->unitIndex = szLetters[0] - 'a' + 1;
-    pInfo->diskIndex = strlen(szLetters) == 1 ? pInfo->unitIndex : DiskIndexGet(szPath) + 1;
+    pInfo->diskIndex = strlen(szLetters) == 1 ? pInfo->unitIndex : DiskNumber(szPath);
 }
 
 } // namespace
@@ -90,7 +96,7 @@ int DiskPathParse(const char *szPath, DISK_PATH_INFO *pInfo)
     if (type == EUNIT_DEVICE) {
         UnitDiskPlace(szPath, NLIBCStrSkipPrefix(szName, "sd"), pInfo);
     } else {
-        pInfo->diskIndex = DiskIndexGet(szPath) + 1;
+        pInfo->diskIndex = DiskNumber(szPath);
         pInfo->unitIndex = 0;
     }
     return 0;
