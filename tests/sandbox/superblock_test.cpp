@@ -13,6 +13,8 @@
 #include <ostream>
 #include <string>
 #include <string_view>
+#include <syslog.h>
+#include <unistd.h>
 
 // Not in the unnamed namespace: the comparing macros look only beside the type.
 static bool operator==(const RAID_SUPERBLOCK &a, const RAID_SUPERBLOCK &b)
@@ -524,6 +526,7 @@ TEST(SuperblockGet, AMalformedLineEndsTheReading)
     MachineTool(machine, ExamineCommand("sda3"),
                 {.szOut = "Version : bad\n" + std::string(300000, '\n') + "Version : worse\n"});
     const RUN_RESULT result = MachineCall(machine, [] {
+        openlog(nullptr, LOG_NDELAY, LOG_USER); // so that the log takes no new descriptor
         const int fdBefore = dup(STDIN_FILENO);
         RAID_SUPERBLOCK superblock = {};
         EXPECT_EQ(RAIDSuperblockGet("/dev/sda3", &superblock), -1);
