@@ -55,6 +55,44 @@ show_file() {
     cat -A "$2" | sed 's/^/        /'
 }
 
+# --- many checks, one verdict ------------------------------------------------------------------
+
+checks=0
+failures=0
+
+# check WHAT COMMAND...: says what was wrong when the command fails.
+check() {
+    what=$1
+    shift
+    checks=$((checks + 1))
+    "$@" >/tmp/check 2>&1 && return
+    failures=$((failures + 1))
+    echo "    wrong: $what: $*"
+    sed 's/^/        /' /tmp/check
+}
+
+is_not() {
+    ! "$@"
+}
+
+# What stands in $EXPECTED is what stands in the other file.
+as_expected() {
+    diff "$EXPECTED" "$1"
+}
+
+# verdict NAME: one for all the checks since the one before.
+verdict() {
+    if [ "$failures" -eq 0 ] && [ "$checks" -gt 0 ]; then
+        pass "$1 ($checks checks)"
+    else
+        fail "$1" "$failures of $checks checks failed"
+    fi
+    checks=0
+    failures=0
+}
+
+# --- waiting -----------------------------------------------------------------------------------
+
 # wait_for SECONDS COMMAND...: polls a condition to a bound.
 wait_for() {
     tenths=$(($1 * 10))
@@ -85,6 +123,29 @@ partition_disks() {
 pull_disk() {
     echo 1 >"/sys/block/$1/device/delete"
     wait_for "$SETTLE_SECONDS" test ! -e "/sys/block/$1" || abort "$1 cannot be pulled"
+}
+
+# picture NODE...: a line for each, another one when a single bit of it changes. What the arrays on
+# top wrote went past the node's own cache.
+picture() {
+    for node in "$@"; do
+        blockdev --flushbufs "/dev/$node"
+        echo "$node $(md5sum <"/dev/$node")"
+    done
+}
+
+# Writes lines that name it on a node, and looks whether they are still there.
+pattern() {
+    yes "$1 keeps this" 2>/dev/null | head -c 262144
+}
+
+fill() {
+    pattern "$1" >"/dev/$1"
+    must blockdev --flushbufs "/dev/$1"
+}
+
+holds() {
+    [ "$(pattern "$1" | md5sum)" = "$(head -c 262144 "/dev/$1" | md5sum)" ]
 }
 
 # --- arrays ------------------------------------------------------------------------------------
@@ -150,6 +211,29 @@ mdadm_state_is() {
     [ "$(mdadm_state "$1")" = "$2" ]
 }
 
+# Of the driver, of sysfs, and of the node: any of them may linger, or come back.
+array_left_nothing() {
+    array_is_gone "$1" && [ ! -e "/sys/block/md$1" ] && [ ! -e "/dev/md$1" ]
+}
+
+# The numbers of all arrays that the driver knows.
+arrays_known() {
+    sed -n 's/^md\([0-9]*\) :.*/\1/p' /proc/mdstat | sort -n | xargs
+}
+
+has_no_superblock() {
+    mdadm -E "/dev/$1" 2>&1 | grep -qx "mdadm: No md superblock detected on /dev/$1\."
+}
+
+# On no disk and no partition, whatever array they belong to.
+uuid_is_nowhere() {
+    is_not sh -c "mdadm -E /dev/sd* 2>/dev/null | grep $1"
+}
+
+has_no_signature() {
+    [ -z "$(blkid -p -s TYPE -o value "/dev/$1")" ]
+}
+
 array_bytes() {
     blockdev --getsize64 "/dev/md$1"
 }
@@ -211,4 +295,69 @@ check_status() {
 check_not_found() {
     echo "RAID /dev/md$2 is not found" >"$EXPECTED"
     check_run "$1" 1 arrayctl status "$2"
+}
+
+# --- destroy -----------------------------------------------------------------------------------
+
+# run_destroy TAG MD: under a name of its own, as the system log tells runs apart by the program's
+# name. Leaves /tmp/TAG.out, .status and .seconds.
+run_destroy() {
+    ln -sf /sbin/arrayctl "/tmp/$1"
+    begin=$(cut -d. -f1 /proc/uptime)
+    LD_PRELOAD=/usr/lib/libmdrequests.so "/tmp/$1" destroy "$2" >"/tmp/$1.out" 2>&1
+    echo $? >"/tmp/$1.status"
+    echo $(($(cut -d. -f1 /proc/uptime) - begin)) >"/tmp/$1.seconds"
+}
+
+# log_of TAG: the lines of that run as "PRIORITY MESSAGE", without the place in the source.
+log_of() {
+    grep " $1: " "$SYSLOG" | sed "s/^.* user\.\([a-z]*\) $1: [a-z_]*\.cpp:[0-9]* /\1 /"
+}
+
+# check_log TAG: all that the run is to have logged stands in $EXPECTED.
+check_log() {
+    log_of "$1" >"$SEEN"
+    check "system log of $1" as_expected "$SEEN"
+}
+
+# Members are wiped in the order of a hash, so the last COUNT lines are compared sorted.
+check_log_of_members() {
+    log_of "$1" >/tmp/log
+    before=$(($(wc -l </tmp/log) - $2))
+    { head -n "$before" /tmp/log && tail -n "$2" /tmp/log | sort; } >"$SEEN"
+    check "system log of $1" as_expected "$SEEN"
+}
+
+# The operation error log without its time stamps; a line with none that is well formed stays whole.
+operation_errors() {
+    stamp='[A-Z][a-z][a-z] [0-3][0-9] [0-2][0-9]:[0-5][0-9]:[0-5][0-9]'
+    sed "s/^$stamp command=/command=/" /var/log/space_operation_error.log
+}
+
+check_silent_success() {
+    : >"$EXPECTED"
+    check "output of $1" as_expected "/tmp/$1.out"
+    check "exit status of $1" test "$(cat "/tmp/$1.status")" = 0
+}
+
+# log_of_removal MD MEMBER...: what a removal that goes well logs.
+log_of_removal() {
+    echo "err [Info] clean RAID superblock of /dev/md$1"
+    shift
+    for member in "$@"; do
+        echo "err [Info] Clean RAID superblock on '/dev/$member'"
+    done
+}
+
+# check_left_nothing MD UUID MEMBER...
+check_left_nothing() {
+    number=$1
+    uuid=$2
+    shift 2
+    check 'the array is gone' wait_for "$SETTLE_SECONDS" array_left_nothing "$number"
+    for member in "$@"; do
+        check 'no superblock' has_no_superblock "$member"
+        check 'no signature' has_no_signature "$member"
+    done
+    check 'no superblock anywhere' uuid_is_nowhere "$uuid"
 }
