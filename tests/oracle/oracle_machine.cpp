@@ -2,6 +2,7 @@
 #include "oracle_machine.h"
 
 #include <algorithm>
+#include <cctype>
 #include <random>
 
 namespace
@@ -63,9 +64,10 @@ const T &Pick(DICE &dice, const vector<T> &items)
 
 ROLE RoleMake(DICE &dice, bool fDualHead)
 {
-    static const vector<ROLE> single = {ROLE_INTERNAL, ROLE_INTERNAL, ROLE_INTERNAL, ROLE_INTERNAL,
-                                        ROLE_INTERNAL, ROLE_INTERNAL, ROLE_INTERNAL, ROLE_USB,
-                                        ROLE_ESATA,    ROLE_UNIT,     ROLE_CACHE,    ROLE_NONE};
+    static const vector<ROLE> single = {
+        ROLE_INTERNAL, ROLE_INTERNAL, ROLE_INTERNAL, ROLE_INTERNAL, ROLE_INTERNAL, ROLE_INTERNAL,
+        ROLE_INTERNAL, ROLE_INTERNAL, ROLE_INTERNAL, ROLE_INTERNAL, ROLE_INTERNAL, ROLE_INTERNAL,
+        ROLE_USB,      ROLE_ESATA,    ROLE_UNIT,     ROLE_CACHE,    ROLE_NONE};
     static const vector<ROLE> dual = {ROLE_UNIT, ROLE_UNIT,     ROLE_UNIT, ROLE_UNIT,
                                       ROLE_UNIT, ROLE_INTERNAL, ROLE_USB,  ROLE_ESATA};
     return Pick(dice, fDualHead ? dual : single);
@@ -90,7 +92,7 @@ void PlacesMake(DICE &dice, PLAN &plan)
         return;
     }
     const u64 wanted = Chance(dice, 5) ? 0 : 1 + Below(dice, 8);
-    for (u64 i = 0; i < wanted; i++) {
+    while (plan.places.size() < wanted) {
         const ROLE role = RoleMake(dice, plan.fDualHead);
         const string szName = NameMake(dice, role);
         const bool fNew = std::none_of(plan.places.begin(), plan.places.end(),
@@ -174,14 +176,14 @@ string HexMask(DICE &dice, u64 mask)
 string AnswerText(DICE &dice, bool fYes)
 {
     static const vector<string> yes = {"yes", "yes", "yes", "YES", "Yes"};
-    static const vector<string> no = {"no", "no", "", "yesss", "1", "ye"};
+    static const vector<string> no = {"no", "no", "", "yesss", "no way", "1", "ye"};
     return Pick(dice, fYes ? yes : no);
 }
 
 // A key that says no may as well be absent.
 string AnswerLine(DICE &dice, const string &szKey, bool fYes)
 {
-    if (!fYes && Chance(dice, 50)) {
+    if (!fYes && Chance(dice, 35)) {
         return "";
     }
     return ConfLine(dice, szKey, AnswerText(dice, fYes));
@@ -190,7 +192,10 @@ string AnswerLine(DICE &dice, const string &szKey, bool fYes)
 string NumberText(DICE &dice)
 {
     static const vector<string> odd = {"", "-1", "abc", "4x", "40", " 3", "99999999999999999999"};
-    return Chance(dice, 10) ? Pick(dice, odd) : to_string(Below(dice, 9));
+    if (Chance(dice, 8)) {
+        return Pick(dice, odd);
+    }
+    return Chance(dice, 4) ? "0" : to_string(1 + Below(dice, 8));
 }
 
 string NumberLine(DICE &dice, const string &szKey, u64 percentMissing)
@@ -226,7 +231,7 @@ void ConfMake(DICE &dice, const PLAN &plan, ORACLE_MACHINE &machine)
         AnswerLine(dice, "support_buildin_storage", plan.fBuiltin),
         AnswerLine(dice, "support_dual_head", plan.fDualHead),
         NumberLine(dice, "max_sys_raid_disks", 40),
-        NumberLine(dice, "maxdisks", 10),
+        NumberLine(dice, "maxdisks", 6),
         SplitLine(dice),
     };
     const std::pair<const char *, u64> masks[] = {
@@ -239,7 +244,7 @@ void ConfMake(DICE &dice, const PLAN &plan, ORACLE_MACHINE &machine)
         const u64 extra = Chance(dice, 5) ? u64{1} << Below(dice, 64) : 0;
         if (!Chance(dice, mask == 0 ? 30 : 2)) {
             lines.push_back(ConfLine(dice, szKey, HexMask(dice, mask | extra)));
-        } else if (szKey == masks[0].first && Chance(dice, 80)) {
+        } else if (szKey == masks[0].first && Chance(dice, 90)) {
             lines.push_back("usbportcfg=0x0\n");
         }
     }
@@ -325,10 +330,11 @@ string ReportTable(const string &szDevice)
                       "Partition[1] :      4194304 sectors at      4982528 (type fd)\n";
 }
 
-string ReportMake(DICE &dice, const string &szDevice)
+string ReportMake(DICE &dice, const string &szDevice, bool fWholeDisk)
 {
-    static const vector<int> numbers = {2, 2, 2, 2, 3, 99, 100, 101, 102, 127};
-    const int nMd = Pick(dice, numbers);
+    static const vector<int> data = {2, 2, 2, 2, 3, 99, 100, 101, 102, 127};
+    static const vector<int> whole = {2, 99, 100, 100, 101, 101};
+    const int nMd = Pick(dice, fWholeDisk ? whole : data);
     if (Chance(dice, 40)) {
         return ReportOld(szDevice, nMd, Chance(dice, 5) ? "90" : "0.90.00");
     }
@@ -359,7 +365,7 @@ void ReportAdd(DICE &dice, ORACLE_MACHINE &machine, const string &szDevice, u64 
     const string szKey = string(ORACLE_MDADM) + " -E " + szDevice;
     ORACLE_REPLY reply;
     if (Chance(dice, percent)) {
-        reply.szOut = ReportMake(dice, szDevice);
+        reply.szOut = ReportMake(dice, szDevice, isdigit(szDevice.back()) == 0);
     } else {
         reply.szErr = "mdadm: No md superblock detected on " + szDevice + ".\n";
         reply.nExit = 1;
@@ -379,7 +385,8 @@ ORACLE_LAYOUT LayoutPick(DICE &dice, const PLAN &plan)
     vector<ORACLE_LAYOUT> fitting;
     for (const ORACLE_LAYOUT &row : OracleLayouts()) {
         const bool fOwn = (row.raid == 1) == plan.fRaid && (row.builtin == 1) == plan.fBuiltin;
-        const int weight = (fOwn ? 4 : 1) * (row.version >= 6 ? 3 : 1);
+        // The oldest layout is a rule of its own, and one that only machines with RAID have.
+        const int weight = (fOwn ? 4 : 1) * (row.version >= 6 ? 3 : row.version == 1 ? 2 : 1);
         fitting.insert(fitting.end(), static_cast<size_t>(weight), row);
     }
     return Pick(dice, fitting);
@@ -489,7 +496,7 @@ void DisksMake(DICE &dice, const PLAN &plan, ORACLE_MACHINE &machine)
         ListingsMake(dice, place.szName, content, machine);
         ReportAdd(dice, machine, szPath + "3", percentArray);
         ReportAdd(dice, machine, szPath + "5", percentArray / 5);
-        ReportAdd(dice, machine, szPath, 15);
+        ReportAdd(dice, machine, szPath, 30);
         if (Chance(dice, 20)) {
             ORACLE_REPLY reply;
             reply.szOut = ReportTable(szPath);
@@ -559,7 +566,7 @@ void DiskFaultAdd(DICE &dice, const string &szName, ORACLE_MACHINE &machine)
 
 void FaultsMake(DICE &dice, ORACLE_MACHINE &machine)
 {
-    const u64 percent = Pick(dice, vector<u64>{0, 0, 20, 60});
+    const u64 percent = Pick(dice, vector<u64>{0, 0, 15, 40});
     for (const auto &[szName, table] : ORACLE_MACHINE(machine).disks) {
         if (Chance(dice, percent)) {
             DiskFaultAdd(dice, szName, machine);
@@ -601,7 +608,7 @@ void MarkersMake(DICE &dice, ORACLE_MACHINE &machine)
 {
     const std::pair<const char *, u64> markers[] = {
         {ORACLE_MARKER_FORCE, 6}, {ORACLE_MARKER_DUAL, 6}, {ORACLE_MARKER_SINGLE, 6},
-        {"/tmp/raid.0", 8},       {"/tmp/raid.1", 8},      {"/tmp/raid.5", 8}};
+        {"/tmp/raid.0", 15},      {"/tmp/raid.1", 15},     {"/tmp/raid.5", 15}};
     for (const auto &[szMarker, percent] : markers) {
         if (Chance(dice, percent)) {
             machine.markers.insert(szMarker);
@@ -665,7 +672,7 @@ ORACLE_CASE OracleCaseMake(std::uint64_t seed)
     made.words = WordsMake(dice);
     PLAN plan;
     plan.fDualHead = Chance(dice, 20);
-    plan.fRaid = Chance(dice, 75);
+    plan.fRaid = Chance(dice, 70);
     plan.fBuiltin = Chance(dice, plan.fRaid ? 6 : 30);
     PlacesMake(dice, plan);
     ConfMake(dice, plan, made.machine);
