@@ -23,6 +23,7 @@
 
 #include <cstdint>
 #include <functional>
+#include <initializer_list>
 #include <map>
 #include <optional>
 #include <set>
@@ -167,6 +168,8 @@ void MachineMdAdd(MACHINE &machine, const MACHINE_MD &md);
 // form takes arguments with blanks in them and empty ones.
 void MachineTool(MACHINE &machine, std::string_view szCommand, const TOOL_ANSWER &answer = {});
 void MachineTool(MACHINE &machine, const std::vector<std::string> &argv,
+                 const TOOL_ANSWER &answer = {});
+void MachineTool(MACHINE &machine, std::initializer_list<std::string> argv,
                  const TOOL_ANSWER &answer = {});
 
 // ---- what came of it ---------------------------------------------------------------------------

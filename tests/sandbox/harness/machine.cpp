@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: MIT
 #include "sandbox.h"
 
+#include <algorithm>
 #include <cctype>
 
 namespace
@@ -139,4 +140,10 @@ void MachineTool(MACHINE &machine, std::string_view szCommand, const TOOL_ANSWER
 void MachineTool(MACHINE &machine, const std::vector<std::string> &argv, const TOOL_ANSWER &answer)
 {
     machine.rows.push_back({argv, answer});
+}
+
+void MachineTool(MACHINE &machine, std::initializer_list<std::string> argv,
+                 const TOOL_ANSWER &answer)
+{
+    MachineTool(machine, std::vector<std::string>(argv), answer);
 }
