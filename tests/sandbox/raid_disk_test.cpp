@@ -1,0 +1,642 @@
+// SPDX-License-Identifier: MIT
+#include "sandbox.h"
+
+#include "nurocore/error.h"
+#include "nurostoragecore/raid_disk.h"
+
+#include <gtest/gtest.h>
+
+#include <cerrno>
+#include <cstdlib>
+
+namespace
+{
+
+constexpr u32 CODE_BEFORE = 0x4200; // no code of the house: shows that nobody wrote the record
+constexpr const char *MEMBER = "/sys/block/md2/md/dev-sda3";
+
+void CodeReset()
+{
+    NLIBCErrSet(CODE_BEFORE, "before", 1);
+    errno = 0;
+}
+
+MACHINE MembersMake(const std::vector<MACHINE_MEMBER> &members)
+{
+    MACHINE machine = MachineMake();
+    MachineMdAdd(machine, {.nMd = 2, .members = members});
+    return machine;
+}
+
+RAID_DISK MemberMake(const char *szPath, RAID_DISK *pNext = nullptr)
+{
+    RAID_DISK disk = {};
+    snprintf(disk.szPath, sizeof(disk.szPath), "%s", szPath);
+    disk.pNext = pNext;
+    return disk;
+}
+
+// Builds the record of member sda3 and lets the body look at it.
+void WithMember(const std::string &szState, const std::string &szSlot,
+                const std::function<void(const RAID_DISK &)> &body)
+{
+    SCOPED_TRACE("state \"" + szState + "\", slot \"" + szSlot + "\"");
+    const RUN_RESULT result = MachineCall(MembersMake({{"sda3", szState, szSlot}}), [&] {
+        CodeReset();
+        RAID_DISK *pDisk = nullptr;
+        ASSERT_EQ(RAIDDiskCreate(MEMBER, &pDisk), 0);
+        ASSERT_NE(pDisk, nullptr);
+        EXPECT_EQ(NLIBCErrGet(), CODE_BEFORE);
+        body(*pDisk);
+        RAIDDiskListFree(pDisk);
+    });
+    EXPECT_EQ(LogText(result), "");
+}
+
+void ExpectMemberFails(const MACHINE &machine, const char *szDir, u32 code,
+                       const std::string &szLog)
+{
+    const RUN_RESULT result = MachineCall(machine, [&] {
+        CodeReset();
+        RAID_DISK *pDisk = nullptr;
+        EXPECT_EQ(RAIDDiskCreate(szDir, &pDisk), -1);
+        EXPECT_EQ(pDisk, nullptr);
+        EXPECT_EQ(NLIBCErrGet(), code);
+    });
+    EXPECT_EQ(LogText(result), szLog);
+}
+
+std::string NamesOf(const RAID_DISK *pDisks)
+{
+    std::string szNames;
+    for (const RAID_DISK *p = pDisks; p != nullptr; p = p->pNext) {
+        szNames += std::string(p->szPath) + " ";
+    }
+    return szNames;
+}
+
+} // namespace
+
+// ---- one member --------------------------------------------------------------------------------
+
+struct STATE_CASE {
+    const char *szState;
+    const char *szSlot;
+    u32 state;
+};
+
+TEST(RaidDisk, TheOrderOfTheWordsDecidesTheState)
+{
+    for (const STATE_CASE &one : {
+             STATE_CASE{"in_sync\n", "0\n", 1},
+             {"in_sync,write_mostly\n", "0\n", 1},
+             {"in_sync", "0\n", 1},
+             {"\n", "0\n", 1},
+             {"journal\n", "none\n", 1},
+             {"blocked\n", "0\n", 1},
+             {"FAULTY\n", "0\n", 1},
+             {"faulty\n", "0\n", 2},
+             {"faulty,in_sync\n", "0\n", 2},
+             {"in_sync,faulty\n", "0\n", 2},
+             {"spare,faulty\n", "none\n", 2},
+             {"faulty,write_error\n", "0\n", 2},
+             {"error,faulty\n", "0\n", 2},
+             {"notfaultyatall\n", "0\n", 2},
+             {"error\n", "0\n", 4},
+             {"in_sync,error\n", "0\n", 4},
+             {"spare,want_error\n", "none\n", 4},
+             {"write_error,in_sync\n", "0\n", 1},
+             {"in_sync,write_error\n", "0\n", 1},
+             {"write_error\n", "0\n", 1},
+             {"write_error,error\n", "0\n", 1},
+             {"write_error,spare\n", "none\n", 16},
+             {"in_sync,spare\n", "none\n", 1},
+             {"spare\n", "1\n", 8},
+             {"spare\n", "none\n", 16},
+             {"spare,blocked\n", "nonesuch\n", 16},
+             {"spare\n", "0\n", 8},
+             {"xsparex\n", "3\n", 8},
+         }) {
+        WithMember(one.szState, one.szSlot,
+                   [&](const RAID_DISK &disk) { EXPECT_EQ(disk.state, one.state); });
+    }
+}
+
+TEST(RaidDisk, TheStateIsReadUpTo31Characters)
+{
+    const std::string szFiller(26, 'x');
+    WithMember("x" + szFiller.substr(0, 24) + "faulty\n", "0\n", // characters 26 to 31
+               [](const RAID_DISK &disk) { EXPECT_EQ(disk.state, 2U); });
+    WithMember(szFiller + "faulty\n", "0\n",
+               [](const RAID_DISK &disk) { EXPECT_EQ(disk.state, 1U); });
+    WithMember("in_sync\nfaulty\n", "0\n", // the first line alone
+               [](const RAID_DISK &disk) { EXPECT_EQ(disk.state, 1U); });
+}
+
+struct SLOT_CASE {
+    const char *szSlot;
+    i32 slot;
+};
+
+TEST(RaidDisk, TheSlotIsANumberOrNone)
+{
+    for (const SLOT_CASE &one : {
+             SLOT_CASE{"0\n", 0},
+             {"1\n", 1},
+             {"12", 12},
+             {"none\n", -1},
+             {"none", -1},
+             {"-3\n", -3},
+             {"7 and more\n", 7},
+             {"abc\n", 0},
+             {"\n", 0},
+             {"nonesuch\n", 0},
+             {"none \n", 0},
+             {"2147483647\n", 2147483647},
+             {"2147483648\n", 2147483647},
+             {"-99999999999\n", -2147483647 - 1},
+         }) {
+        WithMember("in_sync\n", one.szSlot, [&](const RAID_DISK &disk) {
+            EXPECT_EQ(disk.slot, one.slot);
+            EXPECT_EQ(disk.state, 1U);
+            EXPECT_EQ(disk.pNext, nullptr);
+            EXPECT_STREQ(disk.szPath, "/dev/sda3");
+        });
+    }
+}
+
+TEST(RaidDisk, AFaultyMembersSlotIsReadToo)
+{
+    WithMember("faulty\n", "none\n", [](const RAID_DISK &disk) {
+        EXPECT_EQ(disk.state, 2U);
+        EXPECT_EQ(disk.slot, -1);
+    });
+}
+
+TEST(RaidDisk, TheNameIsAllBehindTheFirstDev)
+{
+    const struct {
+        std::string szDir;
+        std::string szPath;
+    } names[] = {
+        {"/sys/block/md2/md/dev-dev-1", "/dev/dev-1"},
+        {"/sys/block/md2/md/dev-", "/dev/"},
+        {"/sys/block/md2/md/dev-nvme0n1p1", "/dev/nvme0n1p1"},
+        {"/sys/block/md2/md/dev-" + std::string(122, 'x'), "/dev/" + std::string(122, 'x')},
+        {"/sys/block/md2/md/dev-" + std::string(123, 'x'), "/dev/" + std::string(122, 'x')},
+        {"/sys/block/md2/md/dev-" + std::string(250, 'x'), "/dev/" + std::string(122, 'x')},
+    };
+    for (const auto &name : names) {
+        MACHINE machine = MachineMake();
+        MachineFile(machine, name.szDir + "/state", "in_sync\n");
+        MachineFile(machine, name.szDir + "/slot", "0\n");
+        MachineCall(machine, [&] {
+            RAID_DISK *pDisk = nullptr;
+            ASSERT_EQ(RAIDDiskCreate(name.szDir.c_str(), &pDisk), 0);
+            EXPECT_EQ(pDisk->szPath, name.szPath);
+            RAIDDiskListFree(pDisk);
+        });
+    }
+}
+
+// ---- a member that cannot be had ---------------------------------------------------------------
+
+TEST(RaidDiskFailure, NullIsABadParameter)
+{
+    const RUN_RESULT result = MachineCall(MembersMake({{"sda3"}}), [] {
+        RAID_DISK *pDisk = nullptr;
+        u32 state = 0;
+        CodeReset();
+        EXPECT_EQ(RAIDDiskCreate(nullptr, &pDisk), -1);
+        EXPECT_EQ(NLIBCErrGet(), 0x0D00U);
+        CodeReset();
+        EXPECT_EQ(RAIDDiskCreate(MEMBER, nullptr), -1);
+        EXPECT_EQ(NLIBCErrGet(), 0x0D00U);
+        CodeReset();
+        EXPECT_EQ(RAIDDiskStatusGet(nullptr, &state), -1);
+        EXPECT_EQ(NLIBCErrGet(), 0x0D00U);
+        CodeReset();
+        EXPECT_EQ(RAIDDiskStatusGet(MEMBER, nullptr), -1);
+        EXPECT_EQ(NLIBCErrGet(), 0x0D00U);
+    });
+    EXPECT_EQ(LogText(result), "");
+}
+
+TEST(RaidDiskFailure, WithoutMemory)
+{
+    MACHINE machine = MembersMake({{"sda3"}});
+    machine.faults = {{.szFunction = "calloc", .nCall = 1, .error = ENOMEM}};
+    ExpectMemberFails(machine, MEMBER, 0x0200,
+                      "<15>raid_disk.cpp:# Failed to calloc, errno=Cannot allocate memory\n");
+}
+
+TEST(RaidDiskFailure, AFolderThatIsNoMember)
+{
+    ExpectMemberFails(MachineMake(), "/sys/block/md2/md/rd0", 0x9A00,
+                      "<15>raid_disk.cpp:# Failed to strstr /sys/block/md2/md/rd0, errno=Success\n"
+                      "<15>raid_disk.cpp:# Failed to get path from /sys/block/md2/md/rd0 "
+                      ",errno=0X9A00\n");
+}
+
+TEST(RaidDiskFailure, AStateThatDoesNotOpen)
+{
+    ExpectMemberFails(
+        MembersMake({{"sda3", NO_FILE, "0\n"}}), MEMBER, 0x0900,
+        "<15>raid_disk.cpp:# Failed to fopen /sys/block/md2/md/dev-sda3/state, "
+        "errno=No such file or directory\n"
+        "<15>raid_disk.cpp:# Failed to get status from /sys/block/md2/md/dev-sda3/state, "
+        "errno=0X900\n"
+        "<15>raid_disk.cpp:# Failed to get status from /sys/block/md2/md/dev-sda3, errno=0X900\n");
+}
+
+TEST(RaidDiskFailure, AnEmptyState)
+{
+    ExpectMemberFails(
+        MembersMake({{"sda3", "", "0\n"}}), MEMBER, 0x0A00,
+        "<15>raid_disk.cpp:# Failed to NLIBCFgets /sys/block/md2/md/dev-sda3/state, "
+        "errno=Success\n"
+        "<15>raid_disk.cpp:# Failed to get status from /sys/block/md2/md/dev-sda3/state, "
+        "errno=0XA00\n"
+        "<15>raid_disk.cpp:# Failed to get status from /sys/block/md2/md/dev-sda3, errno=0XA00\n");
+}
+
+TEST(RaidDiskFailure, ASpareWhoseSlotDoesNotOpen)
+{
+    ExpectMemberFails(
+        MembersMake({{"sda3", "spare\n", NO_FILE}}), MEMBER, 0x0900,
+        "<15>raid_disk.cpp:# Failed to fopen /sys/block/md2/md/dev-sda3/slot, "
+        "errno=No such file or directory\n"
+        "<15>raid_disk.cpp:# Failed to get status from /sys/block/md2/md/dev-sda3/slot, "
+        "errno=0X900\n"
+        "<15>raid_disk.cpp:# Failed to get status from /sys/block/md2/md/dev-sda3, errno=0X900\n");
+}
+
+// The only failure that leaves the code as it was.
+TEST(RaidDiskFailure, ASlotThatDoesNotOpen)
+{
+    ExpectMemberFails(MembersMake({{"sda3", "in_sync\n", NO_FILE}}), MEMBER, CODE_BEFORE,
+                      "<11>raid_disk.cpp:# failed to fopen /sys/block/md2/md/dev-sda3/slot, "
+                      "errno=No such file or directory\n"
+                      "<15>raid_disk.cpp:# Failed to get slot of /sys/block/md2/md/dev-sda3, "
+                      "errno=0X4200\n");
+}
+
+TEST(RaidDiskFailure, AnEmptySlot)
+{
+    ExpectMemberFails(MembersMake({{"sda3", "in_sync\n", ""}}), MEMBER, 0x0A00,
+                      "<15>raid_disk.cpp:# Failed to get disk slot, errno=Success\n"
+                      "<15>raid_disk.cpp:# Failed to get slot of /sys/block/md2/md/dev-sda3, "
+                      "errno=0XA00\n");
+}
+
+TEST(RaidDiskStatus, FailsAsItsFileFails)
+{
+    const RUN_RESULT result = MachineCall(MembersMake({{"sda3", NO_FILE, "0\n"}}), [] {
+        u32 state = 99;
+        EXPECT_EQ(RAIDDiskStatusGet(MEMBER, &state), -1);
+        EXPECT_EQ(NLIBCErrGet(), 0x0900U);
+    });
+    EXPECT_EQ(LogText(result),
+              "<15>raid_disk.cpp:# Failed to fopen /sys/block/md2/md/dev-sda3/state, "
+              "errno=No such file or directory\n"
+              "<15>raid_disk.cpp:# Failed to get status from /sys/block/md2/md/dev-sda3/state, "
+              "errno=0X900\n");
+}
+
+// ---- attributes --------------------------------------------------------------------------------
+
+TEST(RaidDiskAttr, TheFirstLineUpTo31Characters)
+{
+    MACHINE machine = MachineMake();
+    MachineFile(machine, "/sys/short", "one\ntwo\n");
+    MachineFile(machine, "/sys/bare", "one");
+    MachineFile(machine, "/sys/long", "0123456789012345678901234567890123456789\n");
+    const RUN_RESULT result = MachineCall(machine, [] {
+        char szBuf[RAID_ATTR_SIZE] = "";
+        CodeReset();
+        EXPECT_EQ(RAIDDiskAttrRead("/sys/short", szBuf), 0);
+        EXPECT_STREQ(szBuf, "one\n");
+        EXPECT_EQ(RAIDDiskAttrRead("/sys/bare", szBuf), 0);
+        EXPECT_STREQ(szBuf, "one");
+        EXPECT_EQ(RAIDDiskAttrRead("/sys/long", szBuf), 0);
+        EXPECT_STREQ(szBuf, "0123456789012345678901234567890");
+        EXPECT_EQ(NLIBCErrGet(), CODE_BEFORE);
+    });
+    EXPECT_EQ(LogText(result), "");
+}
+
+TEST(RaidDiskAttr, Fails)
+{
+    MACHINE machine = MachineMake();
+    MachineFile(machine, "/sys/empty", "");
+    const RUN_RESULT result = MachineCall(machine, [] {
+        char szBuf[RAID_ATTR_SIZE] = "";
+        CodeReset();
+        EXPECT_EQ(RAIDDiskAttrRead(nullptr, szBuf), -1);
+        EXPECT_EQ(NLIBCErrGet(), 0x0D00U);
+        CodeReset();
+        EXPECT_EQ(RAIDDiskAttrRead("/sys/empty", nullptr), -1);
+        EXPECT_EQ(NLIBCErrGet(), 0x0D00U);
+        CodeReset();
+        EXPECT_EQ(RAIDDiskAttrRead("/sys/missing", szBuf), -1);
+        EXPECT_EQ(NLIBCErrGet(), 0x0900U);
+        CodeReset();
+        EXPECT_EQ(RAIDDiskAttrRead("/sys/empty", szBuf), -1);
+        EXPECT_EQ(NLIBCErrGet(), 0x0A00U);
+    });
+    EXPECT_EQ(LogText(result),
+              "<15>raid_disk.cpp:# parameter error\n"
+              "<15>raid_disk.cpp:# parameter error\n"
+              "<15>raid_disk.cpp:# Failed to fopen /sys/missing, errno=No such file or directory\n"
+              "<15>raid_disk.cpp:# Failed to NLIBCFgets /sys/empty, errno=Success\n");
+}
+
+// ---- the list ----------------------------------------------------------------------------------
+
+TEST(RaidDiskList, TheNameThatSortsLastComesFirst)
+{
+    MACHINE machine = MembersMake({{"sda3", "in_sync\n", "0\n"}, {"sdb3", "in_sync\n", "1\n"}});
+    // The other entries of such a folder are no members, and neither are other arrays' ones.
+    MachineFolder(machine, "/sys/block/md2/md/rd0");
+    MachineFile(machine, "/sys/block/md2/md/device", "");
+    MachineMdAdd(machine, {.nMd = 22, .members = {{"sdc3"}}});
+    const RUN_RESULT result = MachineCall(machine, [] {
+        CodeReset();
+        RAID_DISK *pDisks = nullptr;
+        ASSERT_EQ(RAIDDiskListGet("/dev/md2", &pDisks), 0);
+        EXPECT_EQ(NamesOf(pDisks), "/dev/sdb3 /dev/sda3 ");
+        EXPECT_EQ(pDisks->slot, 1);
+        EXPECT_EQ(NLIBCErrGet(), CODE_BEFORE);
+        RAIDDiskListFree(pDisks);
+    });
+    EXPECT_EQ(LogText(result), "");
+}
+
+TEST(RaidDiskList, WithoutMembersTheListIsLeftAlone)
+{
+    const RUN_RESULT result = MachineCall(MembersMake({}), [] {
+        RAID_DISK disk = MemberMake("/dev/sdz9");
+        RAID_DISK *pDisks = &disk;
+        CodeReset();
+        EXPECT_EQ(RAIDDiskListGet("/dev/md2", &pDisks), 0);
+        EXPECT_EQ(pDisks, &disk);
+        EXPECT_EQ(RAIDDiskListGet("/dev/md77", &pDisks), 0);
+        EXPECT_EQ(pDisks, &disk);
+        EXPECT_EQ(NLIBCErrGet(), CODE_BEFORE);
+    });
+    EXPECT_EQ(LogText(result), "");
+}
+
+TEST(RaidDiskList, AMemberThatFailsIsSkipped)
+{
+    const RUN_RESULT result =
+        MachineCall(MembersMake({{"sda3"}, {"sdb3", "in_sync\n", ""}, {"sdc3"}}), [] {
+            RAID_DISK *pDisks = nullptr;
+            errno = 0;
+            ASSERT_EQ(RAIDDiskListGet("/dev/md2", &pDisks), 0);
+            EXPECT_EQ(NamesOf(pDisks), "/dev/sdc3 /dev/sda3 ");
+            EXPECT_EQ(NLIBCErrGet(), 0x0A00U);
+            RAIDDiskListFree(pDisks);
+        });
+    EXPECT_EQ(LogText(result),
+              "<15>raid_disk.cpp:# Failed to get disk slot, errno=Success\n"
+              "<15>raid_disk.cpp:# Failed to get slot of /sys/block/md2/md/dev-sdb3, errno=0XA00\n"
+              "<15>raid_disk.cpp:# Failed to create disk info from /sys/block/md2/md/dev-sdb3 "
+              ",errno=0XA00\n");
+}
+
+TEST(RaidDiskList, AMemberWithoutMemoryIsSkipped)
+{
+    MACHINE machine = MembersMake({{"sda3"}, {"sdb3"}});
+    machine.faults = {{.szFunction = "calloc", .nCall = 1, .error = ENOMEM}};
+    const RUN_RESULT result = MachineCall(machine, [] {
+        RAID_DISK *pDisks = nullptr;
+        ASSERT_EQ(RAIDDiskListGet("/dev/md2", &pDisks), 0);
+        EXPECT_EQ(NamesOf(pDisks), "/dev/sdb3 ");
+        EXPECT_EQ(NLIBCErrGet(), 0x0200U);
+        RAIDDiskListFree(pDisks);
+    });
+    EXPECT_EQ(LogText(result),
+              "<15>raid_disk.cpp:# Failed to calloc, errno=Cannot allocate memory\n"
+              "<15>raid_disk.cpp:# Failed to create disk info from /sys/block/md2/md/dev-sda3 "
+              ",errno=0X200\n");
+}
+
+TEST(RaidDiskList, NullIsABadParameter)
+{
+    const RUN_RESULT result = MachineCall(MembersMake({{"sda3"}}), [] {
+        RAID_DISK *pDisks = nullptr;
+        CodeReset();
+        EXPECT_EQ(RAIDDiskListGet(nullptr, &pDisks), -1);
+        EXPECT_EQ(NLIBCErrGet(), 0x0D00U);
+        CodeReset();
+        EXPECT_EQ(RAIDDiskListGet("/dev/md2", nullptr), -1);
+        EXPECT_EQ(NLIBCErrGet(), 0x0D00U);
+    });
+    EXPECT_EQ(LogText(result), "");
+}
+
+TEST(RaidDiskList, AnotherPathIsRefused)
+{
+    for (const char *const szPath : {"/dev/sda", "/dev/md", "md2", ""}) {
+        const RUN_RESULT result = MachineCall(MembersMake({{"sda3"}}), [&] {
+            RAID_DISK *pDisks = nullptr;
+            CodeReset();
+            EXPECT_EQ(RAIDDiskListGet(szPath, &pDisks), -1);
+            EXPECT_EQ(pDisks, nullptr);
+            EXPECT_EQ(NLIBCErrGet(), 0xBE00U);
+        });
+        EXPECT_EQ(LogText(result),
+                  std::string("<15>raid_disk.cpp:# invalide path ") + szPath + ", errno=Success\n");
+    }
+}
+
+TEST(RaidDiskList, AFolderThatCannotBeRead)
+{
+    for (const int error : {EIO, ENOMEM}) {
+        MACHINE machine = MembersMake({{"sda3"}});
+        machine.faults = {{.szFunction = "glob", .nCall = 1, .error = error}};
+        const RUN_RESULT result = MachineCall(machine, [] {
+            RAID_DISK *pDisks = nullptr;
+            EXPECT_EQ(RAIDDiskListGet("/dev/md2", &pDisks), -1);
+            EXPECT_EQ(pDisks, nullptr);
+            EXPECT_EQ(NLIBCErrGet(), 0x8000U);
+        });
+        EXPECT_EQ(LogText(result),
+                  std::string("<15>raid_disk.cpp:# failed to glob '/sys/block/md2/md/dev-*', "
+                              "errno=") +
+                      (error == EIO ? "Input/output error\n" : "Cannot allocate memory\n"));
+    }
+}
+
+TEST(RaidDiskPush, PutsTheRecordInFront)
+{
+    MachineCall(MachineMake(), [] {
+        RAID_DISK first = MemberMake("/dev/sda1");
+        RAID_DISK second = MemberMake("/dev/sdb1");
+        RAID_DISK *pDisks = nullptr;
+        CodeReset();
+        RAIDDiskListPush(&pDisks, &first);
+        RAIDDiskListPush(&pDisks, &second);
+        EXPECT_EQ(NamesOf(pDisks), "/dev/sdb1 /dev/sda1 ");
+        EXPECT_EQ(NLIBCErrGet(), CODE_BEFORE);
+    });
+}
+
+TEST(RaidDiskPush, BadArgumentsChangeNothing)
+{
+    const RUN_RESULT result = MachineCall(MachineMake(), [] {
+        RAID_DISK disk = MemberMake("/dev/sda1");
+        RAID_DISK *pDisks = &disk;
+        CodeReset();
+        RAIDDiskListPush(&pDisks, nullptr);
+        EXPECT_EQ(NLIBCErrGet(), 0x0200U);
+        EXPECT_EQ(NamesOf(pDisks), "/dev/sda1 ");
+        CodeReset();
+        RAIDDiskListPush(nullptr, &disk);
+        EXPECT_EQ(NLIBCErrGet(), 0x0200U);
+        EXPECT_EQ(disk.pNext, nullptr);
+    });
+    EXPECT_EQ(LogText(result), "");
+}
+
+TEST(RaidDiskSearch, FindsTheDiskWhateverThePartition)
+{
+    MachineCall(MachineMake(), [] {
+        RAID_DISK last = MemberMake("/dev/mmcblk0p1");
+        RAID_DISK middle = MemberMake("/dev/sdb3", &last);
+        RAID_DISK again = MemberMake("/dev/sdb5", &middle);
+        RAID_DISK head = MemberMake("/dev/sda3", &again);
+        const struct {
+            const char *szName;
+            const RAID_DISK *pFound;
+        } searches[] = {
+            {"/dev/sda", &head},       {"/dev/sda3", &head},      {"/dev/sda12", &head},
+            {"/dev/sdb", &again},      {"/dev/sdb1", &again},     {"/dev/mmcblk0", &last},
+            {"/dev/mmcblk0p7", &last}, {"/dev/sdc", nullptr},     {"sda", nullptr},
+            {"/dev/sd", nullptr},      {"/dev/mmcblk1", nullptr}, {"", nullptr},
+            {"/dev/sdaa", nullptr},
+        };
+        CodeReset();
+        for (const auto &search : searches) {
+            SCOPED_TRACE(search.szName);
+            RAID_DISK *pFound = nullptr;
+            EXPECT_EQ(RAIDDiskListSearch(&head, search.szName, &pFound),
+                      search.pFound != nullptr ? 1 : 0);
+            EXPECT_EQ(pFound, search.pFound);
+            EXPECT_EQ(RAIDDiskListSearch(&head, search.szName, nullptr),
+                      search.pFound != nullptr ? 1 : 0);
+        }
+        EXPECT_EQ(NLIBCErrGet(), CODE_BEFORE);
+    });
+}
+
+TEST(RaidDiskSearch, AnEmptyListHoldsNothingAndANullNameIsRefused)
+{
+    const RUN_RESULT result = MachineCall(MachineMake(), [] {
+        RAID_DISK disk = MemberMake("/dev/sda3");
+        RAID_DISK *pFound = nullptr;
+        CodeReset();
+        EXPECT_EQ(RAIDDiskListSearch(nullptr, "/dev/sda", &pFound), 0);
+        EXPECT_EQ(NLIBCErrGet(), CODE_BEFORE);
+        EXPECT_EQ(RAIDDiskListSearch(&disk, nullptr, &pFound), -1);
+        EXPECT_EQ(NLIBCErrGet(), 0x0D00U);
+        EXPECT_EQ(pFound, nullptr);
+    });
+    EXPECT_EQ(LogText(result), "");
+}
+
+// A name that does not fit the 64 bytes of the comparison is equal to nothing, itself included.
+TEST(RaidDiskSearch, ANameThatIsTooLongIsNotEqual)
+{
+    const std::string szFits = "/dev/" + std::string(58, 'x');
+    const std::string szLong = "/dev/" + std::string(59, 'x');
+    MachineCall(MachineMake(), [&] {
+        RAID_DISK fits = MemberMake(szFits.c_str());
+        RAID_DISK tooLong = MemberMake(szLong.c_str(), &fits);
+        EXPECT_EQ(RAIDDiskListSearch(&tooLong, szLong.c_str(), nullptr), 0);
+        EXPECT_EQ(RAIDDiskListSearch(&tooLong, szFits.c_str(), nullptr), 1);
+    });
+}
+
+TEST(RaidDiskFree, NothingCanBeFreed)
+{
+    MachineCall(MachineMake(), [] {
+        CodeReset();
+        RAIDDiskListFree(nullptr);
+        EXPECT_EQ(NLIBCErrGet(), CODE_BEFORE);
+    });
+}
+
+// ---- the sync action ---------------------------------------------------------------------------
+
+struct ACTION_CASE {
+    std::string szText;
+    int result;
+    int action;
+};
+
+TEST(SyncAction, TheTextIsAPrefixOfItsWord)
+{
+    constexpr int LEFT_ALONE = 99;
+    const ACTION_CASE cases[] = {
+        {"idle\n", 0, 0},
+        {"frozen\n", 0, 1},
+        {"reshape\n", 0, 2},
+        {"resync\n", 0, 3},
+        {"check\n", 0, 4},
+        {"repair\n", 0, 5},
+        {"recover\n", 0, 6},
+        {"\n", 0, 0},  // empty text is a prefix of the first word
+        {"r\n", 0, 2}, // of several words the first
+        {"re\n", 0, 2},
+        {"res\n", 0, 2},
+        {"resy\n", 0, 3},
+        {"rec\n", 0, 6},
+        {"rep\n", 0, 5},
+        {"c\n", 0, 4},
+        {"f\n", 0, 1},
+        {"idle", 0, 0}, // the last character goes, whatever it is
+        {"idleX", 0, 0},
+        {"x", 0, 0},
+        {"idle\nresync\n", 0, 0},
+        {"idle \n", -1, LEFT_ALONE},
+        {"idlex\n", -1, LEFT_ALONE},
+        {"resyncing\n", -1, LEFT_ALONE},
+        {"Idle\n", -1, LEFT_ALONE},
+        {" idle\n", -1, LEFT_ALONE},
+        {"none\n", -1, LEFT_ALONE},
+        {std::string(200, 'r') + "\n", -1, LEFT_ALONE},
+    };
+    for (const ACTION_CASE &one : cases) {
+        SCOPED_TRACE(one.szText);
+        MACHINE machine = MachineMake();
+        MachineMdAdd(machine, {.nMd = 2, .szSyncAction = one.szText});
+        const RUN_RESULT result = MachineCall(machine, [&] {
+            int action = LEFT_ALONE;
+            CodeReset();
+            EXPECT_EQ(RAIDSyncActionGet(2, &action), one.result);
+            EXPECT_EQ(action, one.action);
+            EXPECT_EQ(NLIBCErrGet(), CODE_BEFORE);
+        });
+        EXPECT_EQ(LogText(result), "");
+    }
+}
+
+TEST(SyncAction, Fails)
+{
+    MACHINE machine = MachineMake();
+    MachineMdAdd(machine, {.nMd = 2, .szSyncAction = ""});
+    const RUN_RESULT result = MachineCall(machine, [] {
+        int action = 99;
+        CodeReset();
+        EXPECT_EQ(RAIDSyncActionGet(-1, &action), -1);
+        EXPECT_EQ(RAIDSyncActionGet(3, &action), -1);
+        EXPECT_EQ(RAIDSyncActionGet(2, &action), -1);
+        EXPECT_EQ(action, 99);
+        EXPECT_EQ(NLIBCErrGet(), CODE_BEFORE);
+    });
+    EXPECT_EQ(LogText(result),
+              "<11>raid_disk.cpp:# open \"/sys/block/md3/md/sync_action\" failed\n"
+              "<11>raid_disk.cpp:# failed to get line from \"/sys/block/md2/md/sync_action\"\n");
+}

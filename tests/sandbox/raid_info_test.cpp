@@ -1,0 +1,754 @@
+// SPDX-License-Identifier: MIT
+#include "sandbox.h"
+
+#include "nurocore/error.h"
+#include "nurostoragecore/raid_info.h"
+
+#include <gtest/gtest.h>
+
+#include <cerrno>
+#include <cstring>
+#include <fcntl.h>
+#include <fstream>
+#include <syslog.h>
+#include <unistd.h>
+
+namespace
+{
+
+constexpr u32 CODE_BEFORE = 0x4200; // no code of the house: shows that nobody wrote the record
+constexpr u64 GIB = 1ULL << 30;
+
+MACHINE ArrayMake(const MACHINE_MD &md)
+{
+    MACHINE machine = MachineMake();
+    MachineMdAdd(machine, md);
+    return machine;
+}
+
+void CodeReset()
+{
+    NLIBCErrSet(CODE_BEFORE, "before", 1);
+    errno = 0;
+}
+
+int DescriptorsCount()
+{
+    int nOpen = 0;
+    for (int fd = 0; fd < 64; fd++) {
+        nOpen += fcntl(fd, F_GETFD) != -1;
+    }
+    return nOpen;
+}
+
+// The query fails with this code and these lines, hands nothing out and leaves nothing open.
+void ExpectQueryFails(const MACHINE &machine, const char *szPath, u32 code,
+                      const std::string &szLog)
+{
+    const RUN_RESULT result = MachineCall(machine, [&] {
+        RAID_INFO before = {};
+        RAID_INFO *pInfo = &before;
+        openlog(nullptr, LOG_NDELAY, LOG_USER); // the log's own descriptor is none of the query's
+        const int nOpen = DescriptorsCount();
+        CodeReset();
+        EXPECT_EQ(RAIDInfoGet(szPath, &pInfo), -1);
+        EXPECT_EQ(DescriptorsCount(), nOpen);
+        EXPECT_EQ(pInfo, &before);
+        EXPECT_EQ(NLIBCErrGet(), code);
+    });
+    EXPECT_EQ(LogText(result), szLog);
+}
+
+void ExpectQueryFails(const MACHINE_MD &md, u32 code, const std::string &szLog)
+{
+    ExpectQueryFails(ArrayMake(md), ("/dev/md" + std::to_string(md.nMd)).c_str(), code, szLog);
+}
+
+// Queries /dev/mdN of the machine and lets the body look at the record.
+void WithInfo(const MACHINE_MD &md, const std::function<void(const RAID_INFO &)> &body)
+{
+    const std::string szPath = "/dev/md" + std::to_string(md.nMd);
+    MachineCall(ArrayMake(md), [&] {
+        CodeReset();
+        RAID_INFO *pInfo = nullptr;
+        const int nOpen = DescriptorsCount();
+        ASSERT_EQ(RAIDInfoGet(szPath.c_str(), &pInfo), 1);
+        ASSERT_NE(pInfo, nullptr);
+        EXPECT_EQ(DescriptorsCount(), nOpen);
+        EXPECT_EQ(NLIBCErrGet(), CODE_BEFORE);
+        body(*pInfo);
+        RAIDInfoFree(pInfo);
+    });
+}
+
+// One request on the array's node, by itself.
+RUN_RESULT WithArray(const MACHINE_MD &md, const std::function<void(int fd)> &body)
+{
+    return MachineCall(ArrayMake(md), [&] {
+        const int fd = open(("/dev/md" + std::to_string(md.nMd)).c_str(), O_RDONLY);
+        ASSERT_GE(fd, 0);
+        CodeReset();
+        body(fd);
+        close(fd);
+    });
+}
+
+} // namespace
+
+// ---- the record --------------------------------------------------------------------------------
+
+TEST(RaidInfo, ARunningMirrorOfTwo)
+{
+    WithInfo({.nMd = 2,
+              .majorVersion = 1,
+              .minorVersion = 2,
+              .level = 1,
+              .size = 1048576,
+              .nRaidDisks = 2,
+              .nActiveDisks = 1,
+              .nSpareDisks = 3,
+              .arraySize = GIB,
+              .members = {{"sda3", "in_sync\n", "0\n"}, {"sdb3", "spare\n", "1\n"}}},
+             [](const RAID_INFO &info) {
+                 EXPECT_EQ(info.nMd, 2);
+                 EXPECT_STREQ(info.szPath, "/dev/md2");
+                 EXPECT_STREQ(info.szUuid, "");
+                 EXPECT_EQ(info.level, 2U);
+                 EXPECT_EQ(info.majorVersion, 1);
+                 EXPECT_EQ(info.minorVersion, 2);
+                 EXPECT_EQ(info.status, 1U);
+                 EXPECT_EQ(info.rebuild.state, 0U);
+                 EXPECT_EQ(info.rebuild.done, 0U);
+                 EXPECT_EQ(info.rebuild.total, 0U);
+                 EXPECT_EQ(info.arraySize, GIB);
+                 EXPECT_EQ(info.deviceSize, GIB);
+                 EXPECT_EQ(info.nRaidDisks, 2);
+                 EXPECT_EQ(info.nActiveDisks, 1);
+                 EXPECT_EQ(info.nSpareDisks, 3);
+                 ASSERT_NE(info.pDisks, nullptr);
+                 EXPECT_STREQ(info.pDisks->szPath, "/dev/sdb3");
+                 EXPECT_EQ(info.pDisks->state, 8U);
+                 EXPECT_EQ(info.pDisks->slot, 1);
+                 ASSERT_NE(info.pDisks->pNext, nullptr);
+                 EXPECT_STREQ(info.pDisks->pNext->szPath, "/dev/sda3");
+                 EXPECT_EQ(info.pDisks->pNext->pNext, nullptr);
+             });
+}
+
+TEST(RaidInfo, AnArrayWithoutMembersHasNoList)
+{
+    WithInfo({.nMd = 0}, [](const RAID_INFO &info) { EXPECT_EQ(info.pDisks, nullptr); });
+}
+
+TEST(RaidInfo, EveryLevelIsOneBit)
+{
+    const struct {
+        int level;
+        u32 code;
+    } levels[] = {{0, 1}, {1, 2}, {5, 4}, {6, 8}, {10, 16}, {-1, 32}};
+    for (const auto &level : levels) {
+        WithInfo({.nMd = 2, .level = level.level},
+                 [&](const RAID_INFO &info) { EXPECT_EQ(info.level, level.code); });
+    }
+}
+
+TEST(RaidInfo, AnUnsupportedLevelIsOnlyLogged)
+{
+    const RUN_RESULT result = MachineCall(ArrayMake({.nMd = 2, .level = 4}), [] {
+        RAID_INFO *pInfo = nullptr;
+        ASSERT_EQ(RAIDInfoGet("/dev/md2", &pInfo), 1);
+        EXPECT_EQ(pInfo->level, 0U);
+        EXPECT_EQ(pInfo->deviceSize, GIB);
+        RAIDInfoFree(pInfo);
+    });
+    EXPECT_EQ(LogText(result), "<15>raid_info.cpp:# Not supported RAID level: 4\n");
+}
+
+TEST(RaidInfo, ThePathMayGoOnBehindTheNumber)
+{
+    MACHINE machine = ArrayMake({.nMd = 2});
+    MachineLink(machine, "/dev/md2p1", "md2");
+    MachineCall(machine, [] {
+        RAID_INFO *pInfo = nullptr;
+        ASSERT_EQ(RAIDInfoGet("/dev/md2p1", &pInfo), 1);
+        EXPECT_EQ(pInfo->nMd, 2);
+        EXPECT_STREQ(pInfo->szPath, "/dev/md2p1");
+        RAIDInfoFree(pInfo);
+    });
+}
+
+TEST(RaidInfo, ALongPathIsCutInTheRecord)
+{
+    // Through folders that lead back, so that it is the whole path that is opened.
+    std::string szLong = "/dev/md2";
+    while (szLong.size() < 150) {
+        szLong += "x/..";
+        szLong += "/md2";
+    }
+    MACHINE machine = ArrayMake({.nMd = 2});
+    MachineFolder(machine, "/dev/md2x");
+    MachineCall(machine, [&] {
+        RAID_INFO *pInfo = nullptr;
+        ASSERT_EQ(RAIDInfoGet(szLong.c_str(), &pInfo), 1);
+        EXPECT_EQ(pInfo->szPath, szLong.substr(0, 127));
+        RAIDInfoFree(pInfo);
+    });
+}
+
+TEST(RaidInfo, FreeingNothingIsAllowed)
+{
+    MachineCall(MachineMake(), [] {
+        CodeReset();
+        RAIDInfoFree(nullptr);
+        EXPECT_EQ(NLIBCErrGet(), CODE_BEFORE);
+    });
+}
+
+// ---- device size -------------------------------------------------------------------------------
+
+struct DEVICE_SIZE_CASE {
+    const char *szWhat;
+    MACHINE_MD md;
+    u64 cb;
+};
+
+TEST(RaidInfo, TheDeviceSizeHasItsSources)
+{
+    constexpr int FIELD = 1000;
+    const char *const FILE_TEXT = "5000\n";
+    const DEVICE_SIZE_CASE cases[] = {
+        {"0.90 takes the field",
+         {.majorVersion = 0, .size = FIELD, .szComponentSize = FILE_TEXT},
+         FIELD * 1024ULL},
+        {"0.90 takes the field above 4 GiB too",
+         {.majorVersion = 0, .size = FIELD, .arraySize = 5 * GIB, .szComponentSize = FILE_TEXT},
+         FIELD * 1024ULL},
+        {"0.90 takes a field of 0",
+         {.majorVersion = 0, .size = 0, .szComponentSize = FILE_TEXT},
+         0},
+        {"0.90 extends the sign",
+         {.majorVersion = 0, .size = -1, .szComponentSize = FILE_TEXT},
+         UINT64_MAX - 1023},
+        {"1.x takes the field of a small array",
+         {.size = FIELD, .arraySize = GIB, .szComponentSize = FILE_TEXT},
+         FIELD * 1024ULL},
+        {"1.x, the last size that is small",
+         {.size = FIELD, .arraySize = 0xFFFFFFFE, .szComponentSize = FILE_TEXT},
+         FIELD * 1024ULL},
+        {"1.x, the first size that is not",
+         {.size = FIELD, .arraySize = 0xFFFFFFFF, .szComponentSize = FILE_TEXT},
+         5000 * 1024ULL},
+        {"1.x, 4 GiB",
+         {.size = FIELD, .arraySize = 4 * GIB, .szComponentSize = FILE_TEXT},
+         5000 * 1024ULL},
+        {"1.x, a high word and nothing below",
+         {.size = FIELD, .arraySize = 64 * GIB, .szComponentSize = FILE_TEXT},
+         5000 * 1024ULL},
+        {"1.x, a field of 0",
+         {.size = 0, .arraySize = GIB, .szComponentSize = FILE_TEXT},
+         5000 * 1024ULL},
+        {"1.x, members beyond 2 TiB",
+         {.size = 0, .arraySize = GIB << 13, .szComponentSize = "8589934592\n"},
+         GIB << 13},
+        {"1.x without the file", {.size = 0, .szComponentSize = NO_FILE}, 0},
+        {"any version but 0 is 1.x",
+         {.majorVersion = 2, .size = 0, .szComponentSize = "7\n"},
+         7168},
+        {"negative ones too", {.majorVersion = -1, .size = 0, .szComponentSize = "7\n"}, 7168},
+        {"RAID 0 has none", {.level = 0, .size = FIELD}, 0},
+        {"linear has none", {.level = -1, .size = FIELD}, 0},
+        {"RAID 0 has none from the file either",
+         {.level = 0, .size = 0, .arraySize = 8 * GIB, .szComponentSize = FILE_TEXT},
+         0},
+        {"RAID 10 has one", {.level = 10, .size = FIELD}, FIELD * 1024ULL},
+    };
+    for (const DEVICE_SIZE_CASE &one : cases) {
+        SCOPED_TRACE(one.szWhat);
+        WithInfo(one.md, [&](const RAID_INFO &info) {
+            EXPECT_EQ(info.deviceSize, one.cb);
+            EXPECT_EQ(info.arraySize, one.md.arraySize);
+        });
+    }
+}
+
+struct COMPONENT_CASE {
+    std::string szText;
+    u64 nSector;
+};
+
+TEST(ComponentSize, TheFileIsANumberOfKib)
+{
+    const std::string szZeros(49, '0');
+    const COMPONENT_CASE cases[] = {
+        {"1048576\n", 2097152},
+        {"1048576", 2097152},
+        {"0\n", 0},
+        {"", 0},
+        {"\n", 0},
+        {"none\n", 0},
+        {"12abc\n", 24},
+        {"8589934592\n", 17179869184},
+        {szZeros.substr(0, 47) + "7\n", 14}, // 49 bytes are still read
+        {szZeros.substr(0, 48) + "7", 14},   // without a line end too
+        {szZeros.substr(0, 48) + "7\n", 0},  // 50 are not
+        {std::string(100, '0') + "7\n", 0},  // nor are more
+        {"7\n" + std::string(60, ' '), 0},
+    };
+    for (const COMPONENT_CASE &one : cases) {
+        SCOPED_TRACE(one.szText);
+        const RUN_RESULT result = WithArray({.nMd = 2, .szComponentSize = one.szText}, [&](int fd) {
+            EXPECT_EQ(RAIDComponentSizeGet(fd), one.nSector);
+            EXPECT_EQ(NLIBCErrGet(), CODE_BEFORE);
+        });
+        EXPECT_EQ(LogText(result), "");
+    }
+}
+
+TEST(ComponentSize, WhatCannotBeReadIsNothing)
+{
+    WithArray({.nMd = 2, .szComponentSize = NO_FILE}, [](int fd) {
+        EXPECT_EQ(RAIDComponentSizeGet(fd), 0U);
+        EXPECT_EQ(RAIDComponentSizeGet(-1), 0U);
+    });
+    MACHINE machine = ArrayMake({.nMd = 2, .szComponentSize = NO_FILE});
+    MachineFolder(machine, "/sys/block/md2/md/component_size");
+    MachineCall(machine, [] {
+        const int fd = open("/dev/md2", O_RDONLY);
+        EXPECT_EQ(RAIDComponentSizeGet(fd), 0U);
+        close(fd);
+    });
+}
+
+TEST(ComponentSize, TheMinorNumberNamesTheArray)
+{
+    MACHINE machine = ArrayMake({.nMd = 2, .szComponentSize = "1\n", .deviceMinor = 300});
+    MachineFile(machine, "/sys/block/md300/md/component_size", "21\n");
+    MachineCall(machine, [] {
+        const int fd = open("/dev/md2", O_RDONLY);
+        EXPECT_EQ(RAIDComponentSizeGet(fd), 42U);
+        close(fd);
+    });
+}
+
+// ---- the partitionable driver ------------------------------------------------------------------
+
+constexpr u64 PLAIN = 2;         // of /sys/block/md130
+constexpr u64 PARTITIONABLE = 4; // of /sys/block/md_d2
+
+// A device of major 254, minor 130: md_d2 when /proc/devices makes 254 the partitionable driver.
+MACHINE PartitionableMake(const std::string &szDevices)
+{
+    MACHINE machine = ArrayMake({.nMd = 9, .deviceMajor = 254, .deviceMinor = 130});
+    MachineFile(machine, "/sys/block/md130/md/component_size", "1\n");
+    MachineFile(machine, "/sys/block/md_d2/md/component_size", "2\n");
+    MachineFile(machine, "/proc/devices", szDevices);
+    return machine;
+}
+
+u64 ComponentSizeOfMd9()
+{
+    const int fd = open("/dev/md9", O_RDONLY);
+    const u64 nSector = RAIDComponentSizeGet(fd);
+    close(fd);
+    return nSector;
+}
+
+struct DEVICES_CASE {
+    const char *szWhat;
+    std::string szDevices;
+    u64 nSector;
+};
+
+void ExpectDevicesRead(const DEVICES_CASE &one)
+{
+    SCOPED_TRACE(one.szWhat);
+    MachineCall(PartitionableMake(one.szDevices),
+                [&] { EXPECT_EQ(ComponentSizeOfMd9(), one.nSector); });
+}
+
+TEST(ComponentSize, TheDriverStandsInTheBlockSection)
+{
+    const DEVICES_CASE cases[] = {
+        {"a plain list", "Character devices:\n  1 mem\n\nBlock devices:\n  9 md\n254 mdp\n",
+         PARTITIONABLE},
+        {"another number", "Block devices:\n253 mdp\n", PLAIN},
+        {"no such driver", "Block devices:\n254 device-mapper\n", PLAIN},
+        {"in the character section only", "Character devices:\n254 mdp\nBlock devices:\n  9 md\n",
+         PLAIN},
+        {"before any section", "254 mdp\nBlock devices:\n", PLAIN},
+        {"a longer name", "Block devices:\n254 mdp2\n", PLAIN},
+        {"a shorter name", "Block devices:\n254 md\n", PLAIN},
+        {"another case", "Block devices:\n254 MDP\n", PLAIN},
+        {"a heading in another case", "block devices:\n254 mdp\n", PLAIN},
+        {"words between the headings", "Block more devices:\n254 mdp\n", PLAIN},
+        {"a heading over two lines", "Block\n\n  devices:\n254 mdp\n", PARTITIONABLE},
+        {"tabs", "Block\tdevices:\n\t254\tmdp\n", PARTITIONABLE},
+        {"a number on an earlier line", "Block devices:\n254\n\n\nmdp\n", PARTITIONABLE},
+        {"the last number counts", "Block devices:\n253 254 mdp\n", PARTITIONABLE},
+        {"words between keep the number", "Block devices:\n254 sd mdp\n", PARTITIONABLE},
+        {"a number from the other section", "254 mem\nBlock devices:\nmdp\n", PARTITIONABLE},
+        {"a number with text behind it", "Block devices:\n254abc mdp\n", PARTITIONABLE},
+        {"no line end", "Block devices:\n254 mdp", PARTITIONABLE},
+        {"an empty file", "", PLAIN},
+    };
+    for (const DEVICES_CASE &one : cases) {
+        ExpectDevicesRead(one);
+    }
+}
+
+TEST(ComponentSize, WordsAreReadWithCommentsAndQuotes)
+{
+    const DEVICES_CASE cases[] = {
+        {"a comment to the end of the line", "Block devices:\n# 254 mdp\n", PLAIN},
+        {"a comment behind words", "Block devices: # 253 mdp\n254 mdp\n", PARTITIONABLE},
+        {"a comment without a line end", "Block devices:\n253 mdp2 #", PLAIN},
+        {"double quotes are dropped", "\"Block\" \"devices:\"\n254 \"mdp\"\n", PARTITIONABLE},
+        {"single quotes are dropped", "'Block' 'devices:'\n254 'mdp'\n", PARTITIONABLE},
+        {"quotes within a word", "Bl\"oc\"k devices:\n254 m'd'p\n", PARTITIONABLE},
+        {"quotes group blanks", "\"Block devices:\"\n254 mdp\n", PLAIN},
+        {"a quoted comment mark is none", "Block devices:\n'#' 254 mdp\n", PARTITIONABLE},
+        {"one quote in the other", "Block devices:\n\"'\" 254 mdp '\"'\n", PARTITIONABLE},
+    };
+    for (const DEVICES_CASE &one : cases) {
+        ExpectDevicesRead(one);
+    }
+}
+
+TEST(ComponentSize, WordsMayBeLong)
+{
+    for (const size_t cb : {98, 99, 100, 101, 102, 199, 200, 201, 1000, 5000}) {
+        const std::string szLong(cb, 'x');
+        ExpectDevicesRead(
+            {"a long word between", "Block devices:\n254 " + szLong + " mdp\n", PARTITIONABLE});
+        ExpectDevicesRead({"a long word at the end", "Block devices:\n254 " + szLong, PLAIN});
+        ExpectDevicesRead({"a long word that ends like the name",
+                           "Block devices:\n254 " + szLong + "mdp\n", PLAIN});
+    }
+}
+
+TEST(ComponentSize, TheFixUpsOfTheWordReaderHarmNothing)
+{
+    const DEVICES_CASE cases[] = {
+        {"a bracket behind active", "Block devices:\n254 md0 active(auto-read-only) mdp\n",
+         PARTITIONABLE},
+        {"a bracket behind a word that ends in it", "Block devices:\n254 inactive(x mdp\n",
+         PARTITIONABLE},
+        {"the word without its first bracket", "Block devices:\n254 auto-read-only) mdp\n",
+         PARTITIONABLE},
+        {"a bracket elsewhere", "Block devices:\n254 md(p mdp\n", PARTITIONABLE},
+        {"the bracket ends the word", "Block devices:\n253 254active(mdp mdp\n", PARTITIONABLE},
+    };
+    for (const DEVICES_CASE &one : cases) {
+        ExpectDevicesRead(one);
+    }
+}
+
+TEST(ComponentSize, WithoutAListThereIsNoSuchDriver)
+{
+    MACHINE machine = PartitionableMake("");
+    MachineRemove(machine, "/proc/devices");
+    const RUN_RESULT result = MachineCall(machine, [] {
+        CodeReset();
+        EXPECT_EQ(ComponentSizeOfMd9(), PLAIN);
+        EXPECT_EQ(NLIBCErrGet(), CODE_BEFORE);
+    });
+    EXPECT_EQ(LogText(result), "");
+}
+
+TEST(ComponentSize, TheDriverIsLookedUpUntilItIsFound)
+{
+    MachineCall(PartitionableMake("Block devices:\n"), [] {
+        EXPECT_EQ(ComponentSizeOfMd9(), PLAIN);
+        std::ofstream("/proc/devices") << "Block devices:\n254 mdp\n";
+        EXPECT_EQ(ComponentSizeOfMd9(), PARTITIONABLE);
+        std::ofstream("/proc/devices") << "Block devices:\n253 mdp\n";
+        EXPECT_EQ(ComponentSizeOfMd9(), PARTITIONABLE);
+    });
+}
+
+TEST(ComponentSize, TheMinorIsSharedByTheArraysPartitions)
+{
+    for (const unsigned int deviceMinor : {0U, 63U}) {
+        MACHINE machine = ArrayMake({.nMd = 9, .deviceMajor = 254, .deviceMinor = deviceMinor});
+        MachineFile(machine, "/sys/block/md_d0/md/component_size", "2\n");
+        MachineCall(machine, [] { EXPECT_EQ(ComponentSizeOfMd9(), PARTITIONABLE); });
+    }
+}
+
+// ---- failures of the query ---------------------------------------------------------------------
+
+TEST(RaidInfoFailure, NullIsABadParameter)
+{
+    const RUN_RESULT result = MachineCall(ArrayMake({.nMd = 2}), [] {
+        RAID_INFO *pInfo = nullptr;
+        CodeReset();
+        EXPECT_EQ(RAIDInfoGet(nullptr, &pInfo), -1);
+        EXPECT_EQ(NLIBCErrGet(), 0x0D00U);
+        EXPECT_EQ(pInfo, nullptr);
+        CodeReset();
+        EXPECT_EQ(RAIDInfoGet("/dev/md2", nullptr), -1);
+        EXPECT_EQ(NLIBCErrGet(), 0x0D00U);
+    });
+    EXPECT_EQ(LogText(result), "");
+}
+
+TEST(RaidInfoFailure, AnotherPathIsRefusedBeforeItIsOpened)
+{
+    for (const char *const szPath : {"/dev/sda", "/dev/md", "/dev/mdx", "/dev/md_d2", "md2",
+                                     "/dev//md2", "/DEV/md2", "", " /dev/md2", "/dev/m2"}) {
+        MACHINE machine = ArrayMake({.nMd = 2});
+        // Would be logged as another failure if it came so far.
+        machine.faults = {{.szFunction = "open", .nCall = 1, .error = EIO, .fGoOn = true}};
+        ExpectQueryFails(machine, szPath, 0xBE00,
+                         std::string("<15>raid_info.cpp:# invalide path ") + szPath +
+                             ", errno=Success\n");
+    }
+}
+
+TEST(RaidInfoFailure, WithoutMemory)
+{
+    MACHINE machine = ArrayMake({.nMd = 2});
+    machine.faults = {{.szFunction = "calloc", .nCall = 1, .error = ENOMEM}};
+    ExpectQueryFails(machine, "/dev/md2", 0x0200,
+                     "<15>raid_info.cpp:# Failed to calloc, errno=Cannot allocate memory\n");
+}
+
+TEST(RaidInfoFailure, ANodeThatDoesNotOpen)
+{
+    ExpectQueryFails(MachineMake(), "/dev/md5", 0x0900,
+                     "<15>raid_info.cpp:# Failed to open /dev/md5, "
+                     "errno=No such file or directory\n");
+}
+
+TEST(RaidInfoFailure, TheArrayInformation)
+{
+    ExpectQueryFails({.nMd = 2, .errnoInfo = EIO}, 0x8000,
+                     "<15>raid_info.cpp:# Failed to ioctl for raid status, "
+                     "errno=Input/output error\n"
+                     "<15>raid_info.cpp:# Failed to ioctl for raid status, errno=0X8000\n");
+    ExpectQueryFails({.nMd = 2, .errnoInfo = EINTR}, 0xA700,
+                     "<15>raid_info.cpp:# Failed to ioctl for raid status, errno=0XA700\n");
+}
+
+// The absence is overwritten on its way up, so an inactive array is a failure like any other.
+TEST(RaidInfoFailure, AnInactiveArray)
+{
+    ExpectQueryFails({.nMd = 2, .errnoInfo = ENODEV}, 0x8000,
+                     "<15>raid_info.cpp:# Failed to ioctl for raid status, errno=No such device\n"
+                     "<15>raid_info.cpp:# Failed to ioctl for raid status, errno=0X8000\n");
+}
+
+TEST(RaidInfoFailure, TheSize)
+{
+    ExpectQueryFails({.nMd = 2, .errnoSize = EIO}, 0x8000,
+                     "<15>raid_info.cpp:# Failed to ioctl for raid status, "
+                     "errno=Input/output error\n"
+                     "<15>raid_info.cpp:# Failed to ioctl for raid size, errno=0X8000\n");
+    ExpectQueryFails({.nMd = 2, .errnoSize = ENODEV}, 0x0600,
+                     "<15>raid_info.cpp:# Failed to ioctl for raid size, errno=0X600\n");
+}
+
+TEST(RaidInfoFailure, TheMemberList)
+{
+    MACHINE machine = ArrayMake({.nMd = 2, .members = {{"sda3"}}});
+    machine.faults = {{.szFunction = "glob", .nCall = 1, .error = EIO}};
+    ExpectQueryFails(machine, "/dev/md2", 0x8000,
+                     "<15>raid_disk.cpp:# failed to glob '/sys/block/md2/md/dev-*', "
+                     "errno=Input/output error\n"
+                     "<15>raid_info.cpp:# Failed to get disk list for /dev/md2, errno=0X8000\n");
+}
+
+TEST(RaidInfoFailure, TheResync)
+{
+    ExpectQueryFails({.nMd = 2, .errnoSync = EIO, .members = {{"sda3"}}}, 0x8000,
+                     "<15>raid_info.cpp:# Failed to ioctl for sync status, "
+                     "errno=Input/output error\n"
+                     "<15>raid_info.cpp:# Failed to get disk list for /dev/md2, errno=0X8000\n");
+    ExpectQueryFails({.nMd = 2, .errnoSync = ENODEV, .members = {{"sda3"}}}, 0x0600,
+                     "<15>raid_info.cpp:# Failed to get disk list for /dev/md2, errno=0X600\n");
+}
+
+TEST(RaidInfoFailure, TheHealth)
+{
+    ExpectQueryFails({.nMd = 2, .errnoHealth = EIO, .members = {{"sda3"}}}, 0x8000,
+                     "<15>raid_info.cpp:# Failed to ioctl for raid status, "
+                     "errno=Input/output error\n"
+                     "<15>raid_info.cpp:# Failed to ioctl for raid size, errno=0X8000\n");
+    ExpectQueryFails({.nMd = 2, .errnoHealth = ENODEV}, 0x0600,
+                     "<15>raid_info.cpp:# Failed to ioctl for raid size, errno=0X600\n");
+    ExpectQueryFails({.nMd = 2, .errnoHealth = EINTR}, 0xA700,
+                     "<15>raid_info.cpp:# Failed to ioctl for raid size, errno=0XA700\n");
+    ExpectQueryFails({.nMd = 2, .health = 3, .members = {{"sda3"}}}, 0x8000,
+                     "<15>raid_info.cpp:# unknown raid status, status=3\n"
+                     "<15>raid_info.cpp:# Failed to ioctl for raid size, errno=0X8000\n");
+}
+
+// ---- the requests by themselves ----------------------------------------------------------------
+
+TEST(RaidRequest, NullIsABadParameter)
+{
+    const RUN_RESULT result = WithArray({.nMd = 2}, [](int fd) {
+        RAID_REBUILD_STATUS rebuild = {};
+        EXPECT_EQ(RAIDIoctlInfo(fd, nullptr), -1);
+        EXPECT_EQ(NLIBCErrGet(), 0x0D00U);
+        CodeReset();
+        EXPECT_EQ(RAIDIoctlSize(fd, nullptr), -1);
+        EXPECT_EQ(NLIBCErrGet(), 0x0D00U);
+        CodeReset();
+        EXPECT_EQ(RAIDIoctlStatus(fd, nullptr), -1);
+        EXPECT_EQ(NLIBCErrGet(), 0x0D00U);
+        CodeReset();
+        EXPECT_EQ(RAIDRebuildStatusGet(fd, nullptr), -1);
+        EXPECT_EQ(NLIBCErrGet(), 0x0D00U);
+        CodeReset();
+        EXPECT_EQ(RAIDRebuildStatusGet(-1, &rebuild), -1);
+        EXPECT_EQ(NLIBCErrGet(), 0x0D00U);
+    });
+    EXPECT_EQ(LogText(result), "");
+}
+
+TEST(RaidRequest, TheArrayInformationIsTheDriversRecord)
+{
+    WithArray({.nMd = 2, .level = 6, .size = 77, .nRaidDisks = 5, .nSpareDisks = 1}, [](int fd) {
+        mdu_array_info_t array;
+        memset(&array, 0xFF, sizeof(array));
+        EXPECT_EQ(RAIDIoctlInfo(fd, &array), 0);
+        EXPECT_EQ(array.major_version, 1);
+        EXPECT_EQ(array.minor_version, 2);
+        EXPECT_EQ(array.level, 6);
+        EXPECT_EQ(array.size, 77);
+        EXPECT_EQ(array.raid_disks, 5);
+        EXPECT_EQ(array.spare_disks, 1);
+        EXPECT_EQ(NLIBCErrGet(), CODE_BEFORE);
+    });
+}
+
+struct REQUEST_FAILURE_CASE {
+    int error;
+    u32 code;
+    const char *szLog;
+};
+
+TEST(RaidRequest, TheArrayInformationFails)
+{
+    for (const REQUEST_FAILURE_CASE &one : {
+             REQUEST_FAILURE_CASE{EINTR, 0xA700, ""},
+             {ENODEV, 0x8000,
+              "<15>raid_info.cpp:# Failed to ioctl for raid status, errno=No such device\n"},
+             {EFAULT, 0x8000,
+              "<15>raid_info.cpp:# Failed to ioctl for raid status, errno=Bad address\n"},
+         }) {
+        const RUN_RESULT result = WithArray({.nMd = 2, .errnoInfo = one.error}, [&](int fd) {
+            mdu_array_info_t array = {};
+            EXPECT_EQ(RAIDIoctlInfo(fd, &array), -1);
+            EXPECT_EQ(NLIBCErrGet(), one.code);
+        });
+        EXPECT_EQ(LogText(result), one.szLog);
+    }
+}
+
+TEST(RaidRequest, TheSizeFails)
+{
+    for (const REQUEST_FAILURE_CASE &one : {
+             REQUEST_FAILURE_CASE{ENODEV, 0x0600, ""},
+             {EINTR, 0x8000,
+              "<15>raid_info.cpp:# Failed to ioctl for raid status, "
+              "errno=Interrupted system call\n"},
+             {EIO, 0x8000,
+              "<15>raid_info.cpp:# Failed to ioctl for raid status, errno=Input/output error\n"},
+         }) {
+        const RUN_RESULT result = WithArray({.nMd = 2, .errnoSize = one.error}, [&](int fd) {
+            u64 cb = 99;
+            EXPECT_EQ(RAIDIoctlSize(fd, &cb), -1);
+            EXPECT_EQ(cb, 0U); // written first
+            EXPECT_EQ(NLIBCErrGet(), one.code);
+        });
+        EXPECT_EQ(LogText(result), one.szLog);
+    }
+}
+
+TEST(RaidRequest, TheHealthFails)
+{
+    for (const REQUEST_FAILURE_CASE &one : {
+             REQUEST_FAILURE_CASE{ENODEV, 0x0600, ""},
+             {EINTR, 0xA700, ""},
+             {ENOTTY, 0x8000,
+              "<15>raid_info.cpp:# Failed to ioctl for raid status, "
+              "errno=Inappropriate ioctl for device\n"},
+         }) {
+        const RUN_RESULT result = WithArray({.nMd = 2, .errnoHealth = one.error}, [&](int fd) {
+            u32 status = 99;
+            EXPECT_EQ(RAIDIoctlStatus(fd, &status), -1);
+            EXPECT_EQ(NLIBCErrGet(), one.code);
+        });
+        EXPECT_EQ(LogText(result), one.szLog);
+    }
+}
+
+TEST(RaidRequest, TheHealthIsMapped)
+{
+    for (const int health : {0, 1, 2}) {
+        WithArray({.nMd = 2, .health = health}, [&](int fd) {
+            u32 status = 99;
+            EXPECT_EQ(RAIDIoctlStatus(fd, &status), 0);
+            EXPECT_EQ(status, 1U << health);
+        });
+    }
+    for (const int health : {3, 4, -1}) {
+        const RUN_RESULT result = WithArray({.nMd = 2, .health = health}, [&](int fd) {
+            u32 status = 99;
+            EXPECT_EQ(RAIDIoctlStatus(fd, &status), -1);
+            EXPECT_EQ(NLIBCErrGet(), 0x8000U);
+        });
+        EXPECT_EQ(LogText(result), "<15>raid_info.cpp:# unknown raid status, status=" +
+                                       std::to_string(health) + "\n");
+    }
+}
+
+TEST(RaidRequest, TheResyncFails)
+{
+    for (const REQUEST_FAILURE_CASE &one : {
+             REQUEST_FAILURE_CASE{ENODEV, 0x0600, ""},
+             {EINTR, 0x8000,
+              "<15>raid_info.cpp:# Failed to ioctl for sync status, "
+              "errno=Interrupted system call\n"},
+             {ENOTTY, 0x8000,
+              "<15>raid_info.cpp:# Failed to ioctl for sync status, "
+              "errno=Inappropriate ioctl for device\n"},
+         }) {
+        const RUN_RESULT result = WithArray({.nMd = 2, .errnoSync = one.error}, [&](int fd) {
+            RAID_REBUILD_STATUS rebuild = {};
+            EXPECT_EQ(RAIDRebuildStatusGet(fd, &rebuild), -1);
+            EXPECT_EQ(NLIBCErrGet(), one.code);
+        });
+        EXPECT_EQ(LogText(result), one.szLog);
+    }
+}
+
+struct RESYNC_CASE {
+    u64 activity;
+    u64 done;
+    u64 total;
+    RAID_REBUILD_STATUS rebuild;
+};
+
+TEST(RaidRequest, TheResyncIsToldApart)
+{
+    for (const RESYNC_CASE &one : {
+             RESYNC_CASE{0, 0, 0, {0, 0, 0}},
+             {0, 5, 9, {0, 0, 0}},
+             {1, 0, 9, {2, 0, 9}},
+             {1, 5, 9, {1, 5, 9}},
+             {1, 1ULL << 32, 1ULL << 40, {1, 1ULL << 32, 1ULL << 40}},
+             {1ULL << 32, 1, 2, {1, 1, 2}},
+         }) {
+        WithArray({.nMd = 2, .activity = one.activity, .done = one.done, .total = one.total},
+                  [&](int fd) {
+                      RAID_REBUILD_STATUS rebuild = {99, 99, 99};
+                      EXPECT_EQ(RAIDRebuildStatusGet(fd, &rebuild), 0);
+                      EXPECT_EQ(rebuild.state, one.rebuild.state);
+                      EXPECT_EQ(rebuild.done, one.rebuild.done);
+                      EXPECT_EQ(rebuild.total, one.rebuild.total);
+                  });
+    }
+}
