@@ -376,6 +376,7 @@ TEST(HashSet, TheMeanPairIsASinglePrecisionNumber)
 
 TEST(HashSet, TakesKeyAndValueOfTheTableItself)
 {
+    const FREED_MEMORY_SCOPE overwritten;
     TEST_HASH hash;
     const std::string text(100, 't');
     ASSERT_GE(NLIBCHashSet(&hash.p, "source", text.c_str()), 0);

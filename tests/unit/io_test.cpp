@@ -13,7 +13,8 @@
 namespace
 {
 
-// A stream whose reads fail as told, one errno each, before it gives its text and then ends.
+// A stream whose reads fail as told, one errno each (0 leaves errno alone), before it gives its
+// text and then ends.
 struct SCRIPT {
     std::vector<int> failures;
     std::string text;
@@ -25,7 +26,7 @@ ssize_t ScriptRead(void *pCookie, char *pBuf, size_t cbBuf)
     auto &script = *static_cast<SCRIPT *>(pCookie);
     const auto nRead = static_cast<size_t>(script.nRead++);
     if (nRead < script.failures.size()) {
-        errno = script.failures[nRead];
+        errno = script.failures[nRead] != 0 ? script.failures[nRead] : errno;
         return -1;
     }
     const size_t cb = std::min(cbBuf, script.text.size());
@@ -86,6 +87,21 @@ TEST(Fgets, IsTriedThreeTimesWhileInterrupted)
 
 TEST(Fgets, AnErrnoFromBeforeIsNoInterruption)
 {
+    for (const std::vector<int> &failures : {std::vector<int>{0}, std::vector<int>{EINTR, 0}}) {
+        SCRIPT script = {.failures = failures, .text = "line\n"};
+        FILE *const pStream = ScriptOpen(script);
+        ASSERT_NE(pStream, nullptr);
+        char szLine[16];
+        errno = EINTR;
+        EXPECT_EQ(NLIBCFgets(szLine, 16, pStream), nullptr);
+        EXPECT_EQ(errno, EINTR);
+        EXPECT_EQ(script.nRead, static_cast<int>(failures.size()));
+        (void)fclose(pStream);
+    }
+}
+
+TEST(Fgets, TheEndOfTheStreamIsFinal)
+{
     SCRIPT script = {.failures = {}, .text = ""};
     FILE *const pStream = ScriptOpen(script);
     ASSERT_NE(pStream, nullptr);
@@ -93,7 +109,7 @@ TEST(Fgets, AnErrnoFromBeforeIsNoInterruption)
     errno = EINTR;
     EXPECT_EQ(NLIBCFgets(szLine, 16, pStream), nullptr);
     EXPECT_EQ(errno, EINTR);
-    EXPECT_EQ(script.nRead, 1) << "the end of the stream is final";
+    EXPECT_EQ(script.nRead, 1);
     EXPECT_NE(feof(pStream), 0);
     (void)fclose(pStream);
 }

@@ -94,6 +94,7 @@ TEST(SzListPush, KeepsACopy)
 
 TEST(SzListPush, TakesAStringThatLiesInTheBlockItself)
 {
+    const FREED_MEMORY_SCOPE overwritten;
     TEST_LIST list(512);
     const std::string text(300, 'y');
     ASSERT_EQ(NLIBCSzListPush(&list.p, text.c_str()), 0);
@@ -106,6 +107,7 @@ TEST(SzListPush, TakesAStringThatLiesInTheBlockItself)
 
 TEST(SzListPush, TakesAStringOfTheBlockThroughSeveralDoublings)
 {
+    const FREED_MEMORY_SCOPE overwritten;
     TEST_LIST list(512);
     ASSERT_EQ(NLIBCSzListPush(&list.p, "kept"), 0);
     ASSERT_EQ(NLIBCSzListInsert(&list.p, 1000, NLIBCSzListGet(list.p, 0)), 1000);

@@ -105,11 +105,13 @@ inline std::string DescriptorTarget(int fd)
     return std::filesystem::read_symlink("/proc/self/fd/" + std::to_string(fd), ignored).string();
 }
 
+// How many descriptors are open. Far above are those that a checker of memory keeps for itself.
 inline int DescriptorCount()
 {
+    constexpr int CHECKERS_START = 1000;
     int n = 0;
     for (const auto &entry : std::filesystem::directory_iterator("/proc/self/fd")) {
-        n += entry.is_symlink() ? 1 : 0;
+        n += std::stoi(entry.path().filename()) < CHECKERS_START ? 1 : 0;
     }
     return n;
 }
@@ -145,12 +147,14 @@ struct SIGNAL_SCOPE {
     }
 };
 
-// Interrupts this process every few milliseconds; calls that wait end with EINTR.
+// Interrupts this process every few milliseconds; calls that wait end with EINTR. Afterwards the
+// signal is ignored, so that one that comes late does no harm.
 struct INTERRUPTION_SCOPE {
-    SIGNAL_SCOPE signal;
-
-    explicit INTERRUPTION_SCOPE(void (*pHandler)(int)) : signal(SIGALRM, pHandler)
+    explicit INTERRUPTION_SCOPE(void (*pHandler)(int))
     {
+        struct sigaction action = {};
+        action.sa_handler = pHandler;
+        (void)sigaction(SIGALRM, &action, nullptr);
         constexpr itimerval often = {{0, 5000}, {0, 5000}};
         (void)setitimer(ITIMER_REAL, &often, nullptr);
     }
@@ -160,5 +164,6 @@ struct INTERRUPTION_SCOPE {
     {
         constexpr itimerval never = {{0, 0}, {0, 0}};
         (void)setitimer(ITIMER_REAL, &never, nullptr);
+        (void)signal(SIGALRM, SIG_IGN);
     }
 };

@@ -6,6 +6,7 @@
 #include "nurocore/szlist.h"
 
 #include <cstring>
+#include <malloc.h>
 #include <string>
 #include <vector>
 
@@ -13,6 +14,20 @@ using ITEMS = std::vector<std::string>;
 
 constexpr i32 SLOTS_START = 24; // the header's six 32-bit words
 constexpr i32 SLOT_SIZE = 4;
+
+// Freed memory is overwritten at once, so that a text read from it is seen to be gone.
+struct FREED_MEMORY_SCOPE {
+    FREED_MEMORY_SCOPE()
+    {
+        (void)mallopt(M_PERTURB, 0x55);
+    }
+    FREED_MEMORY_SCOPE(const FREED_MEMORY_SCOPE &) = delete;
+    FREED_MEMORY_SCOPE &operator=(const FREED_MEMORY_SCOPE &) = delete;
+    ~FREED_MEMORY_SCOPE()
+    {
+        (void)mallopt(M_PERTURB, 0);
+    }
+};
 
 // A list that is freed with its scope; p may move like any caller's pointer.
 struct TEST_LIST {
