@@ -92,15 +92,18 @@ TEST(SzListPush, KeepsACopy)
     EXPECT_STREQ(NLIBCSzListGet(list.p, 0), "sda");
 }
 
+// Blocks of this size are overwritten when they are freed; the smallest ones are not.
+constexpr int OVERWRITTEN_SIZE = 2048;
+
 TEST(SzListPush, TakesAStringThatLiesInTheBlockItself)
 {
     const FREED_MEMORY_SCOPE overwritten;
-    TEST_LIST list(512);
-    const std::string text(300, 'y');
+    TEST_LIST list(OVERWRITTEN_SIZE);
+    const std::string text(1500, 'y');
     ASSERT_EQ(NLIBCSzListPush(&list.p, text.c_str()), 0);
     ASSERT_EQ(NLIBCSzListPush(&list.p, NLIBCSzListGet(list.p, 0)), 1); // this one grows
-    EXPECT_EQ(list.p->nSize, 1024);
-    ASSERT_EQ(NLIBCSzListPush(&list.p, NLIBCSzListGet(list.p, 1) + 299), 2);
+    EXPECT_EQ(list.p->nSize, 2 * OVERWRITTEN_SIZE);
+    ASSERT_EQ(NLIBCSzListPush(&list.p, NLIBCSzListGet(list.p, 1) + 1499), 2);
     EXPECT_EQ(ItemsOf(list.p), (ITEMS{text, text, "y"}));
     EXPECT_EQ(Defect(list.p), "");
 }
@@ -108,11 +111,11 @@ TEST(SzListPush, TakesAStringThatLiesInTheBlockItself)
 TEST(SzListPush, TakesAStringOfTheBlockThroughSeveralDoublings)
 {
     const FREED_MEMORY_SCOPE overwritten;
-    TEST_LIST list(512);
+    TEST_LIST list(OVERWRITTEN_SIZE);
     ASSERT_EQ(NLIBCSzListPush(&list.p, "kept"), 0);
-    ASSERT_EQ(NLIBCSzListInsert(&list.p, 1000, NLIBCSzListGet(list.p, 0)), 1000);
+    ASSERT_EQ(NLIBCSzListInsert(&list.p, 4000, NLIBCSzListGet(list.p, 0)), 4000);
     EXPECT_STREQ(NLIBCSzListGet(list.p, 0), "kept");
-    EXPECT_STREQ(NLIBCSzListGet(list.p, 1000), "kept");
+    EXPECT_STREQ(NLIBCSzListGet(list.p, 4000), "kept");
     EXPECT_EQ(Defect(list.p), "");
 }
 
