@@ -436,6 +436,8 @@ TEST(ComponentSize, TheFixUpsOfTheWordReaderHarmNothing)
         {"the word without its first bracket", "Block devices:\n254 auto-read-only) mdp\n",
          PARTITIONABLE},
         {"a bracket elsewhere", "Block devices:\n254 md(p mdp\n", PARTITIONABLE},
+        {"the bracket is a separator", "Block devices:\n254 active(mdp\n", PARTITIONABLE},
+        {"no other bracket is", "Block devices:\n254 act(mdp\n", PLAIN},
         {"the bracket ends the word", "Block devices:\n253 254active(mdp mdp\n", PARTITIONABLE},
     };
     for (const DEVICES_CASE &one : cases) {
