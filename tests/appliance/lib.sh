@@ -9,6 +9,7 @@ export PATH=/usr/bin:/usr/sbin
 EXPECTED=/tmp/expected
 SEEN=/tmp/seen
 ERRORS=/tmp/errors
+RUNS=/tmp/runs
 SYSLOG=/var/log/messages
 
 # Long enough for a busy host; nobody waits longer than the condition takes.
@@ -211,6 +212,19 @@ mdadm_state_is() {
     [ "$(mdadm_state "$1")" = "$2" ]
 }
 
+# settle MD...: the driver calls an array clean again when the last write is a moment old; until then
+# its superblocks change by themselves.
+settle() {
+    sync
+    for number in "$@"; do
+        wait_for "$SETTLE_SECONDS" array_is_clean "$number" || abort "md$number does not settle"
+    done
+}
+
+array_is_clean() {
+    [ "$(cat "/sys/block/md$1/md/array_state")" = clean ]
+}
+
 # Of the driver, of sysfs, and of the node: any of them may linger, or come back.
 array_left_nothing() {
     array_is_gone "$1" && [ ! -e "/sys/block/md$1" ] && [ ! -e "/dev/md$1" ]
@@ -221,8 +235,13 @@ arrays_known() {
     sed -n 's/^md\([0-9]*\) :.*/\1/p' /proc/mdstat | sort -n | xargs
 }
 
+# MEMBER...: mdadm has to say it of each.
 has_no_superblock() {
-    mdadm -E "/dev/$1" 2>&1 | grep -qx "mdadm: No md superblock detected on /dev/$1\."
+    for member in "$@"; do
+        echo "mdadm: No md superblock detected on /dev/$member."
+    done >/tmp/members
+    # shellcheck disable=SC2046  # a list of nodes
+    mdadm -E $(printf '/dev/%s ' "$@") 2>&1 | cmp /tmp/members -
 }
 
 # On no disk and no partition, whatever array they belong to.
@@ -231,7 +250,8 @@ uuid_is_nowhere() {
 }
 
 has_no_signature() {
-    [ -z "$(blkid -p -s TYPE -o value "/dev/$1")" ]
+    # shellcheck disable=SC2046
+    [ -z "$(blkid -p -s TYPE -o value $(printf '/dev/%s ' "$@"))" ]
 }
 
 array_bytes() {
@@ -300,13 +320,14 @@ check_not_found() {
 # --- destroy -----------------------------------------------------------------------------------
 
 # run_destroy TAG MD: under a name of its own, as the system log tells runs apart by the program's
-# name. Leaves /tmp/TAG.out, .status and .seconds.
+# name. Leaves TAG.out, TAG.status and TAG.seconds.
 run_destroy() {
-    ln -sf /sbin/arrayctl "/tmp/$1"
+    mkdir -p "$RUNS"
+    ln -sf /sbin/arrayctl "$RUNS/$1"
     begin=$(cut -d. -f1 /proc/uptime)
-    LD_PRELOAD=/usr/lib/libmdrequests.so "/tmp/$1" destroy "$2" >"/tmp/$1.out" 2>&1
-    echo $? >"/tmp/$1.status"
-    echo $(($(cut -d. -f1 /proc/uptime) - begin)) >"/tmp/$1.seconds"
+    LD_PRELOAD=/usr/lib/libmdrequests.so "$RUNS/$1" destroy "$2" >"$RUNS/$1.out" 2>&1
+    echo $? >"$RUNS/$1.status"
+    echo $(($(cut -d. -f1 /proc/uptime) - begin)) >"$RUNS/$1.seconds"
 }
 
 # log_of TAG: the lines of that run as "PRIORITY MESSAGE", without the place in the source.
@@ -336,8 +357,8 @@ operation_errors() {
 
 check_silent_success() {
     : >"$EXPECTED"
-    check "output of $1" as_expected "/tmp/$1.out"
-    check "exit status of $1" test "$(cat "/tmp/$1.status")" = 0
+    check "output of $1" as_expected "$RUNS/$1.out"
+    check "exit status of $1" test "$(cat "$RUNS/$1.status")" = 0
 }
 
 # log_of_removal MD MEMBER...: what a removal that goes well logs.
@@ -355,9 +376,7 @@ check_left_nothing() {
     uuid=$2
     shift 2
     check 'the array is gone' wait_for "$SETTLE_SECONDS" array_left_nothing "$number"
-    for member in "$@"; do
-        check 'no superblock' has_no_superblock "$member"
-        check 'no signature' has_no_signature "$member"
-    done
+    check 'no superblock' has_no_superblock "$@"
+    check 'no signature' has_no_signature "$@"
     check 'no superblock anywhere' uuid_is_nowhere "$uuid"
 }

@@ -5,7 +5,7 @@
 # disks: 4
 # size: 44M
 # boots: 2
-# timeout: 180
+# timeout: 300
 # shellcheck source=SCRIPTDIR/../lib.sh
 . /appliance/lib.sh
 
@@ -101,6 +101,7 @@ boot_1() {
     partition_disks '4M 4M 8M ,E 8M 8M' sda sdb sdc sdd
     make_arrays_that_stay
     make_arrays_that_go
+    settle 0 1 9
     # shellcheck disable=SC2086  # lists of words
     picture $OTHERS >/tmp/others
 
@@ -138,7 +139,7 @@ boot_1() {
     picture $OTHERS >"$SEEN"
     check 'the same to the bit' cmp /tmp/others "$SEEN"
     for number in 0 1 9; do
-        check 'runs' test "$(cat /sys/block/md"$number"/md/array_state)" = clean
+        check 'runs' array_is_clean "$number"
         check 'its data' holds "md$number"
     done
     verdict 'the other arrays on the same disks'
@@ -180,10 +181,11 @@ boot_2() {
     for uuid in "$MIRROR_UUID" "$RAID5_UUID" "$DEGRADED_UUID" "$RESYNC_UUID" "$TABLE_UUID"; do
         check 'superblocks' uuid_is_nowhere "$uuid"
     done
-    for member in sda3 sdb3 sdc3 sdd3 sda5 sdb5 sdc5 sdd5 sda6 sdb6 sdc6 sdd6; do
-        check 'superblocks' has_no_superblock "$member"
-        check 'signatures' has_no_signature "$member"
-    done
+    members='sda3 sdb3 sdc3 sdd3 sda5 sdb5 sdc5 sdd5 sda6 sdb6 sdc6 sdd6'
+    # shellcheck disable=SC2086
+    check 'superblocks' has_no_superblock $members
+    # shellcheck disable=SC2086
+    check 'signatures' has_no_signature $members
     verdict 'no trace of them on the disks'
 }
 
