@@ -267,7 +267,7 @@ TEST(RAIDUUIDGet, AMemberWithoutASuperblockFails)
 TEST(RAIDUUIDHashForRemoveGet, ExaminesDataPartitionsOfSdDisksInByteOrder)
 {
     MACHINE machine = MachineMake();
-    for (const char *const szDisk : {"sdb", "sda", "isdc", "nvme0n1", "mmcblk0", "hda", "xvda"}) {
+    for (const char *const szDisk : {"sdb", "sda", "isdc", "nvme0n1", "mmcblk0", "vda", "xvda"}) {
         DiskWithPartitionsAdd(machine, szDisk, 4);
     }
     MachinePartitionAdd(machine, "sda", 10, 9000000, 2048);

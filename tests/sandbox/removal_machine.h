@@ -8,8 +8,10 @@
 #include "nurocore/error.h"
 #include "nurostoragecore/raid_info.h"
 
+#include <cstddef>
 #include <cstdio>
-#include <regex>
+#include <ctime>
+#include <sstream>
 #include <string>
 #include <vector>
 
@@ -91,12 +93,23 @@ inline std::string TextOf(const std::vector<std::string> &lines)
     return szText;
 }
 
+inline constexpr size_t STAMP_SIZE = sizeof("Nov 05 01:02:03 ") - 1;
+
+// Such a stamp stands at the start of the line.
+inline bool IsStamped(const std::string &szLine)
+{
+    struct tm time = {};
+    const char *const pchEnd = strptime(szLine.c_str(), "%b %d %H:%M:%S ", &time);
+    return pchEnd == szLine.c_str() + STAMP_SIZE && szLine[4] != ' ';
+}
+
 // The operation error log with its time stamps masked; one that is not of the form stays.
 inline std::string OperationErrors()
 {
-    static const std::regex stamp(
-        "(^|\n)(Jan|Feb|Mar|Apr|May|Jun|Jul|Aug|Sep|Oct|Nov|Dec) [0-3][0-9] "
-        "[0-2][0-9]:[0-5][0-9]:[0-6][0-9] ");
-    const std::string szLog = MachineFileRead("/var/log/space_operation_error.log").value_or("");
-    return std::regex_replace(szLog, stamp, "$1<time> ");
+    std::istringstream log(MachineFileRead("/var/log/space_operation_error.log").value_or(""));
+    std::string szText;
+    for (std::string szLine; std::getline(log, szLine);) {
+        szText += (IsStamped(szLine) ? "<time> " + szLine.substr(STAMP_SIZE) : szLine) + "\n";
+    }
+    return szText;
 }
