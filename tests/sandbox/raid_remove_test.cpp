@@ -14,6 +14,8 @@
 namespace
 {
 
+constexpr int MANY_COMMANDS_MS = 60000; // fifty of them, on a machine that may be shared
+
 constexpr char STOP_MD2[] = "/sbin/mdadm -S /dev/md2";
 constexpr char STOP_TOLD[] = "<11>raid_remove.cpp:# Failed to mdadm stop '/dev/md2'\n"
                              "<11>raid_remove.cpp:# Fail to stop [/dev/md2], try again\n";
@@ -317,7 +319,7 @@ TEST(RAIDUUIDHashForRemoveGet, LeavesOutWhatHasNoSuperblock)
 TEST(RAIDUUIDHashForRemoveGet, AddsToTheMapAndFollowsIt)
 {
     MACHINE machine = MachineMake();
-    std::string szExpected;
+    machine.msBound = MANY_COMMANDS_MS;
     for (const char *const szDisk : {"sda", "sdb", "sdc", "sdd", "sde"}) {
         DiskWithPartitionsAdd(machine, szDisk, 8);
     }
@@ -412,6 +414,7 @@ TEST(RAIDCleanSuperblock, WipesEveryMemberOfALargeArray)
     constexpr int ORDER[] = {15, 25, 11, 21, 18, 14, 24, 10, 20, 17, 27, 13, 23,
                              3,  4,  26, 6,  5,  8,  7,  16, 9,  12, 22, 19};
     MACHINE machine = MachineMake();
+    machine.msBound = MANY_COMMANDS_MS;
     DiskWithPartitionsAdd(machine, "sda", 27);
     MachineTool(machine, "/sbin/mdadm -E *", {.szOut = ReportOf(UUID_MD2), .nTimes = 25});
     std::string szExpected;
