@@ -43,11 +43,12 @@ struct MACHINE_FILE {
 struct TOOL_ANSWER {
     std::string szOut = {};
     std::string szErr = {};
-    int status = 0;     // exit status
-    int signal = 0;     // ends by this signal instead, when not 0
-    int msDelay = 0;    // waits before it answers
-    size_t cbFlood = 0; // so many bytes on standard output and as many on standard error, first
-    int nTimes = 1;     // how often it must be run; ANY_TIMES for "may be run, never or often"
+    int status = 0;       // exit status
+    int signal = 0;       // ends by this signal instead, when not 0
+    int signalCaller = 0; // and first ends by this one the process that ran it, when not 0
+    int msDelay = 0;      // waits before it answers
+    size_t cbFlood = 0;   // so many bytes on standard output and as many on standard error, first
+    int nTimes = 1;       // how often it must be run; ANY_TIMES for "may be run, never or often"
     std::map<std::string, std::string> writes =
         {};                                // files it leaves on the machine, with their text
     std::vector<std::string> removes = {}; // files and folders it takes away

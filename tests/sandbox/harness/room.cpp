@@ -408,6 +408,7 @@ std::string RowRecord(const TOOL_ROW &row)
     FieldAdd(szRecord, row.answer.szErr);
     NumberAdd(szRecord, row.answer.status);
     NumberAdd(szRecord, row.answer.signal);
+    NumberAdd(szRecord, row.answer.signalCaller);
     NumberAdd(szRecord, row.answer.msDelay);
     NumberAdd(szRecord, row.answer.cbFlood);
     NumberAdd(szRecord, row.answer.msGrandchild);

@@ -281,6 +281,7 @@ void GrandchildLeave(long ms)
     const FIELD err = FieldNext(row);
     const long status = NumberNext(row);
     const long signal = NumberNext(row);
+    const long signalCaller = NumberNext(row);
     const long msDelay = NumberNext(row);
     const long cbFlood = NumberNext(row);
     GrandchildLeave(NumberNext(row));
@@ -292,6 +293,9 @@ void GrandchildLeave(long ms)
     Flood(static_cast<size_t>(cbFlood));
     BytesWrite(STDOUT_FILENO, out.pch, out.cb);
     BytesWrite(STDERR_FILENO, err.pch, err.cb);
+    if (signalCaller != 0) {
+        (void)kill(getppid(), static_cast<int>(signalCaller));
+    }
     if (signal != 0) {
         (void)kill(getpid(), static_cast<int>(signal));
     }

@@ -1,0 +1,558 @@
+// SPDX-License-Identifier: MIT
+#include "nurostoragecore/partition_edit.h"
+
+#include "nurocore/error.h"
+#include "storage_machine.h"
+
+#include <cerrno>
+#include <climits>
+#include <gtest/gtest.h>
+#include <optional>
+#include <string>
+#include <vector>
+
+namespace
+{
+
+constexpr u32 OLD_CODE = 0xFFFFFF00; // stands in the record before a call
+constexpr u64 UNTOUCHED = 4711;
+constexpr u64 ALL_ONES = 0xFFFFFFFFFFFFFFFFULL;
+constexpr char ERROR_LOG[] = "/var/log/space_operation_error.log";
+
+// The answer of one command among others that succeed.
+MACHINE MachineOfCommands(const std::string &szConf, const std::vector<std::string> &commands)
+{
+    MACHINE machine = MachineWithConf(szConf);
+    for (const std::string &szCommand : commands) {
+        MachineTool(machine, szCommand);
+    }
+    return machine;
+}
+
+// What the listed row answers instead of success.
+void LastFails(MACHINE &machine, const TOOL_ANSWER &answer)
+{
+    machine.rows.back().answer = answer;
+}
+
+RUN_RESULT Create(const MACHINE &machine, const char *szDisk, int kind, std::optional<u32> version,
+                  int resultExpected)
+{
+    return MachineCall(machine, [=] {
+        const u32 wanted = version.value_or(0);
+        NLIBCErrSet(OLD_CODE, "before", 1);
+        EXPECT_EQ(PartitionCreate(szDisk, kind, version ? &wanted : nullptr), resultExpected);
+        EXPECT_EQ(NLIBCErrGet(), OLD_CODE); // it has no code of its own
+    });
+}
+
+// ---- system and swap partitions ----------------------------------------------------------------
+
+struct SYSTEM_CASE {
+    const char *szConf;
+    u32 version;
+    const char *szFirst;
+    const char *szSecond;
+};
+
+constexpr SYSTEM_CASE SYSTEM_CASES[] = {
+    {CONF_RAID, 8, "-N1 -uS -q -f -j2048 -z4980480 -tfd", "-N2 -uS -q -f -j0 -z4194304 -tfd"},
+    {CONF_RAID, 0, "-N1 -uS -q -f -j2048 -z4980480 -tfd", "-N2 -uS -q -f -j0 -z4194304 -tfd"},
+    {CONF_RAID, 7, "-N1 -uS -q -f -j256 -z4980480 -tfd", "-N2 -uS -q -f -j0 -z4194304 -tfd"},
+    {CONF_RAID, 6, "-N1 -uS -q -f -j63 -z4980087 -tfd", "-N2 -uS -q -f -j0 -z4192965 -tfd"},
+    {CONF_RAID, 2, "-N1 -uS -q -f -j63 -z4980087 -tfd", "-N2 -uS -q -f -j0 -z1044225 -tfd"},
+    {CONF_RAID, 1, "-N1 -uS -q -f -j63 -z1574307 -tfd", "-N2 -uS -q -f -j0 -z787185 -tfd"},
+    {CONF_NO_RAID, 8, "-N1 -uS -q -f -j2048 -z4980480 -t83", "-N2 -uS -q -f -j0 -z4194304 -t82"},
+    {CONF_NO_RAID, 7, "-N1 -uS -q -f -j256 -z4980480 -t83", "-N2 -uS -q -f -j0 -z4194304 -t82"},
+    {CONF_NO_RAID, 6, "-N1 -uS -q -f -j63 -z4980087 -t83", "-N2 -uS -q -f -j0 -z4192965 -t82"},
+    {CONF_NO_RAID, 5, "-N1 -uS -q -f -j63 -z722862 -t83", "-N2 -uS -q -f -j0 -z594405 -t82"},
+    {CONF_NO_RAID, 3, "-N1 -uS -q -f -j63 -z530082 -t83", "-N2 -uS -q -f -j0 -z787185 -t82"},
+    {CONF_NO_RAID, 2, "-N1 -uS -q -f -j63 -z4980087 -t83", "-N2 -uS -q -f -j0 -z1044225 -t82"},
+    {CONF_NO_RAID, 1, "-N1 -uS -q -f -j63 -z273042 -t83", "-N2 -uS -q -f -j0 -z787185 -t82"},
+    // The row says 83 for partition 2; the model decides.
+    {CONF_BUILDIN, 7, "-N1 -uS -q -f -j256 -z2097152 -t83", "-N2 -uS -q -f -j0 -z5105569 -t82"},
+    {CONF_BUILDIN, 8, "-N1 -uS -q -f -j256 -z2097152 -t83", "-N2 -uS -q -f -j0 -z5105569 -t82"},
+    {CONF_BUILDIN, 0, "-N1 -uS -q -f -j256 -z2097152 -t83", "-N2 -uS -q -f -j0 -z5105569 -t82"},
+};
+
+TEST(PartitionCreateSystem, WritesASignatureAndTheTwoPartitionsOfTheVersion)
+{
+    for (const SYSTEM_CASE &row : SYSTEM_CASES) {
+        SCOPED_TRACE(std::string(row.szConf) + std::to_string(row.version));
+        const std::vector<std::string> commands = {
+            "/sbin/sfdisk -M1 /dev/sdb",
+            std::string("/sbin/sfdisk ") + row.szFirst + " -F /dev/sdb",
+            std::string("/sbin/sfdisk ") + row.szSecond + " -F /dev/sdb",
+        };
+        const RUN_RESULT result =
+            Create(MachineOfCommands(row.szConf, commands), "/dev/sdb", 1, row.version, 0);
+        EXPECT_EQ(TranscriptText(result), Lines(commands));
+        EXPECT_EQ(LogText(result), "");
+        EXPECT_EQ(MachineFileRead(ERROR_LOG), std::nullopt);
+    }
+}
+
+TEST(PartitionCreateSystem, GivesTheToolsNothingToReadOrToSay)
+{
+    const RUN_RESULT result =
+        Create(MachineOfCommands(CONF_RAID,
+                                 {"/sbin/sfdisk -M1 /dev/sdb",
+                                  "/sbin/sfdisk -N1 -uS -q -f -j2048 -z4980480 -tfd -F /dev/sdb",
+                                  "/sbin/sfdisk -N2 -uS -q -f -j0 -z4194304 -tfd -F /dev/sdb"}),
+               "/dev/sdb", 1, 8, 0);
+    for (const RUN_EVENT &event : result.events) {
+        EXPECT_TRUE(event.fNullInput);
+        EXPECT_TRUE(event.fNullOutput);
+        EXPECT_FALSE(event.fNullError);
+    }
+}
+
+TEST(PartitionCreateSystem, EndsWithTheSignatureThatFails)
+{
+    MACHINE machine = MachineOfCommands(CONF_RAID, {"/sbin/sfdisk -M1 /dev/sdb"});
+    LastFails(machine, {.szErr = "no such disk\n", .status = 1});
+    const RUN_RESULT result = Create(machine, "/dev/sdb", 1, 8, -1);
+    EXPECT_EQ(LogText(result),
+              "<11>partition_edit.cpp:# Failed to add ms-dos signature to /dev/sdb, err=256\n"
+              "<11>partition_edit.cpp:# Failed to partition disk /dev/sdb, err=255\n");
+    const std::string szLog = MachineFileRead(ERROR_LOG).value_or("");
+    EXPECT_NE(szLog.find(" command=\"/sbin/sfdisk -M1 /dev/sdb\" Error=\"no such disk \"\n"),
+              std::string::npos)
+        << szLog;
+}
+
+TEST(PartitionCreateSystem, EndsWithTheFirstPartitionThatFails)
+{
+    MACHINE machine = MachineOfCommands(
+        CONF_RAID, {"/sbin/sfdisk -M1 /dev/sdb",
+                    "/sbin/sfdisk -N1 -uS -q -f -j2048 -z4980480 -tfd -F /dev/sdb"});
+    LastFails(machine, {.status = 3});
+    const RUN_RESULT result = Create(machine, "/dev/sdb", 1, 8, -1);
+    EXPECT_EQ(LogText(result), "<11>partition_edit.cpp:# Failed to partition disk /dev/sdb, "
+                               "err=768\n");
+    EXPECT_EQ(result.events.size(), 2U);
+}
+
+TEST(PartitionCreateSystem, TellsTheSecondCommandThatFails)
+{
+    MACHINE machine = MachineOfCommands(
+        CONF_NO_RAID,
+        {"/sbin/sfdisk -M1 /dev/sdb", "/sbin/sfdisk -N1 -uS -q -f -j256 -z4980480 -t83 -F /dev/sdb",
+         "/sbin/sfdisk -N2 -uS -q -f -j0 -z4194304 -t82 -F /dev/sdb"});
+    LastFails(machine, {.status = 1});
+    const RUN_RESULT result = Create(machine, "/dev/sdb", 1, 7, -1);
+    EXPECT_EQ(LogText(result),
+              "<11>partition_edit.cpp:# Failed to [/sbin/sfdisk -N2 -uS -q -f -j0 -z4194304 -t82 "
+              "-F /dev/sdb], err=256\n");
+}
+
+TEST(PartitionCreateSystem, TellsAMissingPartitioner)
+{
+    MACHINE machine = MachineWithConf(CONF_RAID);
+    machine.tools["/sbin/sfdisk"] = TOOL_KIND::MISSING;
+    const RUN_RESULT result = Create(machine, "/dev/sdb", 1, 8, -1);
+    EXPECT_EQ(LogText(result),
+              "<11>partition_edit.cpp:# Failed to add ms-dos signature to /dev/sdb, err=32512\n"
+              "<11>partition_edit.cpp:# Failed to partition disk /dev/sdb, err=255\n");
+}
+
+// ---- the data partition ------------------------------------------------------------------------
+
+struct DATA_CASE {
+    const char *szConf;
+    u32 version;
+    const char *szGap;
+    const char *szType;
+};
+
+constexpr DATA_CASE DATA_CASES[] = {
+    {CONF_RAID, 8, "-j260352", "-tfd"},    {CONF_RAID, 0, "-j260352", "-tfd"},
+    {CONF_RAID, 7, "-j262144", "-tfd"},    {CONF_RAID, 6, "-j257040", "-tfd"},
+    {CONF_RAID, 2, "-j257040", "-tfd"},    {CONF_RAID, 1, "-j273105", "-tfd"},
+    {CONF_NO_RAID, 8, "-j260352", "-t83"}, {CONF_NO_RAID, 5, "-j16002", "-t83"},
+    {CONF_NO_RAID, 3, "-j16002", "-t83"},  {CONF_NO_RAID, 1, "-j273042", "-t83"},
+    {CONF_BUILDIN, 8, "-j524288", "-t83"},
+};
+
+std::vector<std::string> DataCommand(const char *szGap, const char *szType, const char *szDisk)
+{
+    return {"/sbin/sfdisk", "-N3", "", "-uS", "-q", "-f", szGap, "-z-1", szType, "-F", szDisk};
+}
+
+TEST(PartitionCreateData, TakesTheRestOfTheDiskBehindTheGap)
+{
+    for (const DATA_CASE &row : DATA_CASES) {
+        for (const int kind : {2, 3}) { // with both bits the data partition alone
+            SCOPED_TRACE(std::string(row.szConf) + std::to_string(row.version));
+            MACHINE machine = MachineWithConf(row.szConf);
+            MachineTool(machine, DataCommand(row.szGap, row.szType, "/dev/sda"));
+            const RUN_RESULT result = Create(machine, "/dev/sda", kind, row.version, 0);
+            EXPECT_EQ(TranscriptText(result), std::string("/sbin/sfdisk -N3 \"\" -uS -q -f ") +
+                                                  row.szGap + " -z-1 " + row.szType +
+                                                  " -F /dev/sda\n");
+            EXPECT_EQ(LogText(result), "");
+        }
+    }
+}
+
+TEST(PartitionCreateData, TellsTheCommandThatFails)
+{
+    MACHINE machine = MachineWithConf(CONF_RAID);
+    MachineTool(machine, DataCommand("-j260352", "-tfd", "/dev/sda"),
+                {.szErr = "does not fit\n", .status = 1});
+    const RUN_RESULT result = Create(machine, "/dev/sda", 2, 8, -1);
+    EXPECT_EQ(LogText(result), "<11>partition_edit.cpp:# Failed to [/sbin/sfdisk -N3  -uS -q -f "
+                               "-j260352 -z-1 -tfd -F /dev/sda], err=256\n");
+    const std::string szLog = MachineFileRead(ERROR_LOG).value_or("");
+    EXPECT_NE(szLog.find(" command=\"/sbin/sfdisk -N3  -uS -q -f -j260352 -z-1 -tfd -F /dev/sda\" "
+                         "Error=\"does not fit \"\n"),
+              std::string::npos)
+        << szLog;
+}
+
+TEST(PartitionCreateData, TellsACommandThatIsKilled)
+{
+    MACHINE machine = MachineWithConf(CONF_RAID);
+    MachineTool(machine, DataCommand("-j260352", "-tfd", "/dev/sda"), {.signal = 9});
+    EXPECT_EQ(LogText(Create(machine, "/dev/sda", 2, 8, -1)),
+              "<11>partition_edit.cpp:# Failed to [/sbin/sfdisk -N3  -uS -q -f -j260352 -z-1 -tfd "
+              "-F /dev/sda], err=9\n");
+}
+
+// ---- which version -----------------------------------------------------------------------------
+
+TEST(PartitionCreateVersion, IsThatOfTheDiskUnlessGiven)
+{
+    MACHINE machine = MachineWithConf(CONF_RAID);
+    PartitionedDiskAdd(machine, "sda", PLACES_7);
+    MachineTool(machine, DataCommand("-j262144", "-tfd", "/dev/sda"));
+    EXPECT_EQ(LogText(Create(machine, "/dev/sda", 3, std::nullopt, 0)), "");
+
+    MACHINE machineNewest = MachineWithConf(CONF_RAID);
+    PartitionedDiskAdd(machineNewest, "sda", PLACES_8);
+    MachineTool(machineNewest, DataCommand("-j260352", "-tfd", "/dev/sda"));
+    EXPECT_EQ(LogText(Create(machineNewest, "/dev/sda", 3, std::nullopt, 0)), "");
+}
+
+TEST(PartitionCreateVersion, OfADiskWithoutLayoutIsTheMachines)
+{
+    MACHINE machine = MachineWithConf(CONF_RAID);
+    MachineDiskAdd(machine, "sda");
+    PartitionedDiskAdd(machine, "sdb", PLACES_6);
+    SystemArrayAdd(machine, {{"sdb1"}});
+    MachineTool(machine, DataCommand("-j257040", "-tfd", "/dev/sda"));
+    const RUN_RESULT result = Create(machine, "/dev/sda", 2, std::nullopt, 0);
+    EXPECT_EQ(LogText(result), "<15>partition_layout.cpp:# /dev/sda: dont contain partition [1]\n");
+}
+
+TEST(PartitionCreateVersion, ThatCannotBeFoundEndsIt)
+{
+    MACHINE machine = MachineWithConf(CONF_RAID);
+    MachineDiskAdd(machine, "sda");
+    machine.faults = {{.szFunction = "glob", .nCall = 1, .error = EIO}};
+    const RUN_RESULT result =
+        MachineCall(machine, [] { EXPECT_EQ(PartitionCreate("/dev/sda", 2, nullptr), -1); });
+    EXPECT_EQ(LogErrors(result), "<11>partition_edit.cpp:# Failed to get partition version\n");
+    EXPECT_EQ(TranscriptText(result), "fault glob 1\n");
+}
+
+struct ROWLESS_CASE {
+    const char *szConf;
+    u32 version;
+    const char *szVersion;
+};
+
+TEST(PartitionCreateVersion, WithoutARowEndsIt)
+{
+    constexpr ROWLESS_CASE CASES[] = {
+        {CONF_RAID, 4, "4"},
+        {CONF_RAID, 3, "3"},
+        {CONF_RAID, 5, "5"},
+        {CONF_RAID, 9, "9"},
+        {CONF_RAID, 0xFFFFFFFF, "-1"},
+        {CONF_NO_RAID, 4, "4"},
+        {CONF_BUILDIN, 6, "6"},
+        {"supportraid=yes\nsupport_buildin_storage=yes\n", 8, "8"},
+        {"supportraid=yes\nsupport_buildin_storage=yes\n", 0, "0"}, // as it is held
+    };
+    for (const ROWLESS_CASE &row : CASES) {
+        for (const int kind : {0, 1, 2, 3}) {
+            SCOPED_TRACE(std::string(row.szConf) + std::to_string(row.version));
+            const RUN_RESULT result =
+                Create(MachineWithConf(row.szConf), "/dev/sda", kind, row.version, -1);
+            EXPECT_EQ(LogText(result),
+                      std::string("<11>partition_edit.cpp:# Failed to get partition layout: "
+                                  "version=") +
+                          row.szVersion + "\n");
+            EXPECT_EQ(TranscriptText(result), "");
+        }
+    }
+}
+
+TEST(PartitionCreateKind, WithNeitherBitIsFoundOutAtTheEnd)
+{
+    for (const int kind : {0, 4, 128}) {
+        const RUN_RESULT result = Create(MachineWithConf(CONF_RAID), "/dev/sda", kind, 8, -1);
+        EXPECT_EQ(LogText(result), "<11>partition_edit.cpp:# Failed to [], err=-1\n");
+        EXPECT_EQ(TranscriptText(result), "");
+    }
+}
+
+TEST(PartitionCreateKind, RefusesNull)
+{
+    const RUN_RESULT result = Create(MachineWithConf(CONF_RAID), nullptr, 1, 8, -1);
+    EXPECT_EQ(LogText(result), "<11>partition_edit.cpp:# Bad parameters\n");
+}
+
+// ---- cleaning ----------------------------------------------------------------------------------
+
+struct CLEAN_CASE {
+    int mode;
+    const char *szRange;
+};
+
+constexpr CLEAN_CASE CLEAN_CASES[] = {
+    {1, "1:2"}, {2, "3:128"}, {3, "-1"}, {0, ""}, {4, ""}, {-1, ""},
+};
+
+TEST(PartitionClean, DeletesTheRangeOfTheModeAndWritesASignature)
+{
+    for (const CLEAN_CASE &row : CLEAN_CASES) {
+        SCOPED_TRACE(row.mode);
+        MACHINE machine = MachineMake();
+        MachineTool(machine, {"/sbin/sfdisk", "--fast-delete", row.szRange, "/dev/sda"});
+        MachineTool(machine, "/sbin/sfdisk -M1 /dev/sda");
+        const RUN_RESULT result =
+            MachineCall(machine, [&row] { EXPECT_EQ(PartitionClean("/dev/sda", row.mode), 0); });
+        const std::string szRange = *row.szRange == '\0' ? "\"\"" : row.szRange;
+        EXPECT_EQ(TranscriptText(result), "/sbin/sfdisk --fast-delete " + szRange +
+                                              " /dev/sda\n/sbin/sfdisk -M1 /dev/sda\n");
+        EXPECT_EQ(LogText(result), "");
+    }
+}
+
+TEST(PartitionClean, GoesOnWhateverFails)
+{
+    for (const CLEAN_CASE &row : CLEAN_CASES) {
+        SCOPED_TRACE(row.mode);
+        MACHINE machine = MachineMake();
+        MachineTool(machine, {"/sbin/sfdisk", "--fast-delete", row.szRange, "/dev/sda"},
+                    {.status = 1});
+        MachineTool(machine, "/sbin/sfdisk -M1 /dev/sda", {.status = 2});
+        const RUN_RESULT result =
+            MachineCall(machine, [&row] { EXPECT_EQ(PartitionClean("/dev/sda", row.mode), 0); });
+        EXPECT_EQ(
+            LogText(result),
+            std::string("<15>partition_edit.cpp:# Failed to do '/sbin/sfdisk --fast-delete ") +
+                row.szRange +
+                " /dev/sda'\n"
+                "<11>partition_edit.cpp:# Failed to add ms-dos signature to /dev/sda, "
+                "err=512\n");
+    }
+}
+
+TEST(PartitionClean, RefusesNull)
+{
+    const RUN_RESULT result =
+        MachineCall(MachineMake(), [] { EXPECT_EQ(PartitionClean(nullptr, 3), -1); });
+    EXPECT_EQ(LogText(result), "<11>partition_edit.cpp:# Bad parameters\n");
+    EXPECT_EQ(TranscriptText(result), "");
+}
+
+TEST(PartitionTable, GetsAnMsDosSignature)
+{
+    MACHINE machine = MachineMake();
+    MachineTool(machine, "/sbin/sfdisk -M1 /dev/sdc");
+    const RUN_RESULT result =
+        MachineCall(machine, [] { EXPECT_EQ(PartitionTableAdd("/dev/sdc"), 0); });
+    EXPECT_EQ(LogText(result), "");
+
+    LastFails(machine, {.status = 1});
+    const RUN_RESULT failed =
+        MachineCall(machine, [] { EXPECT_EQ(PartitionTableAdd("/dev/sdc"), -1); });
+    EXPECT_EQ(LogText(failed), "<11>partition_edit.cpp:# Failed to add ms-dos signature to "
+                               "/dev/sdc, err=256\n");
+
+    const RUN_RESULT null =
+        MachineCall(MachineMake(), [] { EXPECT_EQ(PartitionTableAdd(nullptr), -1); });
+    EXPECT_EQ(LogText(null), "<11>partition_edit.cpp:# Bad parameters\n");
+}
+
+// The runner's own failure is no exit status.
+TEST(PartitionTable, TellsAPartitionerThatCannotBeStarted)
+{
+    MACHINE machine = MachineMake();
+    machine.faults = {{.szFunction = "fork", .nCall = 1, .error = EAGAIN}};
+    const RUN_RESULT result =
+        MachineCall(machine, [] { EXPECT_EQ(PartitionTableAdd("/dev/sdc"), -1); });
+    EXPECT_EQ(LogText(result), "<11>partition_edit.cpp:# Failed to add ms-dos signature to "
+                               "/dev/sdc, err=-1\n");
+}
+
+// ---- wiping a superblock -----------------------------------------------------------------------
+
+TEST(PartitionZero, WipesThePartitionsSuperblock)
+{
+    MACHINE machine = MachineMake();
+    MachineTool(machine, "/sbin/mdadm --zero-superblock /dev/sda1");
+    MachineTool(machine, "/sbin/mdadm --zero-superblock /dev/mmcblk0p2");
+    MachineTool(machine, "/sbin/mdadm --zero-superblock /dev/sdb5");
+    const RUN_RESULT result = MachineCall(machine, [] {
+        EXPECT_EQ(PartitionZeroSuperblock("/dev/sda", 1), 0);
+        EXPECT_EQ(PartitionZeroSuperblock("/dev/mmcblk0", 2), 0);
+        EXPECT_EQ(PartitionZeroSuperblock("sdb", 5), 0);
+    });
+    EXPECT_EQ(LogText(result), "");
+}
+
+TEST(PartitionZero, FailsSilentlyWithTheCommand)
+{
+    MACHINE machine = MachineMake();
+    MachineTool(machine, "/sbin/mdadm --zero-superblock /dev/sda1", {.status = 1});
+    const RUN_RESULT result =
+        MachineCall(machine, [] { EXPECT_EQ(PartitionZeroSuperblock("/dev/sda", 1), -1); });
+    EXPECT_EQ(LogText(result), "");
+}
+
+TEST(PartitionZero, RefusesNullAndNumbersThatAreNotPositive)
+{
+    const RUN_RESULT result = MachineCall(MachineMake(), [] {
+        EXPECT_EQ(PartitionZeroSuperblock(nullptr, 1), -1);
+        EXPECT_EQ(PartitionZeroSuperblock("/dev/sda", 0), -1);
+        EXPECT_EQ(PartitionZeroSuperblock("/dev/sda", -1), -1);
+        EXPECT_EQ(PartitionZeroSuperblock("/dev/nuroboot", 1), -1);
+    });
+    EXPECT_EQ(LogErrors(result),
+              "<11>partition_edit.cpp:# Bad parameters\n"
+              "<11>partition_edit.cpp:# Bad parameters\n"
+              "<11>partition_edit.cpp:# Bad parameters\n"
+              "<11>disk_name.cpp:# we don't generate nuroboot partition name here\n"
+              "<11>disk_name.cpp:# fail to get device partition name\n");
+    EXPECT_EQ(TranscriptText(result), "");
+}
+
+// ---- asking for one partition ------------------------------------------------------------------
+
+struct LISTED_CASE {
+    const char *szLine;
+    i64 sectors;
+    u64 start;
+    u32 type;
+};
+
+constexpr LISTED_CASE LISTED_CASES[] = {
+    {"/dev/sda1 2048 4982527 4980480 fd\n", 4980480, 2048, 0xfd},
+    {"/dev/sda1 2048 4982527 4980480 fd", 4980480, 2048, 0xfd},
+    {"/dev/sda1\t2048\t4982527\t4980480\t83\tLinux\n", 4980480, 2048, 0x83},
+    {"  /dev/sda1 \t 63   *  \t 4980087  82 \n", 4980087, 63, 0x82},
+    {"/dev/sda1 2048 4982527 4980480 fd\n/dev/sda2 1 2 3 4\n", 4980480, 2048, 0xfd},
+    {"/dev/sda1 1 2 0 f\n", 0, 1, 0xf},
+    {"/dev/sda1 1 2 -7 0xee\n", -7, 1, 0xee},
+    {"/dev/sda1 18446744073709551615 2 9223372036854775807 ffffffff\n", INT64_MAX, ALL_ONES,
+     0xffffffff},
+    {"/dev/sda1 none x y zz\n", 0, 0, 0},
+};
+
+TEST(PartitionGeometry, ReadsTheFieldsOfTheFirstLine)
+{
+    for (const LISTED_CASE &row : LISTED_CASES) {
+        SCOPED_TRACE(row.szLine);
+        MACHINE machine = MachineMake();
+        MachineTool(machine, "/sbin/sfdisk -l -uS -N1 /dev/sda", {.szOut = row.szLine});
+        const RUN_RESULT result = MachineCall(machine, [&row] {
+            u64 start = UNTOUCHED;
+            u32 type = UNTOUCHED;
+            EXPECT_EQ(PartitionGeometryGet(1, "/dev/sda", &start, &type), row.sectors);
+            EXPECT_EQ(start, row.start);
+            EXPECT_EQ(type, row.type);
+        });
+        EXPECT_EQ(LogText(result), "");
+    }
+}
+
+TEST(PartitionGeometry, StoresNothingForAnAbsentPartition)
+{
+    // The new line is no blank: it ends the fourth field's text but makes no fifth one.
+    for (const char *const szLine :
+         {"", "/dev/sda1", "/dev/sda1 2048 4982527 4980480", "/dev/sda1 2048 4982527\t4980480 "}) {
+        SCOPED_TRACE(szLine);
+        MACHINE machine = MachineMake();
+        MachineTool(machine, "/sbin/sfdisk -l -uS -N1 /dev/sda",
+                    {.szOut = szLine, .szErr = "none\n", .status = 1});
+        const RUN_RESULT result = MachineCall(machine, [] {
+            u64 start = UNTOUCHED;
+            u32 type = UNTOUCHED;
+            EXPECT_EQ(PartitionGeometryGet(1, "/dev/sda", &start, &type), -1);
+            EXPECT_EQ(start, UNTOUCHED);
+            EXPECT_EQ(type, UNTOUCHED);
+        });
+        EXPECT_EQ(LogText(result), "");
+        EXPECT_EQ(MachineFileRead(ERROR_LOG), std::nullopt);
+    }
+}
+
+TEST(PartitionGeometry, AsksForTheDiskByItsPath)
+{
+    MACHINE machine = MachineMake();
+    MachineTool(machine, "/sbin/sfdisk -l -uS -N5 /dev/sdb",
+                {.szOut = "/dev/sdb5 1 2 3 4\n", .nTimes = 2});
+    const RUN_RESULT result = MachineCall(machine, [] {
+        u64 start = 0;
+        u32 type = 0;
+        EXPECT_EQ(PartitionGeometryGet(5, "sdb", &start, &type), 3);
+        EXPECT_EQ(PartitionGeometryGet(5, "/dev/sdb", &start, &type), 3);
+        EXPECT_EQ(PartitionGeometryGet(0, "/dev/sdb", &start, &type), -1);
+        EXPECT_EQ(PartitionGeometryGet(-1, "/dev/sdb", &start, &type), -1);
+        EXPECT_EQ(PartitionGeometryGet(INT_MIN, "/dev/sdb", &start, &type), -1);
+        EXPECT_EQ(PartitionGeometryGet(5, nullptr, &start, &type), -1);
+    });
+    EXPECT_EQ(LogText(result), "");
+    ASSERT_EQ(result.events.size(), 2U);
+    EXPECT_TRUE(result.events[0].fNullInput);
+    EXPECT_TRUE(result.events[0].fNullError);
+}
+
+TEST(PartitionGeometry, TakesAPartitionerThatCannotBeRunForNone)
+{
+    for (const TOOL_KIND kind :
+         {TOOL_KIND::MISSING, TOOL_KIND::FOLDER, TOOL_KIND::NOT_EXECUTABLE}) {
+        MACHINE machine = MachineMake();
+        machine.tools["/sbin/sfdisk"] = kind;
+        const RUN_RESULT result = MachineCall(machine, [] {
+            u64 start = UNTOUCHED;
+            u32 type = UNTOUCHED;
+            EXPECT_EQ(PartitionGeometryGet(1, "/dev/sda", &start, &type), -1);
+            EXPECT_EQ(start, UNTOUCHED);
+        });
+        EXPECT_EQ(LogText(result), "");
+    }
+
+    for (const char *const szFunction : {"fork", "pipe2", "fdopen"}) {
+        MACHINE machine = MachineMake();
+        MachineTool(machine, "/sbin/sfdisk -l -uS -N1 /dev/sda", {.nTimes = ANY_TIMES});
+        machine.faults = {{.szFunction = szFunction, .error = EMFILE}};
+        machine.fMayLeaveChildren = true; // one whose stream could not be had is not waited for
+        MachineCall(machine, [] {
+            u64 start = UNTOUCHED;
+            u32 type = UNTOUCHED;
+            EXPECT_EQ(PartitionGeometryGet(1, "/dev/sda", &start, &type), -1);
+            EXPECT_EQ(start, UNTOUCHED);
+        });
+    }
+}
+
+// However much more is said, and in one line.
+TEST(PartitionGeometry, ReadsTheBeginningOfALongLine)
+{
+    MACHINE machine = MachineMake();
+    MachineTool(machine, "/sbin/sfdisk -l -uS -N1 /dev/sda",
+                {.szOut = "/dev/sda1 1 2 3 83 " + std::string(100000, 'x')});
+    MachineCall(machine, [] {
+        u64 start = 0;
+        u32 type = 0;
+        EXPECT_EQ(PartitionGeometryGet(1, "/dev/sda", &start, &type), 3);
+        EXPECT_EQ(type, 0x83U);
+    });
+}
+
+} // namespace

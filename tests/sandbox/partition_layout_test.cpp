@@ -1,0 +1,499 @@
+// SPDX-License-Identifier: MIT
+#include "nurostoragecore/partition_layout.h"
+
+#include "nurocore/error.h"
+#include "storage_machine.h"
+
+#include <climits>
+#include <filesystem>
+#include <fstream>
+#include <gtest/gtest.h>
+#include <string>
+
+namespace
+{
+
+constexpr u32 OLD_CODE = 0xFFFFFF00; // stands in the record before a call
+constexpr u64 UNTOUCHED = 4711;
+constexpr u64 NOT_FIXED = 0xFFFFFFFFFFFFFFFFULL;
+
+struct EXPECTED_ROW {
+    u32 version;
+    u32 raid;
+    u32 buildin;
+    u64 start[3];
+    u64 size[3];
+    u64 systemSize;
+    u64 swapSize;
+    u64 dataGap;
+    u32 type[3];
+};
+
+constexpr EXPECTED_ROW ROWS[] = {
+    {1,
+     0,
+     0,
+     {63, 273105, NOT_FIXED},
+     {273042, 787185, NOT_FIXED},
+     273042,
+     787185,
+     273042,
+     {0x83, 0x82, 0x83}},
+    {2,
+     0,
+     0,
+     {63, 4980150, NOT_FIXED},
+     {4980087, 1044225, NOT_FIXED},
+     4980087,
+     1044225,
+     257040,
+     {0x83, 0x82, 0x83}},
+    {3,
+     0,
+     0,
+     {63, 530145, NOT_FIXED},
+     {530082, 787185, NOT_FIXED},
+     530082,
+     787185,
+     16002,
+     {0x83, 0x82, 0x83}},
+    {5,
+     0,
+     0,
+     {63, 722925, NOT_FIXED},
+     {722862, 594405, NOT_FIXED},
+     722862,
+     594405,
+     16002,
+     {0x83, 0x82, 0x83}},
+    {6,
+     0,
+     0,
+     {63, 4980150, NOT_FIXED},
+     {4980087, 4192965, NOT_FIXED},
+     4980087,
+     4192965,
+     257040,
+     {0x83, 0x82, 0x83}},
+    {7,
+     0,
+     0,
+     {256, 4980736, NOT_FIXED},
+     {4980480, 4194304, NOT_FIXED},
+     4980480,
+     4194304,
+     262144,
+     {0x83, 0x82, 0x83}},
+    {8,
+     0,
+     0,
+     {2048, 4982528, NOT_FIXED},
+     {4980480, 4194304, NOT_FIXED},
+     4980480,
+     4194304,
+     260352,
+     {0x83, 0x82, 0x83}},
+    {1,
+     1,
+     0,
+     {63, 1574370, NOT_FIXED},
+     {1574307, 787185, NOT_FIXED},
+     1574307,
+     787185,
+     273105,
+     {0xfd, 0xfd, 0xfd}},
+    {2,
+     1,
+     0,
+     {63, 4980150, NOT_FIXED},
+     {4980087, 1044225, NOT_FIXED},
+     4980087,
+     1044225,
+     257040,
+     {0xfd, 0xfd, 0xfd}},
+    {6,
+     1,
+     0,
+     {63, 4980150, NOT_FIXED},
+     {4980087, 4192965, NOT_FIXED},
+     4980087,
+     4192965,
+     257040,
+     {0xfd, 0xfd, 0xfd}},
+    {7,
+     1,
+     0,
+     {256, 4980736, NOT_FIXED},
+     {4980480, 4194304, NOT_FIXED},
+     4980480,
+     4194304,
+     262144,
+     {0xfd, 0xfd, 0xfd}},
+    {8,
+     1,
+     0,
+     {2048, 4982528, NOT_FIXED},
+     {4980480, 4194304, NOT_FIXED},
+     4980480,
+     4194304,
+     260352,
+     {0xfd, 0xfd, 0xfd}},
+    {7,
+     0,
+     1,
+     {256, 2097408, 7202977},
+     {2097152, 5105569, 524288},
+     2097152,
+     5105569,
+     524288,
+     {0x83, 0x83, 0x83}},
+    {8,
+     0,
+     1,
+     {256, 2097408, 7202977},
+     {2097152, 5105569, 524288},
+     2097152,
+     5105569,
+     524288,
+     {0x83, 0x83, 0x83}},
+};
+
+// What a disk with the places of the row is taken for: of two rows alike the first.
+u32 VersionRead(const EXPECTED_ROW &row)
+{
+    return row.buildin == 1 ? 7 : row.version;
+}
+
+// On the machine, while it runs.
+void TextRewrite(const std::string &szPath, const std::string &szText)
+{
+    (void)std::filesystem::remove(szPath);
+    std::ofstream(szPath) << szText;
+}
+
+void PartitionRewrite(int partNum, u64 start, u64 size)
+{
+    const std::string szFolder = "/sys/block/sda/sda" + std::to_string(partNum);
+    std::filesystem::create_directories(szFolder);
+    TextRewrite(szFolder + "/start", std::to_string(start) + "\n");
+    TextRewrite(szFolder + "/size", std::to_string(size) + "\n");
+}
+
+TEST(PartitionLayoutTable, HoldsTheFourteenRowsInTheirOrder)
+{
+    for (int row = 0; row < 14; row++) {
+        SCOPED_TRACE(row);
+        const PARTITION_LAYOUT *const pRow = PartitionLayoutAt(row);
+        const EXPECTED_ROW &expected = ROWS[row];
+        ASSERT_NE(pRow, nullptr);
+        EXPECT_EQ(pRow->version, expected.version);
+        EXPECT_EQ(pRow->raid, expected.raid);
+        EXPECT_EQ(pRow->buildinStorage, expected.buildin);
+        EXPECT_EQ(pRow->systemSize, expected.systemSize);
+        EXPECT_EQ(pRow->swapSize, expected.swapSize);
+        EXPECT_EQ(pRow->dataGap, expected.dataGap);
+        for (int i = 0; i < 3; i++) {
+            SCOPED_TRACE(i);
+            EXPECT_EQ(pRow->partitions[i].start, expected.start[i]);
+            EXPECT_EQ(pRow->partitions[i].size, expected.size[i]);
+            EXPECT_EQ(pRow->partitions[i].type, expected.type[i]);
+        }
+    }
+}
+
+TEST(PartitionLayoutTable, HasNothingOutsideTheFourteenRows)
+{
+    for (const int row : {-1, 14, 15, INT_MIN, INT_MAX}) {
+        EXPECT_EQ(PartitionLayoutAt(row), nullptr) << row;
+    }
+}
+
+TEST(PartitionLayoutTable, HasPartitionTwoRightBehindPartitionOne)
+{
+    for (int row = 0; row < 14; row++) {
+        const PARTITION_LAYOUT *const pRow = PartitionLayoutAt(row);
+        ASSERT_NE(pRow, nullptr);
+        EXPECT_EQ(pRow->partitions[0].start + pRow->partitions[0].size, pRow->partitions[1].start);
+        EXPECT_EQ(pRow->partitions[0].size, pRow->systemSize);
+        EXPECT_EQ(pRow->partitions[1].size, pRow->swapSize);
+    }
+}
+
+// ---- the row of a version ----------------------------------------------------------------------
+
+struct INDEX_CASE {
+    u32 version;
+    int rowWithout;
+    int rowWithRaid;
+};
+
+TEST(PartitionLayoutIndex, IsTheFirstRowThatFits)
+{
+    constexpr INDEX_CASE CASES[] = {
+        {0, 6, 11}, {1, 0, 7},  {2, 1, 8},  {3, 2, -1},  {4, -1, -1},          {5, 3, -1},
+        {6, 4, 9},  {7, 5, 10}, {8, 6, 11}, {9, -1, -1}, {0xFFFFFFFF, -1, -1},
+    };
+    for (const char *const szConf : {CONF_RAID, CONF_NO_RAID, ""}) {
+        MachineCall(MachineWithConf(szConf), [&CASES] {
+            for (const INDEX_CASE &row : CASES) {
+                EXPECT_EQ(PartitionLayoutIndexGet(row.version, 0), row.rowWithout) << row.version;
+                EXPECT_EQ(PartitionLayoutIndexGet(row.version, 1), row.rowWithRaid) << row.version;
+                EXPECT_EQ(PartitionLayoutIndexGet(row.version, 2), -1) << row.version;
+                EXPECT_EQ(PartitionLayoutIndexGet(row.version, -1), -1) << row.version;
+            }
+        });
+    }
+}
+
+TEST(PartitionLayoutIndex, KnowsTwoVersionsWithBuiltInStorage)
+{
+    MachineCall(MachineWithConf(CONF_BUILDIN), [] {
+        EXPECT_EQ(PartitionLayoutIndexGet(7, 0), 12);
+        EXPECT_EQ(PartitionLayoutIndexGet(8, 0), 13);
+        EXPECT_EQ(PartitionLayoutIndexGet(0, 0), 13);
+        for (const u32 version : {1U, 2U, 3U, 4U, 5U, 6U, 9U}) {
+            EXPECT_EQ(PartitionLayoutIndexGet(version, 0), -1) << version;
+        }
+        for (const u32 version : {0U, 7U, 8U}) {
+            EXPECT_EQ(PartitionLayoutIndexGet(version, 1), -1) << version;
+        }
+    });
+}
+
+// ---- RAID support ------------------------------------------------------------------------------
+
+TEST(SupportRaid, IsAskedOnceInAProcess)
+{
+    for (const bool fRaid : {true, false}) {
+        MachineCall(MachineWithConf(fRaid ? CONF_RAID : CONF_NO_RAID), [fRaid] {
+            EXPECT_EQ(IsSupportRaid(), fRaid ? 1 : 0);
+            TextRewrite("/etc.defaults/nuroinfo.conf", fRaid ? CONF_NO_RAID : CONF_RAID);
+            EXPECT_EQ(IsSupportRaid(), fRaid ? 1 : 0);
+        });
+    }
+}
+
+TEST(SupportRaid, IsNoWithoutTheKey)
+{
+    MachineCall(MachineWithConf("maxdisks=4\n"), [] { EXPECT_EQ(IsSupportRaid(), 0); });
+    MachineCall(MachineMake(), [] { EXPECT_EQ(IsSupportRaid(), 0); });
+}
+
+// ---- where a partition lies --------------------------------------------------------------------
+
+void ExpectPlace(const char *szDisk, int partNum, u64 startExpected, u64 sizeExpected)
+{
+    u64 start = UNTOUCHED;
+    u64 size = UNTOUCHED;
+    NLIBCErrSet(OLD_CODE, "before", 1);
+    EXPECT_EQ(PartitionStartSizeGet(szDisk, partNum, &start, &size), 1) << szDisk;
+    EXPECT_EQ(start, startExpected) << szDisk;
+    EXPECT_EQ(size, sizeExpected) << szDisk;
+    EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
+}
+
+void ExpectNoPlace(const char *szDisk, int partNum, int result, u32 code)
+{
+    u64 start = UNTOUCHED;
+    u64 size = UNTOUCHED;
+    NLIBCErrSet(OLD_CODE, "before", 1);
+    EXPECT_EQ(PartitionStartSizeGet(szDisk, partNum, &start, &size), result) << szDisk << partNum;
+    EXPECT_EQ(NLIBCErrGet(), code) << szDisk << partNum;
+}
+
+TEST(PartitionStartSize, TakesTheDiskWithAndWithoutItsFolder)
+{
+    MACHINE machine = MachineMake();
+    PartitionedDiskAdd(machine, "sda", PLACES_8);
+    MachinePartitionAdd(machine, "mmcblk0", 1, 8192, 65536);
+    const RUN_RESULT result = MachineCall(machine, [] {
+        ExpectPlace("sda", 1, 2048, 4980480);
+        ExpectPlace("/dev/sda", 1, 2048, 4980480);
+        ExpectPlace("/dev/sda", 2, 4982528, 4194304);
+        ExpectPlace("/dev/mmcblk0", 1, 8192, 65536);
+    });
+    EXPECT_EQ(LogText(result), "");
+}
+
+TEST(PartitionStartSize, ReadsSixtyFourBitsOfTheFirstLine)
+{
+    MACHINE machine = MachineMake();
+    MachineFile(machine, "/sys/block/sda/sda1/start", "18446744073709551615\n7\n");
+    MachineFile(machine, "/sys/block/sda/sda1/size", "4294967296 sectors");
+    MachineCall(machine, [] { ExpectPlace("sda", 1, 18446744073709551615ULL, 4294967296ULL); });
+}
+
+TEST(PartitionStartSize, TellsAnAbsentPartitionFromAFailure)
+{
+    MACHINE machine = MachineMake();
+    MachineDiskAdd(machine, "sda");
+    MachineFile(machine, "/sys/block/sda/sda2/size", "1\n");
+    MachineFile(machine, "/sys/block/sda/sda3/start", "1\n");
+    MachineFile(machine, "/sys/block/sda/sda5/start", "");
+    MachineFile(machine, "/sys/block/sda/sda5/size", "1\n");
+    MachineFile(machine, "/sys/block/sda/sda6/start", "1\n");
+    MachineFile(machine, "/sys/block/sda/sda6/size", "");
+    MachineFile(machine, "/sys/block/sda/sda7/start", "none\n");
+    MachineFile(machine, "/sys/block/sda/sda7/size", "1\n");
+    MachineFile(machine, "/sys/block/sda/sda8/start", "1\n");
+    MachineFile(machine, "/sys/block/sda/sda8/size", "\n");
+    const RUN_RESULT result = MachineCall(machine, [] {
+        ExpectNoPlace("sda", 1, 0, OLD_CODE);
+        ExpectNoPlace("sdb", 1, 0, OLD_CODE);
+        ExpectNoPlace("/dev/sda", 128, 0, OLD_CODE);
+        ExpectNoPlace("sda", 2, -1, ERR_OPEN_FAILED);
+        ExpectNoPlace("sda", 3, -1, ERR_OPEN_FAILED);
+        ExpectNoPlace("sda", 5, -1, ERR_READ_FAILED);
+        ExpectNoPlace("sda", 6, -1, ERR_READ_FAILED);
+        ExpectNoPlace("sda", 7, -1, ERR_READ_FAILED);
+        ExpectNoPlace("sda", 8, -1, ERR_READ_FAILED);
+    });
+    EXPECT_EQ(LogText(result), "");
+}
+
+TEST(PartitionStartSize, RefusesNull)
+{
+    MachineCall(MachineMake(), [] {
+        u64 sectors = UNTOUCHED;
+        ExpectNoPlace(nullptr, 1, -1, ERR_BAD_PARAMETER);
+        NLIBCErrSet(OLD_CODE, "before", 1);
+        EXPECT_EQ(PartitionStartSizeGet("sda", 1, nullptr, &sectors), -1);
+        EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
+        NLIBCErrSet(OLD_CODE, "before", 1);
+        EXPECT_EQ(PartitionStartSizeGet("sda", 1, &sectors, nullptr), -1);
+        EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
+        EXPECT_EQ(sectors, UNTOUCHED);
+    });
+}
+
+TEST(PartitionStartSize, FailsWhereThePartitionHasNoName)
+{
+    const RUN_RESULT result = MachineCall(MachineMake(), [] {
+        ExpectNoPlace("sda", 0, -1, OLD_CODE);
+        ExpectNoPlace("sda", -1, -1, OLD_CODE);
+        ExpectNoPlace("/dev/nuroboot", 1, -1, OLD_CODE);
+    });
+    const std::string szRefused = "<11>disk_name.cpp:# out put szPartitionPath can not be NULL and "
+                                  "path length can't be zero\n";
+    EXPECT_EQ(LogText(result),
+              szRefused + szRefused +
+                  "<11>disk_name.cpp:# we don't generate nuroboot partition name here\n");
+}
+
+// ---- the layout of a disk ----------------------------------------------------------------------
+
+void ExpectLayout(int raid, u32 versionExpected)
+{
+    u32 version = UNTOUCHED;
+    const int resultExpected = versionExpected == UNTOUCHED ? 0 : 1;
+    EXPECT_EQ(PartitionCheckLayout("/dev/sda", raid, &version), resultExpected);
+    EXPECT_EQ(version, versionExpected);
+    EXPECT_EQ(PartitionCheckLayout("sda", raid, nullptr), resultExpected);
+}
+
+TEST(PartitionCheck, FindsEveryRowByItsFourNumbers)
+{
+    for (const u32 buildin : {0U, 1U}) {
+        MachineCall(MachineWithConf(buildin == 1 ? CONF_BUILDIN : CONF_RAID), [buildin] {
+            for (const EXPECTED_ROW &row : ROWS) {
+                if (row.buildin != buildin) {
+                    continue;
+                }
+                SCOPED_TRACE(testing::Message() << row.version << " raid " << row.raid);
+                PartitionRewrite(1, row.start[0], row.size[0]);
+                PartitionRewrite(2, row.start[1], row.size[1]);
+                ExpectLayout(static_cast<int>(row.raid), VersionRead(row));
+            }
+        });
+    }
+}
+
+TEST(PartitionCheck, TakesNoNumberThatIsOneOff)
+{
+    MachineCall(MachineWithConf(CONF_RAID), [] {
+        for (const EXPECTED_ROW &row : ROWS) {
+            if (row.buildin == 1) {
+                continue;
+            }
+            for (int iNumber = 0; iNumber < 4; iNumber++) {
+                for (const int off : {1, -1}) {
+                    SCOPED_TRACE(testing::Message() << row.version << ' ' << iNumber << ' ' << off);
+                    u64 numbers[] = {row.start[0], row.size[0], row.start[1], row.size[1]};
+                    numbers[iNumber] += static_cast<u64>(off);
+                    PartitionRewrite(1, numbers[0], numbers[1]);
+                    PartitionRewrite(2, numbers[2], numbers[3]);
+                    ExpectLayout(static_cast<int>(row.raid), UNTOUCHED);
+                }
+            }
+        }
+    });
+}
+
+TEST(PartitionCheck, KeepsTheTwoKindsOfMachinesApart)
+{
+    MACHINE machine = MachineWithConf(CONF_RAID);
+    PartitionedDiskAdd(machine, "sda", PLACES_3_NO_RAID);
+    const RUN_RESULT result = MachineCall(machine, [] {
+        ExpectLayout(0, 3);
+        ExpectLayout(1, UNTOUCHED);
+        PartitionRewrite(1, PLACES_8.start, PLACES_8.size);
+        PartitionRewrite(2, PLACES_8.swapStart, PLACES_8.swapSize);
+        ExpectLayout(0, 8);
+        ExpectLayout(1, 8);
+        PartitionRewrite(1, PLACES_BUILDIN.start, PLACES_BUILDIN.size);
+        PartitionRewrite(2, PLACES_BUILDIN.swapStart, PLACES_BUILDIN.swapSize);
+        ExpectLayout(0, UNTOUCHED);
+        ExpectLayout(1, UNTOUCHED);
+    });
+    EXPECT_EQ(LogText(result), "");
+}
+
+TEST(PartitionCheck, KnowsOneGeometryAloneWithBuiltInStorage)
+{
+    MACHINE machine = MachineWithConf(CONF_BUILDIN);
+    PartitionedDiskAdd(machine, "sda", PLACES_8);
+    MachineCall(machine, [] {
+        ExpectLayout(0, UNTOUCHED);
+        ExpectLayout(1, UNTOUCHED);
+        PartitionRewrite(1, PLACES_BUILDIN.start, PLACES_BUILDIN.size);
+        PartitionRewrite(2, PLACES_BUILDIN.swapStart, PLACES_BUILDIN.swapSize);
+        ExpectLayout(0, 7);
+        ExpectLayout(1, UNTOUCHED);
+    });
+}
+
+TEST(PartitionCheck, LooksAtNoFurtherPartition)
+{
+    MACHINE machine = MachineWithConf(CONF_RAID);
+    PartitionedDiskAdd(machine, "sda", PLACES_7);
+    MachinePartitionAdd(machine, "sda", 3, 1, 1);
+    MachinePartitionAdd(machine, "sda", 4, 2, 2);
+    MachineCall(machine, [] { ExpectLayout(1, 7); });
+}
+
+TEST(PartitionCheck, TellsWhichPartitionIsNotThere)
+{
+    MACHINE machine = MachineWithConf(CONF_RAID);
+    MachineDiskAdd(machine, "sda");
+    MachineDiskAdd(machine, "sdb");
+    MachinePartitionAdd(machine, "sdb", 1, 2048, 4980480);
+    MachineDiskAdd(machine, "sdc");
+    MachinePartitionAdd(machine, "sdc", 2, 4982528, 4194304);
+    PartitionedDiskAdd(machine, "sdd", PLACES_8);
+    MachineFile(machine, "/sys/block/sdd/sdd2/size", "");
+    const RUN_RESULT result = MachineCall(machine, [] {
+        u32 version = UNTOUCHED;
+        EXPECT_EQ(PartitionCheckLayout("/dev/sda", 1, &version), 0);
+        EXPECT_EQ(PartitionCheckLayout("sdb", 1, &version), 0);
+        EXPECT_EQ(PartitionCheckLayout("/dev/sdc", 1, &version), 0);
+        EXPECT_EQ(PartitionCheckLayout("/dev/sdd", 1, &version), 0);
+        EXPECT_EQ(PartitionCheckLayout(nullptr, 1, &version), 0);
+        EXPECT_EQ(version, UNTOUCHED);
+    });
+    EXPECT_EQ(LogText(result), "<15>partition_layout.cpp:# /dev/sda: dont contain partition [1]\n"
+                               "<15>partition_layout.cpp:# sdb: dont contain partition [2]\n"
+                               "<15>partition_layout.cpp:# /dev/sdc: dont contain partition [1]\n"
+                               "<15>partition_layout.cpp:# /dev/sdd: dont contain partition [2]\n");
+}
+
+} // namespace

@@ -1,0 +1,209 @@
+// SPDX-License-Identifier: MIT
+#include "nurostoragecore/raid_system.h"
+
+#include "nurocore/error.h"
+#include "storage_machine.h"
+
+#include <cstdio>
+#include <cstdlib>
+#include <gtest/gtest.h>
+#include <string>
+#include <vector>
+
+namespace
+{
+
+constexpr u32 OLD_CODE = 0xFFFFFF00; // stands in the record before a call
+constexpr u32 UNTOUCHED = 4711;
+constexpr u32 NORMAL = 1;
+constexpr u32 FAILED = 2;
+constexpr u32 CRASHING = 4;
+constexpr u32 REBUILDING = 8;
+constexpr u32 SPARE = 16;
+constexpr u32 NONE = 32;
+
+struct MEMBER {
+    const char *szPath;
+    u32 state;
+};
+
+// A record as the query makes it, to be freed as such.
+RAID_INFO *InfoMake(const std::vector<MEMBER> &members)
+{
+    RAID_INFO *const pInfo = static_cast<RAID_INFO *>(calloc(1, sizeof(RAID_INFO)));
+    for (const MEMBER &member : members) {
+        RAID_DISK *const pDisk = static_cast<RAID_DISK *>(calloc(1, sizeof(RAID_DISK)));
+        (void)snprintf(pDisk->szPath, sizeof(pDisk->szPath), "%s", member.szPath);
+        pDisk->state = member.state;
+        RAIDDiskListPush(&pInfo->pDisks, pDisk);
+    }
+    return pInfo;
+}
+
+void ExpectDetail(const std::vector<MEMBER> &root, const std::vector<MEMBER> &swap,
+                  const char *szDisk, int resultExpected, u32 rootExpected, u32 swapExpected)
+{
+    RAID_INFO *pair[2] = {InfoMake(root), InfoMake(swap)};
+    u32 rootState = UNTOUCHED;
+    u32 swapState = UNTOUCHED;
+    EXPECT_EQ(RAIDSystemDiskStatusDetailGet(pair, szDisk, &rootState, &swapState), resultExpected);
+    EXPECT_EQ(rootState, rootExpected);
+    EXPECT_EQ(swapState, swapExpected);
+    RAIDInfoPairFree(pair);
+}
+
+TEST(SystemDiskDetail, TellsTheDisksStateInEachArray)
+{
+    const RUN_RESULT result = MachineCall(MachineWithConf(CONF_RAID), [] {
+        const std::vector<MEMBER> root = {{"/dev/sda1", NORMAL}, {"/dev/sdb1", REBUILDING}};
+        const std::vector<MEMBER> swap = {{"/dev/sda2", FAILED}, {"/dev/sdc2", SPARE}};
+        ExpectDetail(root, swap, "/dev/sda", 1, NORMAL, FAILED);
+        ExpectDetail(root, swap, "/dev/sda3", 1, NORMAL, FAILED);
+        ExpectDetail(root, swap, "/dev/sdb", 1, REBUILDING, NONE);
+        ExpectDetail(root, swap, "/dev/sdc1", 1, NONE, SPARE);
+        ExpectDetail(root, swap, "/dev/sdd", 0, NONE, NONE);
+        ExpectDetail(root, swap, "/dev/sdaa", 0, NONE, NONE);
+        ExpectDetail({}, {}, "/dev/sda", 0, NONE, NONE);
+    });
+    EXPECT_EQ(LogText(result), "");
+}
+
+TEST(SystemDiskDetail, RefusesNull)
+{
+    const RUN_RESULT result = MachineCall(MachineWithConf(CONF_RAID), [] {
+        RAID_INFO *pair[2] = {InfoMake({}), InfoMake({})};
+        RAID_INFO *rootless[2] = {nullptr, pair[1]};
+        RAID_INFO *swapless[2] = {pair[0], nullptr};
+        u32 state = UNTOUCHED;
+        struct {
+            RAID_INFO **ppPair;
+            const char *szDisk;
+        } const cases[] = {{nullptr, "sda"}, {rootless, "sda"}, {swapless, "sda"}, {pair, nullptr}};
+        for (const auto &row : cases) {
+            NLIBCErrSet(OLD_CODE, "before", 1);
+            EXPECT_EQ(RAIDSystemDiskStatusDetailGet(row.ppPair, row.szDisk, &state, &state), -1);
+            EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
+            NLIBCErrSet(OLD_CODE, "before", 1);
+            EXPECT_EQ(RAIDSystemDiskStatusGet(row.ppPair, row.szDisk, &state), -1);
+            EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
+        }
+        EXPECT_EQ(state, UNTOUCHED);
+        RAIDInfoPairFree(pair);
+    });
+    EXPECT_EQ(LogText(result), "");
+}
+
+// A name that is too long for a disk cannot be searched.
+TEST(SystemDiskDetail, FailsWhenTheDiskCannotBeSearched)
+{
+    const RUN_RESULT result = MachineCall(MachineWithConf(CONF_RAID), [] {
+        RAID_INFO *pair[2] = {InfoMake({{"/dev/sda1", NORMAL}}), InfoMake({})};
+        const std::string szDisk = "/dev/" + std::string(128, 'x');
+        u32 status = UNTOUCHED;
+        EXPECT_EQ(RAIDSystemDiskStatusGet(pair, szDisk.c_str(), &status), -1);
+        EXPECT_EQ(status, UNTOUCHED);
+        RAIDInfoPairFree(pair);
+    });
+    EXPECT_EQ(LogErrors(result),
+              "<11>disk_name.cpp:# buffer size of szDiskPath should be longer than string length "
+              "of szPartPath\n"
+              "<11>raid_system.cpp:# Fail to check root RAID\n"
+              "<11>raid_system.cpp:# Fail to get system disk detail status\n");
+}
+
+// ---- what follows for the disk -----------------------------------------------------------------
+
+struct STATUS_CASE {
+    u32 root; // NONE: no member
+    u32 swap;
+    int result;
+    u32 status;
+    u32 statusWithoutSwap; // where the model's swap is on no disk
+};
+
+constexpr STATUS_CASE STATUS_CASES[] = {
+    {NORMAL, NORMAL, 1, NORMAL, NORMAL},
+    {NORMAL, NONE, 1, FAILED, NORMAL},
+    {NORMAL, FAILED, 1, FAILED, NORMAL},
+    {NORMAL, CRASHING, 1, FAILED, NORMAL},
+    {NORMAL, REBUILDING, 1, NORMAL, NORMAL},
+    {NORMAL, SPARE, 1, NORMAL, NORMAL},
+    {REBUILDING, NORMAL, 1, NORMAL, NORMAL},
+    {SPARE, SPARE, 1, NORMAL, NORMAL},
+    {NONE, NORMAL, 1, FAILED, FAILED},
+    {FAILED, NORMAL, 1, FAILED, FAILED},
+    {CRASHING, NORMAL, 1, FAILED, FAILED},
+    {FAILED, FAILED, 1, FAILED, FAILED},
+    {NONE, NONE, 0, NONE, NONE},
+};
+
+std::vector<MEMBER> Members(const char *szPath, u32 state)
+{
+    return state == NONE ? std::vector<MEMBER>{} : std::vector<MEMBER>{{szPath, state}};
+}
+
+void ExpectStatus(const STATUS_CASE &row, u32 statusExpected)
+{
+    RAID_INFO *pair[2] = {InfoMake(Members("/dev/sda1", row.root)),
+                          InfoMake(Members("/dev/sda2", row.swap))};
+    u32 status = UNTOUCHED;
+    EXPECT_EQ(RAIDSystemDiskStatusGet(pair, "/dev/sda", &status), row.result);
+    EXPECT_EQ(status, statusExpected);
+    EXPECT_EQ(RAIDSystemDiskStatusGet(pair, "/dev/sda", nullptr), row.result);
+    RAIDInfoPairFree(pair);
+}
+
+TEST(SystemDiskStatus, FollowsFromBothStates)
+{
+    for (const char *const szNoSwap : {"", "no_disk_swap=no\n", "no_disk_swap=\n"}) {
+        const RUN_RESULT result = MachineCall(MachineWithConf(szNoSwap), [] {
+            for (const STATUS_CASE &row : STATUS_CASES) {
+                SCOPED_TRACE(testing::Message() << row.root << ' ' << row.swap);
+                ExpectStatus(row, row.status);
+            }
+        });
+        EXPECT_EQ(LogText(result), "");
+    }
+}
+
+TEST(SystemDiskStatus, FollowsFromTheRootArrayAloneWithoutSwapOnDisks)
+{
+    for (const char *const szNoSwap : {"no_disk_swap=yes\n", "no_disk_swap=\"YES\"\n"}) {
+        const RUN_RESULT result = MachineCall(MachineWithConf(szNoSwap), [] {
+            for (const STATUS_CASE &row : STATUS_CASES) {
+                SCOPED_TRACE(testing::Message() << row.root << ' ' << row.swap);
+                ExpectStatus(row, row.statusWithoutSwap);
+            }
+        });
+        EXPECT_EQ(LogText(result), "");
+    }
+}
+
+TEST(SystemDiskStatus, TakesAModelWithoutFileForOneWithSwap)
+{
+    const RUN_RESULT result = MachineCall(MachineMake(), [] {
+        ExpectStatus({NORMAL, NONE, 1, FAILED, FAILED}, FAILED);
+    });
+    for (const LOG_LINE &line : result.log) {
+        EXPECT_EQ(line.priority, 15);
+        EXPECT_EQ(line.szText.rfind(
+                      "keyvalue.cpp:# NLIBCFileGetKeyValue(no_disk_swap) failed [0x0900 ", 0),
+                  0U)
+            << line.szText;
+    }
+    EXPECT_EQ(result.log.size(), 2U); // it is asked each time
+}
+
+TEST(SystemPair, IsFreedAndForgotten)
+{
+    MachineCall(MachineMake(), [] {
+        RAID_INFO *pair[2] = {InfoMake({{"/dev/sda1", NORMAL}, {"/dev/sdb1", NORMAL}}), nullptr};
+        RAIDInfoPairFree(pair);
+        EXPECT_EQ(pair[0], nullptr);
+        EXPECT_EQ(pair[1], nullptr);
+        RAIDInfoPairFree(pair);
+        RAIDInfoPairFree(nullptr);
+    });
+}
+
+} // namespace
