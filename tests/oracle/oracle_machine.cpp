@@ -41,6 +41,7 @@ struct PLAN {
     bool fDualHead = false;
     bool fRaid = false;
     bool fBuiltin = false;
+    bool fCrowded = false; // more disks than the buffers of the command lines were made for
     vector<PLACE> places{};
 };
 
@@ -85,7 +86,7 @@ string NameMake(DICE &dice, ROLE role)
 
 void PlacesMake(DICE &dice, PLAN &plan)
 {
-    if (Chance(dice, 1)) {
+    if (plan.fCrowded) {
         for (char letter = 'a'; letter <= 'z'; letter++) {
             plan.places.push_back({string("sd") + letter, ROLE_INTERNAL});
         }
@@ -230,7 +231,7 @@ void ConfMake(DICE &dice, const PLAN &plan, ORACLE_MACHINE &machine)
         AnswerLine(dice, "supportraid", plan.fRaid),
         AnswerLine(dice, "support_buildin_storage", plan.fBuiltin),
         AnswerLine(dice, "support_dual_head", plan.fDualHead),
-        NumberLine(dice, "max_sys_raid_disks", 40),
+        plan.fCrowded ? "max_sys_raid_disks=30\n" : NumberLine(dice, "max_sys_raid_disks", 40),
         NumberLine(dice, "maxdisks", 6),
         SplitLine(dice),
     };
@@ -385,8 +386,10 @@ ORACLE_LAYOUT LayoutPick(DICE &dice, const PLAN &plan)
     vector<ORACLE_LAYOUT> fitting;
     for (const ORACLE_LAYOUT &row : OracleLayouts()) {
         const bool fOwn = (row.raid == 1) == plan.fRaid && (row.builtin == 1) == plan.fBuiltin;
-        // The oldest layout is a rule of its own, and one that only machines with RAID have.
-        const int weight = (fOwn ? 4 : 1) * (row.version >= 6 ? 3 : row.version == 1 ? 2 : 1);
+        // The oldest layout with RAID is the only one that a machine without it takes for known
+        // when it decides about a disk, and for unknown when it looks for an array.
+        const bool fOldest = row.version == 1 && row.raid == 1;
+        const int weight = fOldest ? 8 : (fOwn ? 4 : 1) * (row.version >= 6 ? 3 : 1);
         fitting.insert(fitting.end(), static_cast<size_t>(weight), row);
     }
     return Pick(dice, fitting);
@@ -674,12 +677,17 @@ ORACLE_CASE OracleCaseMake(std::uint64_t seed)
     plan.fDualHead = Chance(dice, 20);
     plan.fRaid = Chance(dice, 70);
     plan.fBuiltin = Chance(dice, plan.fRaid ? 6 : 30);
+    plan.fCrowded = Chance(dice, 1);
     PlacesMake(dice, plan);
     ConfMake(dice, plan, made.machine);
     HostsMake(dice, plan, made.machine);
     DisksMake(dice, plan, made.machine);
     SystemArrayMake(dice, made.machine);
     MarkersMake(dice, made.machine);
+    if (plan.fCrowded && Chance(dice, 70)) {
+        made.machine.markers.insert(ORACLE_MARKER_FORCE);
+        made.words = {"initsys-dd"};
+    }
     FaultsMake(dice, made.machine);
     KillMake(dice, made);
     return made;
