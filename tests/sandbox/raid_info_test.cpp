@@ -416,7 +416,7 @@ TEST(ComponentSize, WordsAreReadWithCommentsAndQuotes)
 
 TEST(ComponentSize, WordsMayBeLong)
 {
-    for (const size_t cb : {98, 99, 100, 101, 102, 199, 200, 201, 1000, 5000}) {
+    for (const size_t cb : {98U, 99U, 100U, 101U, 102U, 199U, 200U, 201U, 1000U, 5000U}) {
         const std::string szLong(cb, 'x');
         ExpectDevicesRead(
             {"a long word between", "Block devices:\n254 " + szLong + " mdp\n", PARTITIONABLE});
