@@ -448,7 +448,7 @@ struct STAT_TIME_64 {
 WRAP_IOCTL(__ioctl_time64)
 WRAP_FSTAT(__fstat64_time64, STAT_TIME_64)
 WRAP_NANOSLEEP(__nanosleep64, TIMESPEC_64)
-WRAP_CLOCK_NANOSLEEP(__clock_nanosleep64, TIMESPEC_64)
+WRAP_CLOCK_NANOSLEEP(__clock_nanosleep_time64, TIMESPEC_64)
 #endif
 
 // ---- calls that can be made to fail ------------------------------------------------------------
