@@ -12,8 +12,8 @@
 // a block is moved by copying, and all sizes are the same on 32-bit and 64-bit machines.
 //
 // What holds between two calls:
-//   - 24 + 4 * nItem + nFree + (nSize - EndofFree) == nSize, less the dead bytes of strings that
-//     were removed or replaced (nFree does not count them; the next growth drops them);
+//   - 24 + 4 * nItem + nFree + (nSize - EndofFree) == nSize; the bytes of strings that were removed
+//     or replaced are dead, but count as strings until the next growth drops them;
 //   - the last byte of the block is 0; a slot that holds its offset is empty. The first string
 //     stored ends in that byte, so a first string of length 0 is an empty slot by identity.
 #include "nurocore/szlist.h"

@@ -85,6 +85,9 @@ u32 VersionOfDisks(const NLIBSZLIST *pDisks, int fChooseBiggest)
 
 int VersionWithoutArray(u32 *pVersion, int fChooseBiggest)
 {
+    // Before the disks are looked for: a lookup that fails leaves its code in the last-error
+    // record, and callers print what stands there in the end.
+    (void)IsSupportRaid();
     PNLIBSZLIST pDisks = NLIBCSzListAlloc(LIST_SIZE);
     const LIST_OWNER owner(&pDisks);
     if (pDisks == nullptr) {
