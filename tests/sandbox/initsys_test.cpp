@@ -300,16 +300,23 @@ TEST(InitsysDecides, ToUpgradeSevenToEightWithItsData)
                                              DecideAndRenewText("sda", RANGE_SYSTEM));
 }
 
-// A seven that holds data makes seven the wanted layout.
+struct STAY_CASE {
+    DISK_PLACES places;
+    SYSTEM_PARTITIONS made;
+};
+
+// An old layout that holds data is the wanted one, on new disks too.
 TEST(InitsysDecides, ToStayWithTheLayoutOfTheData)
 {
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    KnownDiskRenew(machine, "sda", PLACES_7, RANGE_SYSTEM, MADE_7);
-    SuperblockExpect(machine, "sda3", 2);
-    BlankDiskAdd(machine, "sdb");
-    RenewExpect(machine, "sdb", RANGE_ALL, MADE_7);
-    ArraysExpect(machine, ArrayCommands({"sda", "sdb"}, "-n4", " missing missing"));
-    EXPECT_EQ(MachineRun(machine, {"initsys"}).status, 0);
+    for (const STAY_CASE &row : {STAY_CASE{PLACES_7, MADE_7}, STAY_CASE{PLACES_6, MADE_6}}) {
+        MACHINE machine = MachineWithConf(CONF_RAID);
+        KnownDiskRenew(machine, "sda", row.places, RANGE_SYSTEM, row.made);
+        SuperblockExpect(machine, "sda3", 2);
+        BlankDiskAdd(machine, "sdb");
+        RenewExpect(machine, "sdb", RANGE_ALL, row.made);
+        ArraysExpect(machine, ArrayCommands({"sda", "sdb"}, "-n4", " missing missing"));
+        EXPECT_EQ(MachineRun(machine, {"initsys"}).status, 0);
+    }
 }
 
 TEST(InitsysDecides, ToWipeAnOlderLayoutWithoutArray)
