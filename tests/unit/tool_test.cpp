@@ -1,0 +1,127 @@
+// SPDX-License-Identifier: MIT
+//
+// What the command layer does with values that no machine gives it: its source is compiled in here,
+// with its entry point renamed.
+#include <gtest/gtest.h>
+
+int ArrayctlMain(int argc, char *argv[]);
+
+#define main ArrayctlMain
+#include "../../tool/arrayctl.cpp"
+#undef main
+
+namespace
+{
+
+RAID_DISK Member(const char *szPath, u32 state, RAID_DISK *pNext)
+{
+    RAID_DISK disk = {};
+    (void)snprintf(disk.szPath, sizeof(disk.szPath), "%s", szPath);
+    disk.state = state;
+    disk.pNext = pNext;
+    return disk;
+}
+
+std::string Printed(const RAID_INFO &info)
+{
+    testing::internal::CaptureStdout();
+    ReportPrint(info);
+    (void)fflush(stdout);
+    return testing::internal::GetCapturedStdout();
+}
+
+RAID_INFO Info(u32 level, u32 status, u32 rebuild, u64 arraySize, RAID_DISK *pDisks)
+{
+    RAID_INFO info = {};
+    (void)snprintf(info.szPath, sizeof(info.szPath), "/dev/md2");
+    info.level = level;
+    info.status = status;
+    info.rebuild.state = rebuild;
+    info.arraySize = arraySize;
+    info.pDisks = pDisks;
+    return info;
+}
+
+TEST(Report, UnknownMemberStateRepeatsTheWordBefore)
+{
+    RAID_DISK last = Member("/dev/sda3", 64, nullptr);
+    RAID_DISK middle = Member("/dev/sdb3", 1, &last);
+    RAID_DISK first = Member("/dev/sdc3", 0, &middle);
+    EXPECT_EQ(Printed(Info(4, 1, 0, 1048575, &first)),
+              "/dev/md2 is running, status: NORMAL, rebuilding: None\n"
+              "Device level: RAID 5\n"
+              "Device size: 0 MB (1048575 bytes) \n"
+              "Disk: \n"
+              "\t [/dev/sdc3: ]\n"
+              "\t [/dev/sdb3: Normal]\n"
+              "\t [/dev/sda3: Normal]\n"
+              "\n");
+}
+
+TEST(Report, UnknownMemberStateRepeatsACutWordToo)
+{
+    RAID_DISK last = Member("/dev/sda3", 3, nullptr);
+    RAID_DISK first = Member("/dev/sdb3", 4, &last);
+    EXPECT_EQ(Printed(Info(2, 4, 2, 0, &first)),
+              "/dev/md2 is running, status: CRASHED, rebuilding: Waiting...\n"
+              "Device level: RAID 1\n"
+              "Device size: 0 MB (0 bytes) \n"
+              "Disk: \n"
+              "\t [/dev/sdb3: Failed(Which ma]\n"
+              "\t [/dev/sda3: Failed(Which ma]\n"
+              "\n");
+}
+
+TEST(Report, UnknownValuesHaveNoWord)
+{
+    EXPECT_EQ(Printed(Info(3, 8, 3, 18446744073709551615ULL, nullptr)),
+              "/dev/md2 is running, status: , rebuilding: \n"
+              "Device level: \n"
+              "Device size: 17592186044415 MB (18446744073709551615 bytes) \n"
+              "Disk: \n"
+              "\n");
+}
+
+TEST(Report, AMemberThatIsNoneIsPrintedAsSuch)
+{
+    RAID_DISK only = Member("/dev/sda3", 32, nullptr);
+    EXPECT_EQ(Printed(Info(32, 2, 1, 1048576, &only)),
+              "/dev/md2 is running, status: DEGRADE, rebuilding: Progressing...[\n"
+              "Device level: JBOD\n"
+              "Device size: 1 MB (1048576 bytes) \n"
+              "Disk: \n"
+              "\t [/dev/sda3: None]\n"
+              "\n");
+}
+
+TEST(SystemRaidCreate, NeedsADeviceAndMembers)
+{
+    EXPECT_EQ(SystemRaidCreate(nullptr, 1, 4, "/dev/sda1 "), -1);
+    EXPECT_EQ(SystemRaidCreate("/dev/md0", 1, 4, nullptr), -1);
+}
+
+TEST(DiskFormatType, WithoutANameThereIsNothingToDo)
+{
+    EXPECT_EQ(DiskFormatTypeGet(nullptr, 8), 0);
+}
+
+// The option goes by the length of the path that is given.
+TEST(SystemRaidCreate, OldSuperblocksAreForTheSystemArrays)
+{
+    EXPECT_STREQ(MetadataOption("/dev/md0"), "-e 0.9");
+    EXPECT_STREQ(MetadataOption("/dev/md1"), "-e 0.9");
+    EXPECT_STREQ(MetadataOption("/dev/md"), "-e 0.9");
+    EXPECT_STREQ(MetadataOption("/dev/md2"), "");
+    EXPECT_STREQ(MetadataOption("/dev/md10"), "");
+}
+
+TEST(EntryPoint, WithoutAnyArgumentItPrintsTheUsage)
+{
+    testing::internal::CaptureStdout();
+    EXPECT_EQ(ArrayctlMain(0, nullptr), 1);
+    EXPECT_EQ(testing::internal::GetCapturedStdout(),
+              "usage:\n\tarrayctl destroy <RAID ID> \n\tarrayctl status <RAID ID> \n\tarrayctl "
+              "newvol \n\tarrayctl initsys \n\tarrayctl initsys-dd \n");
+}
+
+} // namespace
