@@ -112,12 +112,17 @@ struct MACHINE_DEVICE_SIZE {
 
 // The n-th call of a libc function fails with an errno; with fGoOn every later one too. Counted in
 // each process by itself, and told in the transcript as "fault NAME N". What can be made to fail is
-// the table in harness/interpose.cpp.
+// the table in harness/interpose.cpp; the function "*" is every one of them.
+//
+// A fault of one process counts that one's calls only: "0" is the program, "0.2" the second process
+// that it forked, "0.2.1" the first one of that; told as "fault NAME N PROCESS OBJECT" in one word
+// after the name. What goes on failing does so in what the process forks from then on.
 struct MACHINE_FAULT {
     std::string szFunction = {};
     int nCall = 1;
     int error = 12;
     bool fGoOn = false;
+    std::string szProcess = "*";
 };
 
 struct MACHINE {
@@ -133,6 +138,7 @@ struct MACHINE {
     std::map<std::string, std::string> environment = {{"PATH", "/sbin:/bin"}};
     std::string szInput = "the terminal\n"; // standard input of the program: never /dev/null
     bool fRealSleep = false;                // sleeps are told in the transcript and slept too
+    bool fCallsTold = false;                // calls that can be made to fail, see MachineCalls
     bool fNoLog = false;                    // no /dev/log
     bool fMayLeaveChildren = false;
     int msBound = 10000;
@@ -233,6 +239,10 @@ RUN_RESULT MachineTryAgain(const MACHINE &machine, const std::vector<std::string
 // Lays the machine out and runs the body in a process of its own inside it, beside the libraries.
 // EXPECT and ASSERT failures of the body fail the test. What the body prints is in szOut.
 RUN_RESULT MachineCall(const MACHINE &machine, const std::function<void()> &body);
+
+// After a run of a machine with fCallsTold: each call that can be made to fail, in order within its
+// process, as "PROCESS FUNCTION OBJECT".
+std::vector<std::string> MachineCalls();
 
 // The text of a file of the machine after a run; none when it is not there.
 std::optional<std::string> MachineFileRead(const std::string &szPath);

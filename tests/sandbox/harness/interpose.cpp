@@ -10,6 +10,8 @@
 #include "wire.h"
 
 #include <cerrno>
+#include <csignal>
+#include <cstdarg>
 #include <cstdint>
 #include <cstdio>
 #include <cstdlib>
@@ -24,6 +26,7 @@
 #include <linux/types.h>
 #include <mntent.h>
 #include <sys/ioctl.h>
+#include <sys/resource.h>
 #include <sys/stat.h>
 #include <sys/syscall.h>
 #include <sys/sysmacros.h>
@@ -68,8 +71,21 @@ struct FAULT {
     int nCall;
     int error;
     bool fGoOn;
+    const char *szProcess;
     int nSeen;
 };
+
+// Which file a stream was opened on, so that a failed read can be told by its file.
+struct STREAM_NAME {
+    const FILE *pStream;
+    char szPath[96];
+};
+
+constexpr size_t STREAM_NAMES = 16;
+constexpr size_t PROCESS_NAME_SIZE = 32;
+constexpr char ANY_CALL[] = "*";
+constexpr char ANY_PROCESS[] = "*";
+constexpr char NO_OBJECT[] = "-";
 
 char g_achDriver[DRIVER_SIZE];
 DEVICE g_devices[DEVICES];
@@ -78,6 +94,13 @@ FAULT g_faults[FAULTS];
 size_t g_nFault = 0;
 bool g_fActive = false;
 bool g_fRealSleep = false;
+bool g_fCallsTold = false;
+STREAM_NAME g_streamNames[STREAM_NAMES];
+size_t g_nStreamName = 0;
+
+// "0" is the program, "0.2" the second process that it forked, "0.2.1" the first one of that.
+char g_szProcess[PROCESS_NAME_SIZE] = "0";
+int g_nFork = 0;
 
 // ---- the driver file ---------------------------------------------------------------------------
 
@@ -158,6 +181,7 @@ void FaultTake(READER reader)
     fault.nCall = WordNext(reader);
     fault.error = WordNext(reader);
     fault.fGoOn = WordNext(reader) != 0;
+    fault.szProcess = TextNext(reader);
     fault.nSeen = 0;
 }
 
@@ -178,6 +202,8 @@ bool DriverRead()
             DeviceTake(record);
         } else if (strcmp(szKind, "fault") == 0) {
             FaultTake(record);
+        } else if (strcmp(szKind, "calls") == 0) {
+            g_fCallsTold = true;
         } else {
             g_fRealSleep = true;
         }
@@ -187,6 +213,15 @@ bool DriverRead()
 
 // ---- records of the transcript -----------------------------------------------------------------
 
+void FileAppend(const char *szFile, const char *pch, int cb)
+{
+    const long fd = syscall(SYS_openat, AT_FDCWD, szFile, O_WRONLY | O_APPEND | O_CLOEXEC);
+    if (fd >= 0) {
+        (void)syscall(SYS_write, fd, pch, static_cast<size_t>(cb));
+        (void)syscall(SYS_close, fd);
+    }
+}
+
 void EventRecord(const char *szKind, const char *szWord, const char *szMore)
 {
     char ach[256] = "";
@@ -194,31 +229,92 @@ void EventRecord(const char *szKind, const char *szWord, const char *szMore)
                             strlen(szWord), szWord, strlen(szMore), szMore);
     char achRecord[320] = "";
     const int cbRecord = snprintf(achRecord, sizeof(achRecord), "%d:%s", cb, ach);
-    const long fd = syscall(SYS_openat, AT_FDCWD, WIRE_TRANSCRIPT, O_WRONLY | O_APPEND | O_CLOEXEC);
-    if (fd >= 0) {
-        (void)syscall(SYS_write, fd, achRecord, static_cast<size_t>(cbRecord));
-        (void)syscall(SYS_close, fd);
+    FileAppend(WIRE_TRANSCRIPT, achRecord, cbRecord);
+}
+
+// A fault of one process alone tells what its call was about, too.
+void FaultRecord(const FAULT &fault, const char *szFunction, const char *szObject)
+{
+    char szSeen[16] = "";
+    snprintf(szSeen, sizeof(szSeen), "%d", fault.nSeen);
+    if (strcmp(fault.szProcess, ANY_PROCESS) == 0) {
+        EventRecord(WIRE_FAULT, szFunction, szSeen);
+        return;
     }
+    char szWhere[160] = "";
+    snprintf(szWhere, sizeof(szWhere), "%s %s %s", szSeen, g_szProcess, szObject);
+    EventRecord(WIRE_FAULT, szFunction, szWhere);
+}
+
+void CallTell(const char *szFunction, const char *szObject)
+{
+    char szLine[192] = "";
+    const int cb =
+        snprintf(szLine, sizeof(szLine), "%s %s %s\n", g_szProcess, szFunction, szObject);
+    FileAppend(WIRE_CALLS, szLine, cb);
+}
+
+// What has begun to fail goes on in the processes that are forked later.
+bool IsCounted(const FAULT &fault, const char *szFunction)
+{
+    return (strcmp(fault.szFunction, ANY_CALL) == 0 || strcmp(fault.szFunction, szFunction) == 0) &&
+           (strcmp(fault.szProcess, ANY_PROCESS) == 0 ||
+            strcmp(fault.szProcess, g_szProcess) == 0 ||
+            (fault.fGoOn && fault.nSeen >= fault.nCall));
 }
 
 // True when this call is the one that has to fail; errno is set then.
-bool FaultIsDue(const char *szFunction)
+bool FaultIsDue(const char *szFunction, const char *szObject = NO_OBJECT)
 {
+    const int errnoAtEntry = errno;
+    if (g_fActive && g_fCallsTold) {
+        CallTell(szFunction, szObject);
+    }
     for (size_t i = 0; i < g_nFault; i++) {
         FAULT &fault = g_faults[i];
-        if (!g_fActive || strcmp(fault.szFunction, szFunction) != 0) {
+        if (!g_fActive || !IsCounted(fault, szFunction)) {
             continue;
         }
         fault.nSeen++;
         if (fault.nSeen == fault.nCall || (fault.fGoOn && fault.nSeen > fault.nCall)) {
-            char szSeen[16] = "";
-            snprintf(szSeen, sizeof(szSeen), "%d", fault.nSeen);
-            EventRecord(WIRE_FAULT, szFunction, szSeen);
+            FaultRecord(fault, szFunction, szObject);
             errno = fault.error;
             return true;
         }
     }
+    errno = errnoAtEntry;
     return false;
+}
+
+// ---- names of streams and processes ------------------------------------------------------------
+
+FILE *StreamName(FILE *pStream, const char *szPath)
+{
+    if (g_fActive && pStream != nullptr) {
+        STREAM_NAME &name = g_streamNames[g_nStreamName++ % STREAM_NAMES];
+        name.pStream = pStream;
+        snprintf(name.szPath, sizeof(name.szPath), "%s", szPath);
+    }
+    return pStream;
+}
+
+// The newest name counts: a stream's address is used again.
+const char *NameOf(const FILE *pStream)
+{
+    for (size_t n = g_nStreamName; n > 0 && n + STREAM_NAMES > g_nStreamName; n--) {
+        const STREAM_NAME &name = g_streamNames[(n - 1) % STREAM_NAMES];
+        if (name.pStream == pStream) {
+            return name.szPath;
+        }
+    }
+    return NO_OBJECT;
+}
+
+void ProcessNameExtend()
+{
+    const size_t cch = strlen(g_szProcess);
+    snprintf(g_szProcess + cch, sizeof(g_szProcess) - cch, ".%d", g_nFork);
+    g_nFork = 0;
 }
 
 // ---- the next in line --------------------------------------------------------------------------
@@ -340,6 +436,7 @@ void InterposeActivate()
     g_nDevice = 0;
     g_nFault = 0;
     g_fRealSleep = false;
+    g_fCallsTold = false;
     g_fActive = DriverRead();
 }
 
@@ -352,18 +449,37 @@ void InterposeDeactivate()
 // the headers cannot clash with these.
 #define VISIBLE extern "C" __attribute__((visibility("default")))
 
-#define WRAP_AS(szName, symbol, type, failure, parameters, arguments)                              \
+// szObject is what the call is about, for the record.
+#define WRAP_CALL(szName, szObject, symbol, type, failure, parameters, arguments)                  \
     VISIBLE type Wrap_##symbol parameters __asm__(#symbol);                                        \
     VISIBLE type Wrap_##symbol parameters                                                          \
     {                                                                                              \
         static type(*pReal) parameters = nullptr;                                                  \
-        if (FaultIsDue(szName)) {                                                                  \
+        if (FaultIsDue(szName, szObject)) {                                                        \
             return failure;                                                                        \
         }                                                                                          \
         return Next(pReal, #symbol) arguments;                                                     \
     }
+#define WRAP_AS(szName, symbol, type, failure, parameters, arguments)                              \
+    WRAP_CALL(szName, NO_OBJECT, symbol, type, failure, parameters, arguments)
 #define WRAP(symbol, type, failure, parameters, arguments)                                         \
     WRAP_AS(#symbol, symbol, type, failure, parameters, arguments)
+
+// The call works, and fails all the same: a descriptor is gone after a failed close, too.
+#define WRAP_LATE(szName, symbol, type, failure, parameters, arguments)                            \
+    VISIBLE type Wrap_##symbol parameters __asm__(#symbol);                                        \
+    VISIBLE type Wrap_##symbol parameters                                                          \
+    {                                                                                              \
+        static type(*pReal) parameters = nullptr;                                                  \
+        const bool fFails = FaultIsDue(szName);                                                    \
+        const int error = errno;                                                                   \
+        const type result = Next(pReal, #symbol) arguments;                                        \
+        if (!fFails) {                                                                             \
+            return result;                                                                         \
+        }                                                                                          \
+        errno = error;                                                                             \
+        return failure;                                                                            \
+    }
 
 // ---- requests and device numbers ---------------------------------------------------------------
 
@@ -475,58 +591,146 @@ WRAP_ALLOCATION(calloc, (size_t n, size_t cb), (n, cb))
 WRAP_ALLOCATION(realloc, (void *p, size_t cb), (p, cb))
 #endif
 
-WRAP(open, int, -1, (const char *sz, int flags, mode_t mode), (sz, flags, mode))
-WRAP_AS("open", open64, int, -1, (const char *sz, int flags, mode_t mode), (sz, flags, mode))
-WRAP_AS("open", __open_2, int, -1, (const char *sz, int flags), (sz, flags))
-WRAP_AS("open", __open64_2, int, -1, (const char *sz, int flags), (sz, flags))
-WRAP(fopen, FILE *, nullptr, (const char *sz, const char *szMode), (sz, szMode))
-WRAP_AS("fopen", fopen64, FILE *, nullptr, (const char *sz, const char *szMode), (sz, szMode))
-WRAP(fdopen, FILE *, nullptr, (int fd, const char *szMode), (fd, szMode))
-WRAP(fclose, int, EOF, (FILE * p), (p))
+WRAP(strdup, char *, nullptr, (const char *sz), (sz))
+WRAP(strndup, char *, nullptr, (const char *sz, size_t cb), (sz, cb))
+
+WRAP_CALL("open", sz, open, int, -1, (const char *sz, int flags, mode_t mode), (sz, flags, mode))
+WRAP_CALL("open", sz, open64, int, -1, (const char *sz, int flags, mode_t mode), (sz, flags, mode))
+WRAP_CALL("open", sz, __open_2, int, -1, (const char *sz, int flags), (sz, flags))
+WRAP_CALL("open", sz, __open64_2, int, -1, (const char *sz, int flags), (sz, flags))
+
+#define WRAP_OPEN(szName, symbol)                                                                  \
+    VISIBLE FILE *Wrap_##symbol(const char *sz, const char *szMode) __asm__(#symbol);              \
+    VISIBLE FILE *Wrap_##symbol(const char *sz, const char *szMode)                                \
+    {                                                                                              \
+        static FILE *(*pReal)(const char *, const char *) = nullptr;                               \
+        return FaultIsDue(szName, sz) ? nullptr                                                    \
+                                      : StreamName(Next(pReal, #symbol)(sz, szMode), sz);          \
+    }
+WRAP_OPEN("fopen", fopen)
+WRAP_OPEN("fopen", fopen64)
+WRAP_OPEN("setmntent", setmntent)
+
+VISIBLE FILE *Wrap_fdopen(int fd, const char *szMode) __asm__("fdopen");
+VISIBLE FILE *Wrap_fdopen(int fd, const char *szMode)
+{
+    static FILE *(*pReal)(int, const char *) = nullptr;
+    return FaultIsDue("fdopen") ? nullptr : StreamName(Next(pReal, "fdopen")(fd, szMode), "pipe");
+}
+
+WRAP_LATE("close", close, int, -1, (int fd), (fd))
+WRAP_LATE("fclose", fclose, int, EOF, (FILE * p), (p))
+WRAP_LATE("endmntent", endmntent, int, 0, (FILE * p), (p))
 WRAP(fflush, int, EOF, (FILE * p), (p))
-WRAP(fgets, char *, nullptr, (char *sz, int cb, FILE *p), (sz, cb, p))
-WRAP_AS("fgets", __fgets_chk, char *, nullptr, (char *sz, size_t cbBuffer, int cb, FILE *p),
-        (sz, cbBuffer, cb, p))
-WRAP(fgetc, int, EOF, (FILE * p), (p))
-WRAP(getline, ssize_t, -1, (char **psz, size_t *pcb, FILE *p), (psz, pcb, p))
-WRAP_AS("getline", __getdelim, ssize_t, -1, (char **psz, size_t *pcb, int ch, FILE *p),
-        (psz, pcb, ch, p))
+WRAP_CALL("fgets", NameOf(p), fgets, char *, nullptr, (char *sz, int cb, FILE *p), (sz, cb, p))
+WRAP_CALL("fgets", NameOf(p), __fgets_chk, char *, nullptr,
+          (char *sz, size_t cbBuffer, int cb, FILE *p), (sz, cbBuffer, cb, p))
+WRAP_CALL("fgetc", NameOf(p), fgetc, int, EOF, (FILE * p), (p))
+WRAP_CALL("getline", NameOf(p), getline, ssize_t, -1, (char **psz, size_t *pcb, FILE *p),
+          (psz, pcb, p))
+WRAP_CALL("getline", NameOf(p), __getdelim, ssize_t, -1, (char **psz, size_t *pcb, int ch, FILE *p),
+          (psz, pcb, ch, p))
 WRAP(read, ssize_t, -1, (int fd, void *p, size_t cb), (fd, p, cb))
 WRAP_AS("read", __read_chk, ssize_t, -1, (int fd, void *p, size_t cb, size_t cbBuffer),
         (fd, p, cb, cbBuffer))
 WRAP(write, ssize_t, -1, (int fd, const void *p, size_t cb), (fd, p, cb))
 WRAP(pipe2, int, -1, (int *pfd, int flags), (pfd, flags))
-WRAP(fork, pid_t, -1, (), ())
-WRAP(execv, int, -1, (const char *sz, char *const *argv), (sz, argv))
-WRAP(waitpid, pid_t, -1, (pid_t pid, int *pStatus, int options), (pid, pStatus, options))
+
+VISIBLE pid_t Wrap_fork() __asm__("fork");
+VISIBLE pid_t Wrap_fork()
+{
+    static pid_t (*pReal)() = nullptr;
+    if (FaultIsDue("fork")) {
+        return -1;
+    }
+    g_nFork++;
+    const pid_t pid = Next(pReal, "fork")();
+    if (pid == 0 && g_fActive) {
+        ProcessNameExtend();
+    }
+    return pid;
+}
+
+// A child that cannot be waited for because it is not there was reaped by somebody else.
+VISIBLE pid_t Wrap_waitpid(pid_t pid, int *pStatus, int options) __asm__("waitpid");
+VISIBLE pid_t Wrap_waitpid(pid_t pid, int *pStatus, int options)
+{
+    static pid_t (*pReal)(pid_t, int *, int) = nullptr;
+    if (!FaultIsDue("waitpid")) {
+        return Next(pReal, "waitpid")(pid, pStatus, options);
+    }
+    const int error = errno;
+    if (error == ECHILD) {
+        (void)Next(pReal, "waitpid")(pid, nullptr, 0);
+    }
+    errno = error;
+    return -1;
+}
+
+WRAP_CALL("execv", sz, execv, int, -1, (const char *sz, char *const *argv), (sz, argv))
 WRAP(dup2, int, -1, (int fd, int fdNew), (fd, fdNew))
 WRAP(fcntl, int, -1, (int fd, int command, long argument), (fd, command, argument))
 WRAP_AS("fcntl", fcntl64, int, -1, (int fd, int command, long argument), (fd, command, argument))
-WRAP(access, int, -1, (const char *sz, int mode), (sz, mode))
-WRAP(stat, int, -1, (const char *sz, struct stat *p), (sz, p))
-WRAP_AS("stat", stat64, int, -1, (const char *sz, struct stat64 *p), (sz, p))
-WRAP(rmdir, int, -1, (const char *sz), (sz))
+WRAP_CALL("access", sz, access, int, -1, (const char *sz, int mode), (sz, mode))
+WRAP_CALL("stat", sz, stat, int, -1, (const char *sz, struct stat *p), (sz, p))
+WRAP_CALL("stat", sz, stat64, int, -1, (const char *sz, struct stat64 *p), (sz, p))
+WRAP_CALL("rmdir", sz, rmdir, int, -1, (const char *sz), (sz))
 WRAP(chdir, int, -1, (const char *sz), (sz))
 WRAP(setsid, pid_t, -1, (), ())
+WRAP_AS("setpriority", setpriority, int, -1, (__priority_which_t which, id_t who, int priority),
+        (which, who, priority))
+WRAP(sigaction, int, -1, (int number, const struct sigaction *pNew, struct sigaction *pOld),
+     (number, pNew, pOld))
+WRAP(clearenv, int, -1, (), ())
+WRAP(setenv, int, -1, (const char *szName, const char *szValue, int fOverwrite),
+     (szName, szValue, fOverwrite))
+WRAP(sysconf, long, -1, (int name), (name))
 WRAP(system, int, -1, (const char *sz), (sz))
-WRAP(setmntent, FILE *, nullptr, (const char *sz, const char *szMode), (sz, szMode))
-WRAP(getmntent_r, struct mntent *, nullptr, (FILE * p, struct mntent *pEntry, char *sz, int cb),
-     (p, pEntry, sz, cb))
+WRAP_CALL("getmntent_r", NameOf(p), getmntent_r, struct mntent *, nullptr,
+          (FILE * p, struct mntent *pEntry, char *sz, int cb), (p, pEntry, sz, cb))
+WRAP(localtime_r, struct tm *, nullptr, (const time_t *pTime, struct tm *pLocal), (pTime, pLocal))
+WRAP(strftime, size_t, 0, (char *sz, size_t cb, const char *szFormat, const struct tm *pTime),
+     (sz, cb, szFormat, pTime))
+
+// What is printed: a stream that takes nothing.
+WRAP(puts, int, EOF, (const char *sz), (sz))
+WRAP_AS("puts", putchar, int, EOF, (int ch), (ch))
+WRAP_AS("puts", putc, int, EOF, (int ch, FILE *p), (ch, p))
+WRAP_AS("puts", fputs, int, EOF, (const char *sz, FILE *p), (sz, p))
+
+#define WRAP_PRINT(szName, symbol, parameters, pStream)                                            \
+    VISIBLE int Wrap_##symbol parameters __asm__(#symbol);                                         \
+    VISIBLE int Wrap_##symbol parameters                                                           \
+    {                                                                                              \
+        if (FaultIsDue(szName)) {                                                                  \
+            return -1;                                                                             \
+        }                                                                                          \
+        va_list arguments;                                                                         \
+        va_start(arguments, szFormat);                                                             \
+        const int cch = vfprintf(pStream, szFormat, arguments);                                    \
+        va_end(arguments);                                                                         \
+        return cch;                                                                                \
+    }
+WRAP_PRINT("printf", printf, (const char *szFormat, ...), stdout)
+WRAP_PRINT("printf", __printf_chk, (int, const char *szFormat, ...), stdout)
+WRAP_PRINT("fprintf", fprintf, (FILE * p, const char *szFormat, ...), p)
+WRAP_PRINT("fprintf", __fprintf_chk, (FILE * p, int, const char *szFormat, ...), p)
+
 // A pattern cannot fail with an errno of its own, so the errno asked for tells which failure.
-WRAP(glob, int, errno == ENOMEM ? GLOB_NOSPACE : GLOB_ABORTED,
-     (const char *sz, int flags, int (*pError)(const char *, int), glob_t *p),
-     (sz, flags, pError, p))
-WRAP_AS("glob", glob64, int, errno == ENOMEM ? GLOB_NOSPACE : GLOB_ABORTED,
-        (const char *sz, int flags, int (*pError)(const char *, int), glob64_t *p),
-        (sz, flags, pError, p))
-WRAP(scandir, int, -1,
-     (const char *sz, struct dirent ***p, int (*pFilter)(const struct dirent *),
-      int (*pCompare)(const struct dirent **, const struct dirent **)),
-     (sz, p, pFilter, pCompare))
-WRAP_AS("scandir", scandir64, int, -1,
-        (const char *sz, struct dirent64 ***p, int (*pFilter)(const struct dirent64 *),
-         int (*pCompare)(const struct dirent64 **, const struct dirent64 **)),
-        (sz, p, pFilter, pCompare))
+WRAP_CALL("glob", sz, glob, int, errno == ENOMEM ? GLOB_NOSPACE : GLOB_ABORTED,
+          (const char *sz, int flags, int (*pError)(const char *, int), glob_t *p),
+          (sz, flags, pError, p))
+WRAP_CALL("glob", sz, glob64, int, errno == ENOMEM ? GLOB_NOSPACE : GLOB_ABORTED,
+          (const char *sz, int flags, int (*pError)(const char *, int), glob64_t *p),
+          (sz, flags, pError, p))
+WRAP_CALL("scandir", sz, scandir, int, -1,
+          (const char *sz, struct dirent ***p, int (*pFilter)(const struct dirent *),
+           int (*pCompare)(const struct dirent **, const struct dirent **)),
+          (sz, p, pFilter, pCompare))
+WRAP_CALL("scandir", sz, scandir64, int, -1,
+          (const char *sz, struct dirent64 ***p, int (*pFilter)(const struct dirent64 *),
+           int (*pCompare)(const struct dirent64 **, const struct dirent64 **)),
+          (sz, p, pFilter, pCompare))
 
 // Children of the program end by _exit, which drops what a coverage build has counted.
 #ifdef SANDBOX_COVERAGE

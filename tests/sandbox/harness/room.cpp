@@ -492,6 +492,7 @@ std::string FaultRecord(const MACHINE_FAULT &fault)
     NumberAdd(szRecord, fault.nCall);
     NumberAdd(szRecord, fault.error);
     NumberAdd(szRecord, fault.fGoOn ? 1 : 0);
+    FieldAdd(szRecord, fault.szProcess + " ");
     return szRecord;
 }
 
@@ -506,6 +507,11 @@ std::string DriverText(const MACHINE &machine)
     }
     for (const MACHINE_FAULT &fault : machine.faults) {
         FieldAdd(szText, FaultRecord(fault));
+    }
+    if (machine.fCallsTold) {
+        std::string szRecord;
+        FieldAdd(szRecord, "calls ");
+        FieldAdd(szText, szRecord);
     }
     if (machine.fRealSleep) {
         std::string szRecord;
@@ -544,6 +550,7 @@ void RoomAnswersWrite(const MACHINE &machine)
               0644);
     TextWrite(Inside(WIRE_DRIVER), DriverText(machine), 0644);
     TextWrite(Inside(WIRE_TRANSCRIPT), "", 0666);
+    TextWrite(Inside(WIRE_CALLS), "", 0666);
     LogLayOut(machine.fNoLog);
 }
 

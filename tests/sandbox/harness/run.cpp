@@ -437,6 +437,18 @@ RUN_RESULT MachineCall(const MACHINE &machine, const std::function<void()> &body
     return ProblemsFail(std::move(result));
 }
 
+std::vector<std::string> MachineCalls()
+{
+    std::vector<std::string> calls;
+    const std::string szAll = MachineFileRead(WIRE_CALLS).value_or("");
+    for (size_t iStart = 0; iStart < szAll.size();) {
+        const size_t iEnd = std::min(szAll.find('\n', iStart), szAll.size());
+        calls.push_back(szAll.substr(iStart, iEnd - iStart));
+        iStart = iEnd + 1;
+    }
+    return calls;
+}
+
 std::optional<std::string> MachineFileRead(const std::string &szPath)
 {
     const int fd = open((RoomRoot() + szPath).c_str(), O_RDONLY | O_CLOEXEC);

@@ -10,6 +10,7 @@
 #define WIRE_USED WIRE_FOLDER "/used"             // how often each row was run, 4 bytes a row
 #define WIRE_TRANSCRIPT WIRE_FOLDER "/transcript" // what happened, appended record by record
 #define WIRE_DRIVER WIRE_FOLDER "/driver"         // what requests answer, which calls fail
+#define WIRE_CALLS WIRE_FOLDER "/calls" // every call that can be made to fail, a line each
 #define WIRE_PROGRAM WIRE_FOLDER "/arrayctl"
 #define WIRE_INTERPOSE WIRE_FOLDER "/interpose.so"
 #define WIRE_STANDIN WIRE_FOLDER "/standin"
