@@ -100,12 +100,13 @@ void CloseOnExecClear(int fd)
     }
 }
 
+// A tool whose output cannot go to its reader must not run: it would write to our own streams.
 void MakeStandard(int fd, int fdStandard)
 {
     if (fd == fdStandard) {
         CloseOnExecClear(fd);
-    } else {
-        (void)dup2(fd, fdStandard);
+    } else if (dup2(fd, fdStandard) < 0) {
+        _exit(STATUS_NOT_EXECUTED);
     }
 }
 
