@@ -1,0 +1,128 @@
+#!/bin/sh
+# SPDX-License-Identifier: MIT
+# The tool is killed at a random moment while it makes or takes down a data array, alone or with all
+# that it has started, and is run again: the machine is then as if nothing had happened.
+# disks: 2
+# size: 4672M
+# timeout: 240
+# shellcheck disable=SC2317  # check must call the functions
+# shellcheck source=SCRIPTDIR/../lib.sh
+. /appliance/lib.sh
+# shellcheck source=SCRIPTDIR/../lib-setup.sh
+. /appliance/lib-setup.sh
+plan 6
+
+ROUNDS=20
+PID=/tmp/pid
+
+now() { # hundredths of a second
+    tr -d . </proc/uptime | cut -d' ' -f1
+}
+
+random_below() {
+    echo $(($(od -An -N2 -tu2 /dev/urandom) % $1))
+}
+
+pause() { # hundredths of a second
+    usleep $(($1 * 10000))
+}
+
+# Nothing that a killed run has started is at work any more.
+is_quiet() {
+    ! cat /proc/[0-9]*/comm 2>/dev/null | grep -qxE 'arrayctl|mdadm|sfdisk|pvs'
+}
+
+# kill_at MOMENT alone|all COMMAND...: in a session of its own, so that its group can be killed.
+kill_at() {
+    moment=$1
+    whom=$2
+    shift 2
+    setsid sh -c "echo \$\$ >$PID; exec arrayctl $*" >/dev/null 2>&1 &
+    wait_for "$SETTLE_SECONDS" test -s "$PID" || abort "arrayctl $* does not start"
+    pause "$moment"
+    if [ "$whom" = all ]; then
+        kill -9 "-$(cat "$PID")" 2>/dev/null
+    else
+        kill -9 "$(cat "$PID")" 2>/dev/null
+    fi
+    wait
+    : >"$PID"
+    wait_for "$SETTLE_SECONDS" is_quiet || abort "arrayctl $* leaves something running"
+}
+
+# length_of COMMAND...: of an undisturbed run, in hundredths of a second; at least one.
+length_of() {
+    begin=$(now)
+    arrayctl "$@" >/dev/null 2>&1
+    echo $(($(now) - begin + 1))
+}
+
+data_array_runs() {
+    table_is sda "$LAYOUT_8" "$LAYOUT_8_DATA" && table_is sdb "$LAYOUT_8" "$LAYOUT_8_DATA" &&
+        array_is 2 raid1 1.2 sda3 sdb3
+}
+
+# A stopped array is not known any more: what a killed run had not wiped yet stays, and the next
+# array is made over it.
+count_superblocks_left() {
+    if have_no_superblock sda3 sdb3 >/dev/null; then
+        wiped=$((wiped + 1))
+    else
+        left=$((left + 1))
+        must mdadm --zero-superblock /dev/sda3
+        must mdadm --zero-superblock /dev/sdb3
+    fi
+}
+
+# round alone|all: each kill is one of the forty.
+round() {
+    moment=$(random_below "$newvol_length")
+    kill_at "$moment" "$1" newvol
+    arrayctl newvol >/dev/null 2>&1
+    failures_before=$failures
+    check "newvol, killed $1 after ${moment}0 ms" wait_for "$SETTLE_SECONDS" data_array_runs
+    [ "$failures" = "$failures_before" ] || recover
+
+    moment=$(random_below "$destroy_length")
+    kill_at "$moment" "$1" destroy 2
+    arrayctl destroy 2 >/dev/null 2>&1
+    check "destroy, killed $1 after ${moment}0 ms" wait_for "$SETTLE_SECONDS" array_left_nothing 2
+    count_superblocks_left
+}
+
+# So that one failure does not spoil the rounds behind it.
+recover() {
+    cat /proc/mdstat
+    data_array_runs
+    mdadm --stop /dev/md2
+    arrayctl newvol
+}
+
+slow_resync
+machine internalportcfg=0x3 usbportcfg=0x40
+lay_out sda "$LAYOUT_8"
+lay_out sdb "$LAYOUT_8"
+
+newvol_length=$(length_of newvol)
+check 'newvol' data_array_runs
+verdict 'newvol without a kill'
+destroy_length=$(length_of destroy 2)
+check 'destroy' array_left_nothing 2
+check 'nothing is left' have_no_superblock sda3 sdb3
+verdict 'destroy without a kill'
+
+for whom in alone all; do
+    wiped=0
+    left=0
+    turn=0
+    while [ "$turn" -lt $((ROUNDS / 2)) ]; do
+        round "$whom"
+        turn=$((turn + 1))
+    done
+    verdict "$ROUNDS kills of the tool, $whom: newvol and destroy again"
+    check 'each destroy was counted' [ $((wiped + left)) -eq $((ROUNDS / 2)) ]
+    check 'some came to the end' [ "$wiped" -gt 0 ]
+    echo "superblocks wiped $wiped times, left $left times"
+    verdict "superblocks after kills, $whom"
+done
+finish

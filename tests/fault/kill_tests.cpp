@@ -1,0 +1,442 @@
+// SPDX-License-Identifier: MIT
+//
+// Kills the tool at every system call of every command that changes something, runs the command
+// again, and compares what the machine is like with what an undisturbed run makes of it.
+//
+//     kill_tests [--all] [--every N] [--jobs J] [--only TEXT]
+//
+// The tool is killed alone, so that what it has started comes to its own end, or with all of that
+// at any system call of its own processes. Without --all, one in N points is tried.
+#include "harness/room.h"
+#include "sandbox.h"
+#include "storage_machine.h"
+
+#include <algorithm>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <filesystem>
+#include <fstream>
+#include <map>
+#include <regex>
+#include <set>
+#include <sstream>
+#include <sys/wait.h>
+#include <unistd.h>
+#include <utility>
+
+namespace
+{
+
+using std::string;
+using std::to_string;
+using STRINGS = std::vector<string>;
+namespace fs = std::filesystem;
+
+constexpr size_t EVERY_DEFAULT = 3; // odd, so that both kinds of killing get their turn
+constexpr size_t JOBS_DEFAULT = 2;
+constexpr size_t FLOOR = 1000;
+constexpr size_t SHOWN = 5;
+constexpr int RUN_BOUND = 30000; // milliseconds; the machine may be busy with something else
+constexpr char RUNNER[] = "ARRAYCTL_RUNNER";
+
+constexpr const char *TOOLS[] = {"/sbin/mdadm",    "/sbin/sfdisk",   "/sbin/pvs",
+                                 "/sbin/lvremove", "/sbin/vgremove", "/sbin/pvremove",
+                                 "/bin/umount",    "/bin/nurodd"};
+
+struct OPTIONS {
+    bool fAll = false;
+    size_t every = EVERY_DEFAULT;
+    size_t jobs = JOBS_DEFAULT;
+    string szOnly = {};
+};
+
+// ---- machines that remember --------------------------------------------------------------------
+
+string FileText(const char *szPath)
+{
+    std::ifstream file(szPath, std::ios::binary);
+    std::ostringstream text;
+    text << file.rdbuf();
+    return text.str();
+}
+
+MACHINE Remembering(MACHINE machine)
+{
+    static const string szDisks = FileText(KILL_DISKS);
+    static const string szStepper = FileText(KILL_STEPPER);
+    MachineFile(machine, "/disks", szDisks, 0755);
+    MachineFile(machine, "/stepper", szStepper, 0755);
+    for (const char *const szTool : TOOLS) {
+        machine.tools[szTool] = TOOL_KIND::MISSING; // the stand-in of it, that is
+        MachineLink(machine, szTool, "/disks");
+    }
+    MachineFolder(machine, "/state/superblock");
+    machine.rows.clear();
+    machine.msBound = RUN_BOUND;
+    return machine;
+}
+
+void SuperblockAdd(MACHINE &machine, const string &szPartition, int nMd)
+{
+    MachineFile(machine, "/state/superblock/" + szPartition, to_string(nMd) + "\n");
+}
+
+// Two disks of the newest layout, md2 on their data partitions.
+MACHINE WithDataDisks()
+{
+    MACHINE machine = MachineWithConf(CONF_RAID);
+    for (const char *const szDisk : {"sda", "sdb"}) {
+        PartitionedDiskAdd(machine, szDisk, PLACES_8);
+        SuperblockAdd(machine, MachinePartitionAdd(machine, szDisk, 3, 9437184, 2000000), 2);
+    }
+    return machine;
+}
+
+MACHINE WithDataArray()
+{
+    MACHINE machine = WithDataDisks();
+    MachineMdAdd(machine, {.nMd = 2, .members = {{"sda3"}, {"sdb3"}}});
+    return machine;
+}
+
+MACHINE WithVolume()
+{
+    MACHINE machine = WithDataArray();
+    for (const char *const szPart : {"pv", "vg", "lv"}) {
+        MachineFile(machine, string("/state/") + szPart, "");
+    }
+    machine.files["/proc/mounts"].szText += "/dev/vg1/lv1s1 /mnt/one ext4 rw 0 0\n";
+    MachineFolder(machine, "/mnt/one");
+    return machine;
+}
+
+MACHINE WithBlankDisks(const string &szConf, const STRINGS &disks)
+{
+    MACHINE machine = MachineWithConf(szConf);
+    for (const string &szDisk : disks) {
+        MachineDiskAdd(machine, szDisk);
+    }
+    return machine;
+}
+
+// Why a line of the state may be there, or not be there, other than after an undisturbed run.
+struct LEFT_OTHERWISE {
+    bool fMissing;
+    const char *szLine;
+    const char *szReason;
+};
+
+struct KILL_CASE {
+    string szName;
+    MACHINE machine;
+    STRINGS words;
+    std::vector<LEFT_OTHERWISE> allowed = {};
+};
+
+constexpr LEFT_OTHERWISE STOPPED_BEFORE_WIPED = {
+    false, "^/state/superblock/sd[ab]3 ",
+    "an array that is stopped is not known any more, so superblocks that were not wiped yet stay"};
+constexpr LEFT_OTHERWISE WIPED_HALF_RENEWED = {
+    true, "^/sys/block/sd[ab]/sd[ab]3",
+    "a disk that lost both system partitions counts as blank, so its data partition goes"};
+constexpr LEFT_OTHERWISE LEFT_HALF_RENEWED = {
+    true, "/(dev-)?sd[ab][12]",
+    "a disk that lost one system partition is not known, so it is left alone beside one that is"};
+
+constexpr LEFT_OTHERWISE SLOT_TAKEN = {
+    false, "/(dev-)?sdb[12]", "and the slot of the disk that is left alone goes to the next"};
+
+std::vector<KILL_CASE> CasesMake()
+{
+    const string szOneSlot = string(CONF_RAID) + "max_sys_raid_disks=\"1\"\n";
+    return {
+        {"destroy: an array", WithDataArray(), {"destroy", "2"}, {STOPPED_BEFORE_WIPED}},
+        {"destroy: a mounted volume", WithVolume(), {"destroy", "2"}, {STOPPED_BEFORE_WIPED}},
+        {"newvol: two disks", WithDataDisks(), {"newvol"}},
+        {"initsys: blank disks",
+         WithBlankDisks(CONF_RAID, {"sda", "sdb"}),
+         {"initsys"},
+         {LEFT_HALF_RENEWED}},
+        {"initsys: disks that keep their data",
+         WithDataDisks(),
+         {"initsys"},
+         {WIPED_HALF_RENEWED, LEFT_HALF_RENEWED}},
+        {"initsys: more disks than slots",
+         WithBlankDisks(szOneSlot, {"sda", "sdb"}),
+         {"initsys"},
+         {LEFT_HALF_RENEWED, SLOT_TAKEN}},
+        {"initsys-dd: one disk", WithBlankDisks(CONF_RAID, {"sda"}), {"initsys-dd"}},
+    };
+}
+
+// ---- what a machine is like --------------------------------------------------------------------
+
+// One line for each file and folder that tells of disks, arrays and volumes.
+STRINGS StateTake()
+{
+    STRINGS lines;
+    const fs::path root = RoomRoot();
+    for (const char *const szFolder : {"sys/block", "state"}) {
+        for (const fs::directory_entry &entry : fs::recursive_directory_iterator(root / szFolder)) {
+            const string szPath = "/" + fs::relative(entry.path(), root).string();
+            const string szText = entry.is_regular_file() ? FileText(entry.path().c_str()) : "\n";
+            lines.push_back(szPath + " " + szText.substr(0, szText.find('\n')));
+        }
+    }
+    lines.push_back("/proc/mounts " + MachineFileRead("/proc/mounts").value_or(""));
+    std::sort(lines.begin(), lines.end());
+    return lines;
+}
+
+STRINGS Without(const STRINGS &lines, const STRINGS &others)
+{
+    STRINGS rest;
+    std::set_difference(lines.begin(), lines.end(), others.begin(), others.end(),
+                        std::back_inserter(rest));
+    return rest;
+}
+
+const LEFT_OTHERWISE *RowOf(const KILL_CASE &subject, const string &szLine, bool fMissing)
+{
+    for (const LEFT_OTHERWISE &row : subject.allowed) {
+        if (row.fMissing == fMissing && std::regex_search(szLine, std::regex(row.szLine))) {
+            return &row;
+        }
+    }
+    return nullptr;
+}
+
+// ---- one case ----------------------------------------------------------------------------------
+
+struct POINT {
+    string szProcess;
+    int nEntry = 0;
+    bool fAll = false;
+};
+
+struct TALLY {
+    size_t kills = 0;
+    std::map<string, size_t> allowed = {}; // reason -> kills
+    STRINGS wrong = {};
+};
+
+// How often each process of the tool enters the kernel in an undisturbed run.
+std::vector<POINT> PointsTake()
+{
+    std::vector<POINT> points;
+    std::istringstream steps(MachineFileRead("/steps").value_or(""));
+    string szProcess;
+    int nEntries = 0;
+    while (steps >> szProcess >> nEntries) {
+        for (int nEntry = 1; nEntry <= nEntries; nEntry++) {
+            points.push_back({szProcess, nEntry, true});
+            if (szProcess == "0") {
+                points.push_back({szProcess, nEntry, false});
+            }
+        }
+    }
+    return points;
+}
+
+RUN_RESULT SteppedRun(const KILL_CASE &subject, const POINT &point)
+{
+    const string szRunner = "/stepper " + point.szProcess + " " + to_string(point.nEntry) +
+                            (point.fAll ? " all" : " alone");
+    (void)setenv(RUNNER, szRunner.c_str(), 1);
+    RUN_RESULT result = MachineTry(subject.machine, subject.words);
+    (void)unsetenv(RUNNER);
+    return result;
+}
+
+// Takes the lines that may differ for their reasons, and gives back the others.
+STRINGS Unexplained(const KILL_CASE &subject, const STRINGS &lines, bool fMissing,
+                    std::set<string> &reasons)
+{
+    STRINGS rest;
+    for (const string &szLine : lines) {
+        const LEFT_OTHERWISE *const pRow = RowOf(subject, szLine, fMissing);
+        if (pRow == nullptr) {
+            rest.push_back(string(fMissing ? "    missing: " : "    instead: ") + szLine + "\n");
+        } else {
+            reasons.insert(pRow->szReason);
+        }
+    }
+    return rest;
+}
+
+void StateCompare(const KILL_CASE &subject, const POINT &point, const STRINGS &expected,
+                  TALLY &tally)
+{
+    const STRINGS state = StateTake();
+    std::set<string> reasons;
+    STRINGS rest = Unexplained(subject, Without(expected, state), true, reasons);
+    const STRINGS instead = Unexplained(subject, Without(state, expected), false, reasons);
+    rest.insert(rest.end(), instead.begin(), instead.end());
+    if (rest.empty()) {
+        for (const string &szReason : reasons) {
+            tally.allowed[szReason]++;
+        }
+        return;
+    }
+    string szText = subject.szName + ": killed" + (point.fAll ? " with its children" : "") +
+                    " at system call " + to_string(point.nEntry) + " of process " +
+                    point.szProcess + "\n";
+    for (const string &szLine : rest) {
+        szText += szLine;
+    }
+    tally.wrong.push_back(szText);
+}
+
+void PointTry(const KILL_CASE &subject, const POINT &point, const STRINGS &expected, TALLY &tally)
+{
+    const RUN_RESULT killed = SteppedRun(subject, point);
+    const RUN_RESULT again = MachineTryAgain(subject.machine, subject.words);
+    tally.kills++;
+    if (killed.fTimedOut || again.fTimedOut || again.signal != 0) {
+        tally.wrong.push_back(subject.szName + ": it hangs or breaks after a kill at " +
+                              point.szProcess + " " + to_string(point.nEntry) + "\n");
+        return;
+    }
+    StateCompare(subject, point, expected, tally);
+}
+
+TALLY CaseRun(const OPTIONS &options, const KILL_CASE &subject, size_t worker)
+{
+    TALLY tally;
+    const RUN_RESULT clean = SteppedRun(subject, {"0", 0, false});
+    const std::vector<POINT> points = PointsTake();
+    const STRINGS expected = StateTake();
+    if (clean.status != 0 || points.empty()) {
+        tally.wrong.push_back(subject.szName + ": undisturbed it ends with status " +
+                              to_string(clean.status) + "\n" + clean.szOut + clean.szErr);
+        return tally;
+    }
+    size_t due = 0;
+    for (size_t i = 0; i < points.size(); i++) {
+        if ((options.fAll || i % options.every == 0) && due++ % options.jobs == worker) {
+            PointTry(subject, points[i], expected, tally);
+        }
+    }
+    return tally;
+}
+
+// ---- the ring ----------------------------------------------------------------------------------
+
+// A worker tells of a case in one line; what is wrong is shown at once.
+void WorkerStart(const OPTIONS &options, const std::vector<KILL_CASE> &cases, size_t worker,
+                 FILE *pOut)
+{
+    if (fork() != 0) {
+        return;
+    }
+    for (size_t i = 0; i < cases.size(); i++) {
+        const TALLY tally = CaseRun(options, cases[i], worker);
+        for (size_t n = 0; n < std::min(tally.wrong.size(), SHOWN); n++) {
+            (void)fputs(tally.wrong[n].c_str(), stdout);
+        }
+        fprintf(pOut, "%zu %zu %zu\n", i, tally.kills, tally.wrong.size());
+        for (const auto &[szReason, n] : tally.allowed) {
+            printf("kept %zu times: %s: %s\n", n, cases[i].szName.c_str(), szReason.c_str());
+        }
+        (void)fflush(nullptr);
+    }
+    exit(EXIT_SUCCESS);
+}
+
+struct CASE_TOTAL {
+    size_t reports = 0;
+    size_t kills = 0;
+    size_t wrong = 0;
+};
+
+void WorkerRead(FILE *pIn, std::vector<CASE_TOTAL> &totals)
+{
+    rewind(pIn);
+    size_t i = 0;
+    size_t kills = 0;
+    size_t wrong = 0;
+    while (fscanf(pIn, "%zu %zu %zu", &i, &kills, &wrong) == 3) {
+        totals[i].reports++;
+        totals[i].kills += kills;
+        totals[i].wrong += wrong;
+    }
+}
+
+int TotalsPrint(const OPTIONS &options, const std::vector<KILL_CASE> &cases,
+                const std::vector<CASE_TOTAL> &totals)
+{
+    size_t kills = 0;
+    size_t failed = 0;
+    for (size_t i = 0; i < cases.size(); i++) {
+        const CASE_TOTAL &total = totals[i];
+        const bool fPassed = total.wrong == 0 && total.reports == options.jobs;
+        kills += total.kills;
+        failed += fPassed ? 0 : 1;
+        printf("%s %s: %zu kills", fPassed ? "ok" : "FAILED", cases[i].szName.c_str(), total.kills);
+        if (total.wrong > 0) {
+            printf(", %zu end in another state", total.wrong);
+        }
+        printf("\n");
+    }
+    const bool fEnough = !options.szOnly.empty() || kills >= FLOOR;
+    printf("kill: %zu points\n", kills);
+    printf("kill: %zu passed, %zu failed\n", cases.size() - failed + (fEnough ? 1 : 0),
+           failed + (fEnough ? 0 : 1));
+    return failed == 0 && fEnough ? EXIT_SUCCESS : EXIT_FAILURE;
+}
+
+int RingRun(const OPTIONS &options)
+{
+    std::vector<KILL_CASE> cases = CasesMake();
+    std::erase_if(cases, [&](const KILL_CASE &subject) {
+        return subject.szName.find(options.szOnly) == string::npos;
+    });
+    for (KILL_CASE &subject : cases) {
+        subject.machine = Remembering(std::move(subject.machine));
+    }
+    std::vector<FILE *> told;
+    for (size_t worker = 0; worker < options.jobs; worker++) {
+        told.push_back(tmpfile());
+        WorkerStart(options, cases, worker, told.back());
+    }
+    while (wait(nullptr) > 0) {
+    }
+    std::vector<CASE_TOTAL> totals(cases.size());
+    for (FILE *const pIn : told) {
+        WorkerRead(pIn, totals);
+    }
+    return TotalsPrint(options, cases, totals);
+}
+
+bool OptionTake(OPTIONS &options, const string &szName, const char *szValue)
+{
+    if (szName == "--only") {
+        options.szOnly = szValue;
+        return true;
+    }
+    size_t *const pNumber = szName == "--every"  ? &options.every
+                            : szName == "--jobs" ? &options.jobs
+                                                 : nullptr;
+    if (pNumber != nullptr) {
+        *pNumber = strtoul(szValue, nullptr, 10);
+    }
+    return pNumber != nullptr && *pNumber > 0;
+}
+
+} // namespace
+
+int main(int argc, char *argv[])
+{
+    OPTIONS options;
+    for (int i = 1; i < argc; i++) {
+        const string szName = argv[i];
+        if (szName == "--all") {
+            options.fAll = true;
+        } else if (i + 1 >= argc || !OptionTake(options, szName, argv[++i])) {
+            fprintf(stderr, "usage: kill_tests [--all] [--every N] [--jobs J] [--only TEXT]\n");
+            return EXIT_FAILURE;
+        }
+    }
+    return RingRun(options);
+}

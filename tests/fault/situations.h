@@ -1,0 +1,19 @@
+// SPDX-License-Identifier: MIT
+#pragma once
+
+// The machines and commands that failing calls and kills are tried on.
+
+#include "sandbox.h"
+
+#include <string>
+#include <vector>
+
+struct SITUATION {
+    std::string szName; // "COMMAND: what is special"
+    MACHINE machine;
+    std::vector<std::string> words; // of the command line
+};
+
+// Their stand-ins answer as often as they are asked, and every tool takes whatever it is given:
+// what a run did is judged afterwards.
+std::vector<SITUATION> SituationsMake();
