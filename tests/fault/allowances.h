@@ -28,6 +28,8 @@ struct ALLOWANCE {
 #define ALLOCATION "^(malloc|calloc|realloc|strndup|strdup|\\*) "
 #define CONF_LOOK "nuroinfo\\.conf|dualhead|" ALLOCATION
 #define UNIT_LOOK "nuro_pm_info|^scandir |" ALLOCATION
+// What a child that looks after one disk does, and how it is waited for.
+#define CHILD_WORK "^[a-z0-9_]+ [0-9]+ 0\\.|^waitpid "
 #define DISK_LOOK "/sys/|^(pipe2|fork|fdopen|execv|dup2|fgets|waitpid|open) |" CONF_LOOK
 
 inline constexpr ALLOWANCE ALLOWANCES[] = {
@@ -80,7 +82,8 @@ inline constexpr ALLOWANCE ALLOWANCES[] = {
      "without "
      "one"},
 
-    {DIFFERENCE::EXTRA_CHANGE, "^initsys", "", "^(/sbin/mdadm -C /dev/md[01] |/bin/nurodd)",
+    {DIFFERENCE::EXTRA_CHANGE, "^initsys", CHILD_WORK "|" CONF_LOOK "|" UNIT_LOOK,
+     "^(/sbin/mdadm -C /dev/md[01] |/bin/nurodd)",
      "a disk whose child has failed is left out of the arrays, and its place stays missing"},
     {DIFFERENCE::EXTRA_CHANGE, "^(initsys|newvol)", CONF_LOOK, " -t8[23] ",
      "whether the machine has RAID cannot be read, so it has not, and partitions get the other "
@@ -129,7 +132,7 @@ inline constexpr ALLOWANCE ALLOWANCES[] = {
 
     {DIFFERENCE::ANSWER, "^status", "dev-sd|" ALLOCATION, "",
      "a member whose attributes cannot be read is left out of the report"},
-    {DIFFERENCE::ANSWER, "^enum", "", "",
+    {DIFFERENCE::ANSWER, "^enum", CHILD_WORK "|" CONF_LOOK "|" UNIT_LOOK "|/sys/|pipe$", "",
      "a disk whose decision is lost is none that keeps its data, and without one all are listed; a "
      "disk whose port is not known is not listed"},
     {DIFFERENCE::ANSWER, "^newvol", "/tmp/raid\\.|^waitpid |" CONF_LOOK "|" UNIT_LOOK, "",
