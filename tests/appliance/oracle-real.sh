@@ -1,0 +1,237 @@
+#!/bin/sh
+# SPDX-License-Identifier: MIT
+#
+# Sets up one machine after the other from /oracle/machines, runs the tool on each and hands back
+# what was seen of it: behind the line "# records" stands an archive in base64.
+# shellcheck source=SCRIPTDIR/lib.sh
+. /appliance/lib.sh
+# shellcheck source=SCRIPTDIR/lib-setup.sh
+. /appliance/lib-setup.sh
+
+ORACLE=/oracle
+REAL=$ORACLE/real
+FAULTS=$ORACLE/faults
+CURRENT=$ORACLE/current
+RECORDS=$ORACLE/records
+DUPLICATOR=/bin/nurodd
+LETTERS='a b c d e f g h i j'
+MARKERS='/.force_clean_all_disk /tmp/.dualhead /tmp/.not.dualhead /tmp/raid.0 /tmp/raid.1 /tmp/raid.5'
+RUN_SECONDS=100
+
+# --- the tools ---------------------------------------------------------------------------------
+
+# Between the tool and the real programs stands one script under all their names: it writes down
+# what it was called with, passes that on, and keeps the answer.
+install_recorder() {
+    mkdir -p "$REAL" "$RECORDS"
+    mv /usr/sbin/mdadm /usr/sbin/sfdisk "$REAL"
+    # The duplication tool succeeds in silence.
+    ln -s /usr/bin/true "$REAL/nurodd"
+    cat >"$ORACLE/recorder" <<'SCRIPT'
+#!/bin/sh
+unset LD_PRELOAD
+# The newline ends the record, and the whole record is one write.
+printf '%s\037' "$$" "$0" "$@" '
+' >>/oracle/current/calls
+reply=/oracle/current/reply.$$
+program=${0##*/}
+call="$program $*"
+status=
+fault() {
+    # shellcheck disable=SC2254  # a pattern
+    case $call in
+    $1)
+        status=$2
+        : >"$reply.out"
+        printf %s "$3" >"$reply.err"
+        ;;
+    esac
+}
+. /oracle/faults
+if [ -z "$status" ]; then
+    "/oracle/real/$program" "$@" >"$reply.out" 2>"$reply.err"
+    status=$?
+fi
+echo "$status" >"$reply.status"
+[ -s "$reply.out" ] && cat "$reply.out"
+[ -s "$reply.err" ] && cat "$reply.err" >&2
+exit "$status"
+SCRIPT
+    chmod +x "$ORACLE/recorder"
+}
+
+restore_tools() {
+    for program in /usr/sbin/mdadm /usr/sbin/sfdisk "$DUPLICATOR"; do
+        ln -sf "$ORACLE/recorder" "$program"
+    done
+    : >"$FAULTS"
+}
+
+missing() {
+    rm "$1"
+}
+
+# fault PROGRAM PATTERN STATUS TEXT: such calls fail without being passed on.
+fault() {
+    printf "fault '%s %s' %s '%s'\n" "$@" >>"$FAULTS"
+}
+
+# --- the machine -------------------------------------------------------------------------------
+
+is_present() {
+    [ -b "/dev/sd$1" ] && [ -e "/sys/block/sd$1/size" ]
+}
+
+all_present() {
+    target=0
+    for letter in $LETTERS; do
+        is_present "$letter" || {
+            must sh -c "echo '0 $target 0' >'$SCSI_HOSTS/host0/scan'"
+            wait_for "$SETTLE_SECONDS" is_present "$letter" || abort "sd$letter does not come back"
+        }
+        target=$((target + 1))
+    done
+}
+
+stop_all() {
+    for number in $(arrays_known); do
+        must "$REAL/mdadm" -q --stop "/dev/md$number"
+        wait_for "$SETTLE_SECONDS" array_is_gone "$number" || abort "md$number does not go away"
+    done
+}
+
+# begin SEED: ten blank disks, the stock of tools and no trace of the machine before.
+begin() {
+    seed=$1
+    echo "# machine $seed"
+    ! grep -q " $SCSI_HOSTS tmpfs " /proc/mounts || must umount "$SCSI_HOSTS"
+    stop_all
+    all_present
+    for letter in $LETTERS; do
+        must blkdiscard -f "/dev/sd$letter"
+    done
+    # shellcheck disable=SC2086  # a list
+    rm -f $MARKERS "$CONFIGURATION" "$OPERATION_ERRORS"
+    rm -rf "$CURRENT"
+    mkdir "$CURRENT"
+    restore_tools
+}
+
+# present DISK...: every other disk is pulled.
+present() {
+    for letter in $LETTERS; do
+        case " $* " in
+        *" sd$letter "*) ;;
+        *) pull_disk "sd$letter" ;;
+        esac
+    done
+}
+
+conf() {
+    printf %s "$1" >"$CONFIGURATION"
+}
+
+marker() {
+    : >"$1"
+}
+
+hosts_begin() {
+    must mount -t tmpfs tmpfs "$SCSI_HOSTS"
+}
+
+# host NAME [TEXT]
+host() {
+    mkdir "$SCSI_HOSTS/$1"
+    [ $# -eq 1 ] || printf %s "$2" >"$SCSI_HOSTS/$1/nuro_pm_info"
+}
+
+# sector DISK NUMBER ESCAPES
+sector() {
+    # shellcheck disable=SC2059  # escapes
+    printf "$3" | dd of="/dev/$1" bs=512 seek="$2" conv=notrunc 2>/dev/null
+}
+
+gpt_table() {
+    printf %s "$2" >/tmp/table
+    must sh -c "sfdisk.stock -q --wipe never --wipe-partitions never /dev/$1 </tmp/table"
+}
+
+tables_made() {
+    for disk in /dev/sd?; do
+        must blockdev --rereadpt "$disk"
+    done
+}
+
+create() {
+    must "$REAL/mdadm" --create "$@" --run --assume-clean --bitmap=none
+}
+
+# whole DISK MD: a superblock at the disk's end.
+whole() {
+    create "/dev/md$2" -e 0.90 -l1 -n1 -f "/dev/$1"
+    must "$REAL/mdadm" -q --stop "/dev/md$2"
+}
+
+# array MD running|stopped ARGUMENT...
+array() {
+    number=$1
+    fate=$2
+    shift 2
+    create "/dev/md$number" "$@"
+    [ "$fate" = running ] || must "$REAL/mdadm" -q --stop "/dev/md$number"
+}
+
+# --- the run -----------------------------------------------------------------------------------
+
+# What the tool will find in sysfs: disks, partitions, members of the system array, adapters.
+record_machine() {
+    for disk in /sys/block/sd*; do
+        name=${disk##*/}
+        echo "disk $name"
+        for part in "$disk/$name"*; do
+            [ -e "$part" ] || continue
+            read -r start <"$part/start"
+            read -r size <"$part/size"
+            echo "partition $name ${part##*/"$name"} $start $size"
+        done
+    done
+    for member in /sys/block/md0/md/dev-*; do
+        [ ! -e "$member" ] || echo "member ${member##*/dev-}"
+    done
+    for adapter in "$SCSI_HOSTS"/*; do
+        echo "host ${adapter##*/}"
+    done
+}
+
+record_markers() {
+    for marker in $MARKERS; do
+        [ ! -e "$marker" ] || echo "$marker"
+    done
+}
+
+log_is_complete() {
+    grep -q ' oracle: end$' "$SYSLOG"
+}
+
+# run ARGUMENT...: pauses are answered at once, and written down among the calls.
+run() {
+    record_machine >"$CURRENT/machine"
+    : >"$SYSLOG"
+    timeout "$RUN_SECONDS" strace -A -q -o "$CURRENT/calls" -e signal=none \
+        -e trace=clock_nanosleep -e inject=clock_nanosleep:retval=0 \
+        arrayctl "$@" >"$CURRENT/out" 2>"$CURRENT/err"
+    echo $? >"$CURRENT/status"
+    logger -t oracle end
+    wait_for "$SETTLE_SECONDS" log_is_complete || abort 'no system log'
+    cp "$SYSLOG" "$CURRENT/log"
+    [ ! -e "$OPERATION_ERRORS" ] || cp "$OPERATION_ERRORS" "$CURRENT/errors"
+    record_markers >"$CURRENT/markers"
+    mv "$CURRENT" "$RECORDS/$seed"
+}
+
+slow_resync
+install_recorder
+# shellcheck source=/dev/null
+. $ORACLE/machines
+echo '# records'
+tar -C "$RECORDS" -c . | base64

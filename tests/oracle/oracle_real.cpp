@@ -1,0 +1,314 @@
+// SPDX-License-Identifier: MIT
+// Random machines with real disks: prints what the appliance must set up, and compares what was
+// recorded there with the model.
+//
+//     oracle_real plan SEED N             the script of N machines, the first from SEED
+//     oracle_real compare SEED N FOLDER   their records
+//     oracle_real show SEED N FOLDER      the same, with the machines and what was seen
+#include "oracle_compare.h"
+#include "oracle_plan.h"
+
+#include <algorithm>
+#include <cstdio>
+#include <cstdlib>
+#include <fstream>
+#include <iterator>
+#include <regex>
+#include <sstream>
+
+namespace
+{
+
+using std::optional;
+using std::string;
+using std::to_string;
+using std::vector;
+using u64 = std::uint64_t;
+
+// What the appliance saw of one machine.
+struct RECORD {
+    ORACLE_MACHINE machine{};
+    ORACLE_SEEN seen{};
+};
+
+optional<string> FileRead(const string &szPath)
+{
+    std::ifstream file(szPath, std::ios::binary);
+    if (!file) {
+        return std::nullopt;
+    }
+    return string(std::istreambuf_iterator<char>(file), {});
+}
+
+vector<string> Split(const string &szText, char separator)
+{
+    vector<string> parts;
+    std::istringstream stream(szText);
+    for (string part; std::getline(stream, part, separator);) {
+        parts.push_back(part);
+    }
+    return parts;
+}
+
+// A file of a record that must be there.
+string PartRead(const string &szFolder, const string &szPart, ORACLE_SEEN &seen)
+{
+    const optional<string> szText = FileRead(szFolder + "/" + szPart);
+    if (!szText) {
+        seen.problems.push_back("no record of " + szPart);
+    }
+    return szText.value_or("");
+}
+
+void MachineTake(const string &szFolder, RECORD &record)
+{
+    record.machine.disks.clear();
+    record.machine.md0Members.clear();
+    for (const string &szLine : Split(PartRead(szFolder, "machine", record.seen), '\n')) {
+        const vector<string> words = Split(szLine, ' ');
+        if (words[0] == "disk") {
+            record.machine.disks[words[1]];
+        } else if (words[0] == "partition") {
+            record.machine.disks[words[1]][atoi(words[2].c_str())] = {words[3] + "\n",
+                                                                      words[4] + "\n"};
+        } else if (words[0] == "host") {
+            record.machine.hosts.try_emplace(words[1]); // what it says is in the plan
+        } else {
+            record.machine.md0Members.push_back(words[1]);
+        }
+    }
+}
+
+// What a tool answered is what the model is told that it answers.
+void ReplyTake(const string &szFolder, const string &szReply, const ORACLE_WORDS &words,
+               RECORD &record)
+{
+    ORACLE_REPLY reply;
+    reply.szOut = PartRead(szFolder, szReply + ".out", record.seen);
+    reply.szErr = PartRead(szFolder, szReply + ".err", record.seen);
+    reply.nExit = atoi(PartRead(szFolder, szReply + ".status", record.seen).c_str());
+    record.machine.replies[OracleReplyKey(words)].push_back(reply);
+}
+
+// Lines of a number and an argument list, or of a pause that was answered.
+void CallsTake(const string &szFolder, RECORD &record)
+{
+    static const std::regex pause(R"(^clock_nanosleep\(.*\{tv_sec=([0-9]+), tv_nsec=0\}.*\) = 0)");
+    for (string szLine : Split(PartRead(szFolder, "calls", record.seen), '\n')) {
+        szLine.erase(0, szLine.find_first_not_of('\037'));
+        std::smatch match;
+        if (std::regex_search(szLine, match, pause)) {
+            record.seen.commands.push_back({"sleep", match[1]});
+            continue;
+        }
+        ORACLE_WORDS words = Split(szLine, '\037');
+        if (words.size() > 1) {
+            const string szReply = "reply." + words[0];
+            words.erase(words.begin());
+            record.seen.commands.push_back(words);
+            ReplyTake(szFolder, szReply, words, record);
+        } else if (!szLine.empty() && szLine.find("+++ exited with") == string::npos) {
+            record.seen.problems.push_back("recorded among the calls: " + szLine);
+        }
+    }
+}
+
+void LogTake(const string &szFolder, ORACLE_SEEN &seen)
+{
+    static const std::map<string, int> priorities = {{"emerg", 0}, {"alert", 1}, {"crit", 2},
+                                                     {"err", 3},   {"warn", 4},  {"notice", 5},
+                                                     {"info", 6},  {"debug", 7}};
+    static const std::regex own("^.{15} [^ ]+ user\\.([a-z]+) arrayctl: (.*)$");
+    for (const string &szLine : Split(PartRead(szFolder, "log", seen), '\n')) {
+        std::smatch match;
+        if (std::regex_match(szLine, match, own)) {
+            seen.lines.emplace_back(priorities.at(match[1]), match[2]);
+        } else if (szLine.find("arrayctl") != string::npos) {
+            seen.problems.push_back("in the system log: " + szLine);
+        }
+    }
+}
+
+void ErrorLogTake(const string &szFolder, ORACLE_SEEN &seen)
+{
+    static const std::regex stamp("^[A-Z][a-z]{2} [0-9]{2} [0-9]{2}:[0-9]{2}:[0-9]{2} ");
+    for (const string &szLine : Split(FileRead(szFolder + "/errors").value_or(""), '\n')) {
+        seen.errorLog.push_back(
+            std::regex_search(szLine, stamp)
+                ? std::regex_replace(szLine, stamp, "", std::regex_constants::format_first_only)
+                : "no time stamp before: " + szLine);
+    }
+}
+
+RECORD RecordTake(const PLAN &plan, const string &szFolder)
+{
+    RECORD record;
+    record.machine = plan.subject.machine;
+    if (!plan.fUnits) {
+        record.machine.hosts.clear(); // the appliance's own adapters say nothing
+    }
+    MachineTake(szFolder, record);
+    CallsTake(szFolder, record);
+    LogTake(szFolder, record.seen);
+    ErrorLogTake(szFolder, record.seen);
+    record.seen.szOut = PartRead(szFolder, "out", record.seen);
+    record.seen.szErr = PartRead(szFolder, "err", record.seen);
+    record.seen.nStatus = atoi(PartRead(szFolder, "status", record.seen).c_str());
+    for (const string &szMarker : Split(PartRead(szFolder, "markers", record.seen), '\n')) {
+        record.seen.markers.insert(szMarker);
+    }
+    return record;
+}
+
+// --------------------------------------------------------------------------------- the verdict
+
+// A machine that was not set up as planned proves nothing.
+void SetUpCheck(const PLAN &plan, const RECORD &record, vector<string> &differences)
+{
+    string planned;
+    for (const auto &[szName, disk] : plan.disks) {
+        planned += szName;
+        for (const PLAN_PARTITION &partition : disk.table) {
+            // The kernel shows only the head of an extended partition.
+            const u64 size = partition.number == 4 ? 2 : partition.size;
+            planned += " " + to_string(partition.number) + ":" + to_string(partition.start) + "+" +
+                       to_string(size);
+        }
+        planned += "\n";
+    }
+    string made;
+    for (const auto &[szName, table] : record.machine.disks) {
+        made += szName;
+        for (const auto &[number, partition] : table) {
+            made += " " + to_string(number) + ":" + to_string(atoll(partition.szStart->c_str())) +
+                    "+" + to_string(atoll(partition.szSize->c_str()));
+        }
+        made += "\n";
+    }
+    vector<string> wanted = plan.subject.machine.md0Members;
+    vector<string> running = record.machine.md0Members;
+    std::sort(wanted.begin(), wanted.end());
+    std::sort(running.begin(), running.end());
+    if (planned != made || wanted != running) {
+        differences.push_back("the machine itself, planned\n" + planned + "made\n" + made);
+    }
+}
+
+// The directory of the system array hands out its members in an order of its own.
+vector<string> NearestDifferences(const PLAN &plan, RECORD &record)
+{
+    vector<string> nearest;
+    vector<string> &members = record.machine.md0Members;
+    std::sort(members.begin(), members.end());
+    bool fFirst = true;
+    do {
+        const ORACLE_ANSWER answer = OracleAnswer(record.machine, plan.subject.words);
+        vector<string> differences = OracleDifferences(answer, record.seen);
+        if (fFirst || differences.size() < nearest.size()) {
+            nearest = differences;
+        }
+        fFirst = false;
+    } while (std::next_permutation(members.begin(), members.end()));
+    return nearest;
+}
+
+string WordsText(const vector<string> &words)
+{
+    string text;
+    for (const string &szWord : words) {
+        text += " [" + szWord + "]";
+    }
+    return text;
+}
+
+string SeenText(const ORACLE_SEEN &seen)
+{
+    string text;
+    for (const ORACLE_WORDS &words : seen.commands) {
+        text += "  runs" + WordsText(words) + "\n";
+    }
+    for (const auto &[priority, szLine] : seen.lines) {
+        text += "  logs " + to_string(priority) + " " + szLine + "\n";
+    }
+    for (const string &szLine : seen.errorLog) {
+        text += "  records " + szLine + "\n";
+    }
+    return text + "  prints [" + seen.szOut + "], exit status " + to_string(seen.nStatus) + "\n";
+}
+
+string Head(const PLAN &plan, const RECORD &record)
+{
+    string text = "seed " + to_string(plan.subject.seed) + ":";
+    for (const string &szWord : plan.subject.words) {
+        text += " " + szWord;
+    }
+    return text + ", disks " + to_string(plan.disks.size()) + ", arrays " +
+           to_string(plan.arrays.size()) + ", calls " + to_string(record.seen.commands.size()) +
+           ", status " + to_string(record.seen.nStatus) + "\n";
+}
+
+bool MachineCompare(u64 seed, const string &szRecords, bool fShow)
+{
+    const PLAN plan = PlanMake(seed);
+    RECORD record = RecordTake(plan, szRecords + "/" + to_string(seed));
+    vector<string> differences = NearestDifferences(plan, record);
+    SetUpCheck(plan, record, differences);
+    string text = (differences.empty() ? "ok      " : "FAILED  ") + Head(plan, record);
+    if (!differences.empty() || fShow) {
+        ORACLE_CASE subject = plan.subject;
+        subject.machine = record.machine;
+        text += OracleCaseText(subject) + "seen\n" + SeenText(record.seen);
+    }
+    for (const string &szDifference : differences) {
+        text += "difference in " + szDifference;
+    }
+    if (!differences.empty()) {
+        text += "again with: tests/oracle/run-real BUILD_DIR 1 " + to_string(seed) + "\n";
+    }
+    (void)fwrite(text.data(), 1, text.size(), stdout);
+    return differences.empty();
+}
+
+int CompareAll(u64 first, u64 count, const string &szRecords, bool fShow)
+{
+    u64 failed = 0;
+    for (u64 seed = first; seed < first + count; seed++) {
+        failed += MachineCompare(seed, szRecords, fShow) ? 0 : 1;
+    }
+    printf("oracle-real: %llu passed, %llu failed\n",
+           static_cast<unsigned long long>(count - failed),
+           static_cast<unsigned long long>(failed));
+    return failed == 0 ? EXIT_SUCCESS : EXIT_FAILURE;
+}
+
+int PlanAll(u64 first, u64 count)
+{
+    for (u64 seed = first; seed < first + count; seed++) {
+        const string szScript = PlanScript(PlanMake(seed));
+        (void)fwrite(szScript.data(), 1, szScript.size(), stdout);
+    }
+    return EXIT_SUCCESS;
+}
+
+bool NumberParse(const char *szText, u64 &number)
+{
+    char *pEnd = nullptr;
+    number = strtoull(szText, &pEnd, 10);
+    return pEnd != szText && *pEnd == '\0';
+}
+
+} // namespace
+
+int main(int argc, char *argv[])
+{
+    const string szWord = argc > 1 ? argv[1] : "";
+    const bool fPlan = szWord == "plan";
+    u64 first = 0;
+    u64 count = 0;
+    if ((!fPlan && szWord != "compare" && szWord != "show") || argc != (fPlan ? 4 : 5) ||
+        !NumberParse(argv[2], first) || !NumberParse(argv[3], count) || count == 0) {
+        fprintf(stderr, "usage: oracle_real plan SEED N | compare|show SEED N FOLDER\n");
+        return EXIT_FAILURE;
+    }
+    return fPlan ? PlanAll(first, count) : CompareAll(first, count, argv[4], szWord == "show");
+}
