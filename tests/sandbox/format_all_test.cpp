@@ -372,7 +372,8 @@ TEST(FormatAllFails, ToNumberADiskWhosePortIsUnknown)
     EXPECT_EQ(LogErrors(result), szExpected);
 }
 
-// Whichever calls they are that ask for memory.
+// Whichever calls they are that ask for memory. The C library's own are among them, and its glob()
+// does not survive each of them, so only the runs that end in the message are looked at.
 TEST(FormatAllFails, WithoutMemory)
 {
     constexpr char NO_LIST[] = "<11>arrayctl.cpp:# Out of memeory, failed to allocate memory for "
@@ -386,10 +387,11 @@ TEST(FormatAllFails, WithoutMemory)
             MachineFile(machine, FORCE_MARKER, "");
             MachineDiskAdd(machine, "sda");
             machine.faults = {{.szFunction = szFunction, .nCall = nCall, .error = ENOMEM}};
-            const RUN_RESULT result = MachineRun(machine, {WORD});
+            const RUN_RESULT result = MachineTry(machine, {WORD});
             const std::string szLog = LogOf(result, "arrayctl.cpp");
             if (szLog == NO_LIST || szLog == NO_CHILDREN) {
                 ExpectPrinted(result, "", 1);
+                EXPECT_EQ(result.problems, std::vector<std::string>());
             }
             nListSeen += szLog == NO_LIST ? 1 : 0;
             fChildrenSeen = fChildrenSeen || szLog == NO_CHILDREN;
@@ -412,11 +414,12 @@ TEST(FormatAllFails, WhenTheListOfDisksToFormatCannotGrow)
         }
         machine.faults = {{.szFunction = "malloc", .nCall = nCall, .error = ENOMEM}};
         machine.fMayLeaveChildren = true; // those behind the disk that did not fit
-        const RUN_RESULT result = MachineRun(machine, {WORD});
+        const RUN_RESULT result = MachineTry(machine, {WORD});
         if (result.status != 255) {
             continue;
         }
         fSeen = true;
+        EXPECT_EQ(result.problems, std::vector<std::string>());
         EXPECT_EQ(result.szOut, "");
         const std::string szLog = LogOf(result, "arrayctl.cpp");
         EXPECT_EQ(szLog.rfind("<11>arrayctl.cpp:# Push /dev/sda_with_a_rather_long_", 0), 0U)

