@@ -2,10 +2,10 @@
 #include "judge.h"
 
 #include "allowances.h"
+#include "pattern.h"
 
 #include <algorithm>
 #include <csignal>
-#include <regex>
 #include <set>
 
 namespace
@@ -13,16 +13,6 @@ namespace
 
 using STRINGS = std::vector<std::string>;
 using std::string;
-
-bool Matches(const string &szText, const char *szPattern)
-{
-    static std::map<string, std::regex> compiled;
-    auto found = compiled.find(szPattern);
-    if (found == compiled.end()) {
-        found = compiled.emplace(szPattern, std::regex(szPattern)).first;
-    }
-    return std::regex_search(szText, found->second);
-}
 
 string WordsJoin(const STRINGS &words)
 {
@@ -59,10 +49,10 @@ void Differs(SUBJECT &subject, DIFFERENCE difference, const string &szText, cons
     for (size_t row = 0; row < std::size(ALLOWANCES); row++) {
         const ALLOWANCE &allowance = ALLOWANCES[row];
         if (allowance.difference == difference &&
-            Matches(subject.szSituation, allowance.szSituation) &&
-            Matches(szText, allowance.szText) &&
+            PatternMatches(subject.szSituation, allowance.szSituation) &&
+            PatternMatches(szText, allowance.szText) &&
             std::any_of(subject.faults.begin(), subject.faults.end(), [&](const string &szFault) {
-                return Matches(szFault, allowance.szFault);
+                return PatternMatches(szFault, allowance.szFault);
             })) {
             subject.verdict.allowed[row]++;
             return;
@@ -247,8 +237,8 @@ bool NewvolSaysRight(SUBJECT &subject)
     if (SaysLike(result, 1, "") || SaysLike(result, 1, "No disk to create RAID... \n")) {
         return true;
     }
-    static const std::regex making("^Creating RAID [015] volume\\.\\.\\. \n$");
-    if (!std::regex_match(result.szOut, making) || result.status > 1) {
+    if (!PatternMatches(result.szOut, "^Creating RAID [015] volume\\.\\.\\. \n$") ||
+        result.status > 1) {
         return false;
     }
     if (result.szOut != subject.clean.szOut) {
@@ -275,11 +265,10 @@ bool EnumerationSaysRight(SUBJECT &subject)
     if (SaysLike(result, 1, "") || SaysLike(result, STATUS_LIST_FAILED, "")) {
         return true;
     }
-    static const std::regex numbers("^([0-9]+ )*$");
     const bool fAll = result.szOut == "all" && result.status > 0 &&
                       subject.words[0] == "enumformatalldisks_indualhead_install";
     const auto nNumber = std::count(result.szOut.begin(), result.szOut.end(), ' ');
-    if (!fAll && (!std::regex_match(result.szOut, numbers) || nNumber != result.status)) {
+    if (!fAll && (!PatternMatches(result.szOut, "^([0-9]+ )*$") || nNumber != result.status)) {
         return false;
     }
     Differs(subject, DIFFERENCE::ANSWER, "[" + result.szOut + "]", "it lists other disks");

@@ -8,6 +8,7 @@
 // The tool is killed alone, so that what it has started comes to its own end, or with all of that
 // at any system call of its own processes. Without --all, one in N points is tried.
 #include "harness/room.h"
+#include "pattern.h"
 #include "sandbox.h"
 #include "storage_machine.h"
 
@@ -18,7 +19,6 @@
 #include <filesystem>
 #include <fstream>
 #include <map>
-#include <regex>
 #include <set>
 #include <sstream>
 #include <sys/wait.h>
@@ -200,7 +200,7 @@ STRINGS Without(const STRINGS &lines, const STRINGS &others)
 const LEFT_OTHERWISE *RowOf(const KILL_CASE &subject, const string &szLine, bool fMissing)
 {
     for (const LEFT_OTHERWISE &row : subject.allowed) {
-        if (row.fMissing == fMissing && std::regex_search(szLine, std::regex(row.szLine))) {
+        if (row.fMissing == fMissing && PatternMatches(szLine, row.szLine)) {
             return &row;
         }
     }
