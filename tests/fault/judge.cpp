@@ -321,7 +321,7 @@ VERDICT Judge(const SITUATION &situation, const RUN_RESULT &clean, const RUN_RES
     SUBJECT subject = {situation.szName, situation.words, clean, result, FaultsOf(result), {}};
     JudgeEnd(subject);
     JudgeCommands(subject);
-    if (result.status >= 0) {
+    if (result.status >= 0 && result.szErr.empty()) {
         JudgeWords(subject);
     }
     return subject.verdict;

@@ -6,19 +6,28 @@
 #include <cstdio>
 #include <cstdlib>
 #include <map>
+#include <memory>
 #include <regex.h>
 #include <string>
 
+struct PATTERN_FREE {
+    void operator()(regex_t *p) const
+    {
+        regfree(p);
+        delete p;
+    }
+};
+
 inline bool PatternMatches(const std::string &szText, const char *szPattern)
 {
-    static std::map<std::string, regex_t> compiled;
-    auto found = compiled.find(szPattern);
-    if (found == compiled.end()) {
-        found = compiled.emplace(szPattern, regex_t{}).first;
-        if (regcomp(&found->second, szPattern, REG_EXTENDED | REG_NOSUB) != 0) {
+    static std::map<std::string, std::unique_ptr<regex_t, PATTERN_FREE>> compiled;
+    std::unique_ptr<regex_t, PATTERN_FREE> &pPattern = compiled[szPattern];
+    if (pPattern == nullptr) {
+        pPattern.reset(new regex_t{});
+        if (regcomp(pPattern.get(), szPattern, REG_EXTENDED | REG_NOSUB) != 0) {
             fprintf(stderr, "no regular expression: %s\n", szPattern);
             abort();
         }
     }
-    return regexec(&found->second, szText.c_str(), 0, nullptr, 0) == 0;
+    return regexec(pPattern.get(), szText.c_str(), 0, nullptr, 0) == 0;
 }
