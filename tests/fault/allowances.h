@@ -88,8 +88,6 @@ inline constexpr ALLOWANCE ALLOWANCES[] = {
     {DIFFERENCE::EXTRA_CHANGE, "^(initsys|newvol)", CONF_LOOK, " -t8[23] ",
      "whether the machine has RAID cannot be read, so it has not, and partitions get the other "
      "types"},
-    {DIFFERENCE::EXTRA_CHANGE, "^(initsys|newvol): built-in storage", CONF_LOOK, "^/sbin/sfdisk -N",
-     "whether storage is built in cannot be read, so it is not, and partitions get other places"},
     {DIFFERENCE::EXTRA_CHANGE, "^initsys", CONF_LOOK,
      "^/sbin/mdadm --zero-superblock /dev/sd[a-z]+[12]$",
      "a number of slots that cannot be read is 0 (or that of all disks), and disks without a slot "
