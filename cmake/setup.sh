@@ -18,6 +18,7 @@ PACKAGES=(
     qemu-system-x86 qemu-utils   # the virtual appliance
     busybox-static kmod cpio gzip xz-utils
     mdadm lvm2 dmsetup e2fsprogs gdisk
+    mandoc lintian               # the manual page, the Debian packages
     procps ca-certificates
 )
 
