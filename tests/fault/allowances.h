@@ -35,8 +35,8 @@ struct ALLOWANCE {
 inline constexpr ALLOWANCE ALLOWANCES[] = {
     {DIFFERENCE::OTHER_DISK, "^(initsys|newvol): an expansion unit", CONF_LOOK,
      " /dev/sd[ab][123]?( |$)",
-     "WIPES: whether the machine is dual-head cannot be read, so it is not, and the internal disks "
-     "are taken instead of the expansion unit's"},
+     "WIPES: whether the machine is dual-head cannot be read, so it is not, and the internal "
+     "disks are taken instead of the expansion unit's"},
     {DIFFERENCE::OTHER_DISK, "^(initsys|newvol): an expansion unit", UNIT_LOOK,
      "mdadm -C /dev/md[012] .* /dev/sdg[abc][123]",
      "disks that the expansion unit cannot tell of are not in it; the others are used"},
@@ -51,36 +51,27 @@ inline constexpr ALLOWANCE ALLOWANCES[] = {
      "^initsys: (an old disk in an array|the biggest layout|a disk that nobody knows)", DISK_LOOK,
      "fast-delete -1 ",
      "WIPES: a disk of another layout counts as free when its superblock cannot be examined, and "
-     "as "
-     "blank when the partitioner cannot be asked"},
+     "as blank when the partitioner cannot be asked"},
     {DIFFERENCE::OTHER_DISK, "^initsys: (an old disk in an array|the biggest layout)", DISK_LOOK,
      "fast-delete 1:2 ",
-     "RENEWS: a disk whose layout cannot be read has none, and gets new system partitions as long "
-     "as "
-     "no other disk keeps its data"},
+     "RENEWS: a disk whose layout cannot be read has none, and gets new system partitions as "
+     "long as no other disk keeps its data"},
     {DIFFERENCE::OTHER_DISK, "^initsys: (an old disk in an array|the biggest layout)", DISK_LOOK,
      "^/sbin/(sfdisk (-M1|-N[12]) |mdadm -C /dev/md[01] )",
      "what follows on a disk that was wiped or renewed for one of these reasons"},
     {DIFFERENCE::OTHER_DISK, "^initsys: a disk that nobody knows is left alone", DISK_LOOK,
      "^/sbin/(sfdisk (--fast-delete 1:2|-M1|-N[12]) |mdadm -C /dev/md[01] )",
      "RENEWS: when the only disk that keeps its data is not known as one, the disks without a "
-     "known "
-     "layout get new system partitions"},
+     "known layout get new system partitions"},
     {DIFFERENCE::OTHER_DISK, "^destroy: a stop that fails", "^(waitpid|\\*) ",
      "^/sbin/mdadm --zero-superblock ",
      "WIPES: a tool that somebody else has waited for counts as one that worked; so the "
-     "superblocks "
-     "go although the array still runs"},
+     "superblocks go although the array still runs"},
     {DIFFERENCE::OTHER_DISK, "^newvol: a partition that cannot be made", "^(waitpid|\\*) ", "",
      "a tool that somebody else has waited for counts as one that worked"},
     {DIFFERENCE::OTHER_DISK, "^destroy: volumes that cannot", "^(fgets|\\*) .* pipe$",
      "^/sbin/(lvremove|vgremove) ",
      "the last row that names the array counts; rows after a failed read are not there"},
-    {DIFFERENCE::EXTRA_CHANGE, "^destroy: a partition with a boot sector", "^(fgets|\\*) .* pipe$",
-     "^/sbin/mdadm --zero-superblock /dev/sda4$",
-     "WIPES: a report that ends before its UUID tells of an empty one, which fits every report "
-     "without "
-     "one"},
 
     {DIFFERENCE::EXTRA_CHANGE, "^initsys", CHILD_WORK "|" CONF_LOOK "|" UNIT_LOOK,
      "^(/sbin/mdadm -C /dev/md[01] |/bin/nurodd)",
@@ -90,21 +81,19 @@ inline constexpr ALLOWANCE ALLOWANCES[] = {
      "types"},
     {DIFFERENCE::EXTRA_CHANGE, "^initsys", CONF_LOOK,
      "^/sbin/mdadm --zero-superblock /dev/sd[a-z]+[12]$",
-     "a number of slots that cannot be read is 0 (or that of all disks), and disks without a slot "
-     "lose "
-     "the superblocks of their new partitions"},
+     "a number of slots that cannot be read is 0 (or that of all disks), and disks without a "
+     "slot lose the superblocks of their new partitions"},
     {DIFFERENCE::EXTRA_CHANGE, "^initsys", DISK_LOOK, "fast-delete -1 ",
-     "WIPES: a disk counts as blank when the partitioner cannot be asked for either partition, and "
-     "as "
-     "free when its superblock cannot be examined"},
+     "WIPES: a disk counts as blank when the partitioner cannot be asked for either partition, "
+     "and as free when its superblock cannot be examined"},
     {DIFFERENCE::EXTRA_CHANGE, "^initsys: all disks are to be wiped", "^(access|\\*) .*force_clean",
      "^/sbin/sfdisk --fast-delete 1:2 ", "a marker that cannot be seen is not there"},
     {DIFFERENCE::EXTRA_CHANGE, "^initsys: the biggest layout", DISK_LOOK, "^/sbin/sfdisk -N[12] ",
      "a disk that cannot be looked at has no part in the choice of the layout"},
     {DIFFERENCE::EXTRA_CHANGE, "^initsys: an old disk in an array",
      "^(glob|fopen|fgets|access) |/sys/|" CONF_LOOK, "^/sbin/sfdisk -N[12] ",
-     "WIPES: a system array whose members cannot be listed is not there, and the layout of another "
-     "disk is chosen"},
+     "WIPES: a system array whose members cannot be listed is not there, and the layout of "
+     "another disk is chosen"},
     {DIFFERENCE::EXTRA_CHANGE, "^initsys: a disk that cannot be partitioned", "^(waitpid|\\*) ",
      "^/sbin/sfdisk -N2 ", "a tool that somebody else has waited for counts as one that worked"},
     {DIFFERENCE::EXTRA_CHANGE, "^newvol", "^(access|\\*) .*/tmp/raid\\.",
@@ -131,8 +120,8 @@ inline constexpr ALLOWANCE ALLOWANCES[] = {
     {DIFFERENCE::ANSWER, "^status", "dev-sd|" ALLOCATION, "",
      "a member whose attributes cannot be read is left out of the report"},
     {DIFFERENCE::ANSWER, "^enum", CHILD_WORK "|" CONF_LOOK "|" UNIT_LOOK "|/sys/|pipe$", "",
-     "a disk whose decision is lost is none that keeps its data, and without one all are listed; a "
-     "disk whose port is not known is not listed"},
+     "a disk whose decision is lost is none that keeps its data, and without one all are listed; "
+     "a disk whose port is not known is not listed"},
     {DIFFERENCE::ANSWER, "^newvol", "/tmp/raid\\.|^waitpid |" CONF_LOOK "|" UNIT_LOOK, "",
      "the array is made of the disks that are known, at the level that fits their number"},
 

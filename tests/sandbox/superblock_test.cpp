@@ -536,6 +536,28 @@ TEST(SuperblockGet, AMalformedLineEndsTheReading)
     EXPECT_EQ(LogText(result), "<11>raid_superblock.cpp:# bad version format: 'bad'.\n");
 }
 
+TEST(SuperblockGet, AReportThatCannotBeReadToItsEndFails)
+{
+    for (int nCall = 1; nCall <= 4; nCall++) { // three lines, and the end
+        MACHINE machine = MachineMake();
+        MachineTool(machine, ExamineCommand("sda3"), {.szOut = ReportOf(UUID_MD2)});
+        machine.faults = {{.szFunction = "fgets", .nCall = nCall, .error = EIO}};
+        (void)MachineCall(machine, [] {
+            RAID_SUPERBLOCK superblock = {};
+            EXPECT_EQ(RAIDSuperblockGet("/dev/sda3", &superblock), -1);
+        });
+    }
+    // An interruption is none: the line is read again.
+    MACHINE machine = MachineMake();
+    MachineTool(machine, ExamineCommand("sda3"), {.szOut = ReportOf(UUID_MD2)});
+    machine.faults = {{.szFunction = "fgets", .nCall = 2, .error = EINTR}};
+    (void)MachineCall(machine, [] {
+        RAID_SUPERBLOCK superblock = {};
+        EXPECT_EQ(RAIDSuperblockGet("/dev/sda3", &superblock), 1);
+        EXPECT_STREQ(superblock.szUuid, UUID_MD2);
+    });
+}
+
 TEST(SuperblockGet, AMissingCommandIsNoSuperblock)
 {
     MACHINE machine = MachineMake();

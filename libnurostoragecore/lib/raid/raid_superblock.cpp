@@ -176,5 +176,6 @@ int RAIDSuperblockGet(const char *szDevice, RAID_SUPERBLOCK *pSuperblock)
         }
         result = 1;
     }
-    return result;
+    // Half a report would pass for one of an array without a UUID.
+    return feof(pReport.get()) != 0 ? result : -1;
 }
