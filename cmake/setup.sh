@@ -17,6 +17,11 @@ PACKAGES=(
     binutils strace              # readelf and system-call counts
     qemu-system-x86 qemu-utils   # the virtual appliance
     busybox-static kmod cpio gzip xz-utils
+    g++-powerpc-linux-gnu        # the appliance's own processor: the compiler,
+    qemu-user-static             # its programs on this machine,
+    qemu-system-ppc              # a whole machine of it,
+    linux-source-6.1 make bc bison flex # and the kernel of that machine
+    g++-12-multilib              # 32-bit words on this machine
     mdadm lvm2 dmsetup e2fsprogs gdisk
     mandoc lintian               # the manual page, the Debian packages
     procps ca-certificates

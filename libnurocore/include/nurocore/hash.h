@@ -20,6 +20,8 @@ struct NLIBHASH {
     char *pPoolNext; // first byte of the pool not taken yet
 };
 
+static_assert(sizeof(NLIBHASH) == 4 * sizeof(i32) + sizeof(char *));
+
 using PNLIBHASH = NLIBHASH *;
 
 // An empty table of nSlot slots and cbPool bytes for texts. The caller frees it with

@@ -34,15 +34,17 @@ struct SYNC_STATUS {
 constexpr unsigned long MD_GET_SYNC_STATUS = _IOR(MD_MAJOR, 0x60, SYNC_STATUS);
 constexpr unsigned long MD_GET_ARRAY_STATUS = _IOR(MD_MAJOR, 0x61, i32);
 
+// Each platform builds the numbers from its own direction bits. The size of a size_t goes into one
+// of them, though it always moves 64 bits.
 static_assert(sizeof(SYNC_STATUS) == 24 && sizeof(mdu_array_info_t) == 72);
 #if defined(__powerpc__)
 static_assert(GET_ARRAY_INFO == 0x40480911 && MD_GET_ARRAY_STATUS == 0x40040961 &&
               MD_GET_SYNC_STATUS == 0x40180960);
-static_assert(sizeof(size_t) == 8 || BLKGETSIZE64 == 0x40041272);
+static_assert(BLKGETSIZE64 == (sizeof(size_t) == 8 ? 0x40081272 : 0x40041272));
 #else
 static_assert(GET_ARRAY_INFO == 0x80480911 && MD_GET_ARRAY_STATUS == 0x80040961 &&
               MD_GET_SYNC_STATUS == 0x80180960);
-static_assert(sizeof(size_t) == 4 || BLKGETSIZE64 == 0x80081272);
+static_assert(BLKGETSIZE64 == (sizeof(size_t) == 8 ? 0x80081272 : 0x80041272));
 #endif
 
 constexpr u64 BYTES_PER_KIB = 1024;
