@@ -15,6 +15,8 @@ PACKAGES=(
     fdisk util-linux             # reading back what the partitioner wrote
     python3                      # include-direction check, small reports
     binutils strace              # readelf and system-call counts
+    libclang-rt-14-dev           # the fuzz ring
+    valgrind                     # the valgrind ring
     qemu-system-x86 qemu-utils   # the virtual appliance
     busybox-static kmod cpio gzip xz-utils
     g++-powerpc-linux-gnu        # the appliance's own processor: the compiler,

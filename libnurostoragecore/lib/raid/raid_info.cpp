@@ -99,9 +99,9 @@ bool WordAppend(WORD &word, char ch)
     return true;
 }
 
-bool IsWord(const WORD &word, const char *szExpected)
+bool IsWord(const WORD &word, std::string_view expected)
 {
-    return word.cch > 0 && strcmp(word.pszText.get(), szExpected) == 0;
+    return std::string_view(word.pszText.get(), word.cch) == expected;
 }
 
 bool EndsInActive(const WORD &word)
@@ -149,7 +149,7 @@ WORD WordRead(FILE *pFile)
         if (fSeparator) {
             continue;
         }
-        if (ch == chQuote) {
+        if (chQuote != 0 && ch == chQuote) {
             chQuote = 0;
         } else if (chQuote == 0 && (ch == '"' || ch == '\'')) {
             chQuote = ch;

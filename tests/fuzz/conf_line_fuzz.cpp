@@ -1,0 +1,57 @@
+// SPDX-License-Identifier: MIT
+//
+// The first line is a key, the rest a line of a configuration file.
+#include "nurocore/keyvalue.h"
+#include "nurocore/text.h"
+
+#include "conf_model.h"
+#include "fuzz.h"
+
+#include <vector>
+
+namespace
+{
+
+std::string TrimmedInPlace(std::string text)
+{
+    const int cch = NLIBCStrTrimSpace(text.data(), nullptr);
+    Claim(cch >= 0 && static_cast<size_t>(cch) == strlen(text.c_str()), "the length is the text's");
+    return text.c_str();
+}
+
+void TokensTell(const std::string &line)
+{
+    constexpr char DELIMITERS[] = " \t";
+    std::vector<std::string> expected;
+    for (size_t i = line.find_first_not_of(DELIMITERS); i != std::string::npos;
+         i = line.find_first_not_of(DELIMITERS, i)) {
+        expected.push_back(line.substr(i, line.find_first_of(DELIMITERS, i) - i));
+        i += expected.back().size();
+    }
+    PNLIBSZLIST pList = NLIBCSzListAlloc(128);
+    const int nField = NLIBCStrTok(line.c_str(), DELIMITERS, &pList);
+    Claim(nField == static_cast<int>(expected.size()), "as many fields");
+    for (int i = 0; i < nField; i++) {
+        Claim(NLIBCSzListGet(pList, i) == expected[static_cast<size_t>(i)], "the same fields");
+    }
+    NLIBCSzListFree(pList);
+}
+
+} // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *pInput, size_t cbInput)
+{
+    std::string_view rest = InputText(pInput, cbInput);
+    const std::string key = CString(TakeUntil(rest, '\n'));
+    const std::string line = CString(rest);
+
+    const bool fMatch = NLIBCFileLineKeyMatch(line.c_str(), key.c_str()) == 1;
+    Claim(fMatch == ModelKeyMatch(line, key), "the key matches as the model's does");
+    Claim(TrimmedInPlace(line) == ModelTrim(line), "trimmed in place");
+    std::string trimmed(line.size() + 1, '#');
+    Claim(NLIBCStrTrimSpace(std::string(line).data(), trimmed.data()) >= 0 &&
+              trimmed.c_str() == ModelTrim(line),
+          "trimmed into another buffer");
+    TokensTell(line);
+    return 0;
+}

@@ -1,0 +1,84 @@
+// SPDX-License-Identifier: MIT
+#pragma once
+
+// What every fuzz target shares: a claim that ends the process when it does not hold, and an input
+// that can be read as one text or byte by byte.
+
+#include <cstdint>
+#include <cstdio>
+#include <string>
+#include <string_view>
+
+inline void Claim(bool fHolds, const char *szClaim)
+{
+    if (!fHolds) {
+        (void)fprintf(stderr, "does not hold: %s\n", szClaim);
+        __builtin_trap();
+    }
+}
+
+inline std::string_view InputText(const std::uint8_t *pInput, size_t cbInput)
+{
+    return {reinterpret_cast<const char *>(pInput), cbInput};
+}
+
+// Cuts `rest` behind its first `separator` and returns what stood before it.
+inline std::string_view TakeUntil(std::string_view &rest, char separator)
+{
+    const std::string_view taken = rest.substr(0, rest.find(separator));
+    rest.remove_prefix(taken.size() < rest.size() ? taken.size() + 1 : taken.size());
+    return taken;
+}
+
+// What a function of the C library sees of a text: nothing behind a NUL.
+inline std::string CString(std::string_view text)
+{
+    return std::string(text.substr(0, text.find('\0')));
+}
+
+// The lines as fgets hands them out with a buffer of cbLine bytes.
+template <typename TAKE>
+void ForEachLine(std::string_view text, size_t cbLine, TAKE take)
+{
+    while (!text.empty()) {
+        const size_t cchToEnd = text.find('\n');
+        const size_t cchLine = cchToEnd == std::string_view::npos ? text.size() : cchToEnd + 1;
+        const std::string_view line = text.substr(0, cchLine < cbLine ? cchLine : cbLine - 1);
+        text.remove_prefix(line.size());
+        if (!take(CString(line))) {
+            return;
+        }
+    }
+}
+
+// An input as a series of decisions; all zero at its end. What is checked after every one grows
+// with their number, so there are not too many.
+struct DECISIONS {
+    std::string_view rest;
+
+    explicit DECISIONS(std::string_view input) : rest(input.substr(0, 240))
+    {
+    }
+
+    int Below(int n)
+    {
+        if (rest.empty()) {
+            return 0;
+        }
+        const int byte = static_cast<unsigned char>(rest.front());
+        rest.remove_prefix(1);
+        return byte % n;
+    }
+    // Few letters, so that equals and neighbours come often; never empty, long ones seldom.
+    std::string Text(std::string_view letters)
+    {
+        const int length = Below(256);
+        const int cch = length < 250 ? 1 + length % 5 : 1 + (length - 249) * 50;
+        std::string text;
+        for (int i = 0; i < cch; i++) {
+            const int letter = cch <= 5 ? Below(static_cast<int>(letters.size())) : i;
+            text += letters[static_cast<size_t>(letter) % letters.size()];
+        }
+        return text;
+    }
+};

@@ -1,0 +1,63 @@
+// SPDX-License-Identifier: MIT
+//
+// The first byte is the size of the caller's buffer in steps of 16, the rest what a SCSI host says
+// of the expansion unit behind it. A second host always reports sdz.
+#include "hwcontrol/disk_port.h"
+
+#include "conf_model.h"
+#include "outside.h"
+
+#include <vector>
+
+namespace
+{
+
+constexpr char KEY[] = "nuro_device_list";
+constexpr char SECOND_HOST[] = "nuro_device_list=/dev/sdz\n";
+
+// The names of one list, read with scanf.
+std::vector<std::string> ModelNames(const std::string &list)
+{
+    std::vector<std::string> names;
+    const char *pch = list.c_str();
+    char szName[16];
+    int cch = 0;
+    while (sscanf(pch, "/dev/%15[a-zA-Z]%n", szName, &cch) == 1) {
+        names.emplace_back(szName);
+        pch += cch;
+        if (*pch++ != ',') {
+            break;
+        }
+    }
+    return names;
+}
+
+} // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *pInput, size_t cbInput)
+{
+    if (cbInput == 0) {
+        return 0;
+    }
+    const size_t cbOut = pInput[0] * size_t(16) + 1;
+    const std::string_view file = InputText(pInput + 1, cbInput - 1);
+    OutsideClear();
+    OutsideFile("/sys/class/scsi_host/host0/nuro_pm_info", file);
+    OutsideFile("/sys/class/scsi_host/host1/nuro_pm_info", SECOND_HOST);
+    std::vector<char> out(cbOut, '#');
+    const int result = ExternalDiskPortEnumEunit(0, out.data(), static_cast<int>(cbOut));
+
+    const MODEL_LOOKUP lookup = ModelLookup(file, KEY, 256, false);
+    std::vector<std::string> names =
+        lookup.result > 0 ? ModelNames(lookup.text) : std::vector<std::string>();
+    names.emplace_back("sdz");
+    std::string expected;
+    bool fFits = true;
+    for (const std::string &name : names) {
+        fFits = fFits && expected.size() + name.size() <= cbOut;
+        expected = fFits ? (expected + name + " ").substr(0, cbOut - 1) : expected;
+    }
+    Claim(result == (fFits ? 0 : -1), "everything fits or not");
+    Claim(out.data() == expected, "the names reported");
+    return 0;
+}

@@ -1,0 +1,24 @@
+// SPDX-License-Identifier: MIT
+//
+// The input is /proc/devices. The room itself is compiled in: its answer is cached for the life of
+// a process, and the words are read behind that.
+#include "raid/raid_info.cpp" // NOLINT(bugprone-suspicious-include)
+
+#include "fuzz.h"
+#include "outside.h"
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *pInput, size_t cbInput)
+{
+    const std::string_view file = InputText(pInput, cbInput);
+    OutsideClear();
+    OutsideFile(DEVICES_PATH, file);
+    const i32 number = MdpMajorRead();
+    Claim(number >= MAJOR_UNKNOWN, "a major number or none");
+
+    std::string bare(file);
+    std::erase_if(bare, [](char ch) { return ch == '"' || ch == '\''; });
+    const size_t section = bare.find("devices:", std::min(bare.find("Block"), bare.size()));
+    const bool fWords = bare.find("mdp", std::min(section, bare.size())) != std::string::npos;
+    Claim(fWords || number == MAJOR_UNKNOWN, "no number without the words");
+    return 0;
+}

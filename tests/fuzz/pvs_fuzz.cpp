@@ -1,0 +1,49 @@
+// SPDX-License-Identifier: MIT
+//
+// The input is what pvs prints of the physical volumes.
+#include "nurostoragecore/lvm.h"
+
+#include "fuzz.h"
+#include "outside.h"
+
+#include <array>
+#include <optional>
+
+namespace
+{
+
+constexpr size_t PATH_SIZE = 256;
+
+// None when there is no row, or one of fewer than four fields.
+std::optional<std::string> ModelPath(std::string_view rows)
+{
+    std::optional<std::string> row;
+    ForEachLine(rows, 1024, [&](const std::string &line) {
+        row = line.find("/dev/md2") != std::string::npos ? line : row;
+        return true;
+    });
+    const size_t group = row.has_value() ? row->find(':') : std::string::npos;
+    const size_t volume = group == std::string::npos ? group : row->find(':', group + 1);
+    const size_t origin = volume == std::string::npos ? volume : row->find(':', volume + 1);
+    if (origin == std::string::npos) {
+        return {};
+    }
+    const std::string path = "/dev/" + row->substr(group + 1, volume - group - 1) + "/" +
+                             row->substr(volume + 1, origin - volume - 1);
+    return path.substr(0, PATH_SIZE - 1);
+}
+
+} // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *pInput, size_t cbInput)
+{
+    const std::string_view rows = InputText(pInput, cbInput);
+    OutsideClear();
+    OutsideToolOutput(rows);
+    std::array<char, PATH_SIZE> path = {};
+    const int result = LVMGetLVPath("/dev/md2", path.data(), static_cast<int>(path.size()));
+    const auto expected = ModelPath(rows);
+    Claim(result == (expected.has_value() ? 0 : -1), "a row is found or not");
+    Claim(result != 0 || *expected == path.data(), "the path of the row");
+    return 0;
+}
