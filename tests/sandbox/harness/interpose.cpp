@@ -34,6 +34,9 @@
 
 #include <linux/raid/md_u.h>
 
+// Present in programs that count what runs.
+extern "C" void __gcov_dump() __attribute__((weak));
+
 namespace
 {
 
@@ -263,10 +266,21 @@ bool IsCounted(const FAULT &fault, const char *szFunction)
             (fault.fGoOn && fault.nSeen >= fault.nCall));
 }
 
+// A program that counts saves its counts when it ends, and no call of that is to fail.
+void EndAwait()
+{
+    static bool fAwaited = false;
+    if (__gcov_dump != nullptr && g_fActive && !fAwaited) {
+        fAwaited = true;
+        (void)atexit(InterposeDeactivate);
+    }
+}
+
 // True when this call is the one that has to fail; errno is set then.
 bool FaultIsDue(const char *szFunction, const char *szObject = NO_OBJECT)
 {
     const int errnoAtEntry = errno;
+    EndAwait();
     if (g_fActive && g_fCallsTold) {
         CallTell(szFunction, szObject);
     }
@@ -732,19 +746,14 @@ WRAP_CALL("scandir", sz, scandir64, int, -1,
            int (*pCompare)(const struct dirent64 **, const struct dirent64 **)),
           (sz, p, pFilter, pCompare))
 
-// Children of the program end by _exit, which drops what a coverage build has counted.
-#ifdef SANDBOX_COVERAGE
+// Children of the program end by _exit, which drops what a program that counts has counted.
 VISIBLE void Wrap__exit(int status) __asm__("_exit");
 VISIBLE void Wrap__exit(int status)
 {
-    static void (*pDump)() = nullptr;
-    if (Next(pDump, "__gcov_dump") == nullptr) {
-        pDump = reinterpret_cast<void (*)()>(dlsym(RTLD_DEFAULT, "__gcov_dump"));
-    }
-    if (g_fActive && pDump != nullptr) {
-        pDump();
+    if (g_fActive && __gcov_dump != nullptr) {
+        g_fActive = false;
+        __gcov_dump();
     }
     (void)syscall(SYS_exit_group, status);
     __builtin_unreachable();
 }
-#endif

@@ -179,16 +179,23 @@ std::string NullBind()
     return "";
 }
 
-// A coverage build writes its counts beside its object files, wherever it runs.
+std::string FromEnvironment(const char *szName, const char *szDefault)
+{
+    const char *const sz = getenv(szName);
+    return sz != nullptr && *sz != '\0' ? sz : szDefault;
+}
+
+// Programs that count what runs save the counts in their folder, wherever they run.
 std::string CoverageBind()
 {
-#ifdef SANDBOX_COVERAGE
-    const std::string szFolder = SANDBOX_COVERAGE;
+    const std::string szFolder = FromEnvironment("ARRAYCTL_COVERAGE", "");
+    if (szFolder.empty()) {
+        return "";
+    }
     FoldersMake(szFolder);
     if (mount(szFolder.c_str(), Inside(szFolder).c_str(), nullptr, MS_BIND, nullptr) != 0) {
         return Refused("bind of " + szFolder);
     }
-#endif
     return "";
 }
 
@@ -206,12 +213,6 @@ std::string FileCopy(const std::string &szFrom, const std::string &szTo)
     (void)fclose(p);
     TextWrite(Inside(szTo), szBytes, 0755);
     return "";
-}
-
-std::string FromEnvironment(const char *szName, const char *szDefault)
-{
-    const char *const sz = getenv(szName);
-    return sz != nullptr && *sz != '\0' ? sz : szDefault;
 }
 
 std::string ProgramsCopy()
