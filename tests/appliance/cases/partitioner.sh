@@ -6,38 +6,14 @@
 # disks: 4
 # size: 6G
 # timeout: 180
-# shellcheck disable=SC2317  # check and must call the functions
 # shellcheck source=SCRIPTDIR/../lib.sh
 . /appliance/lib.sh
 plan 11
-checks=0
-failures=0
-
-# verdict NAME: one for all the checks since the one before.
-verdict() {
-    if [ "$failures" -eq 0 ]; then
-        pass "$1 ($checks checks)"
-    else
-        fail "$1" "$failures of $checks checks failed"
-    fi
-    checks=0
-    failures=0
-}
-
-check() {
-    what=$1
-    shift
-    checks=$((checks + 1))
-    : >"$ERRORS"
-    if ! "$@"; then
-        failures=$((failures + 1))
-        echo "wrong: $what: $*"
-        show_file "on standard error" "$ERRORS"
-    fi
-}
 
 does() {
-    sfdisk "$@" 2>"$ERRORS" && [ ! -s "$ERRORS" ]
+    sfdisk "$@" 2>"$ERRORS" && [ ! -s "$ERRORS" ] && return
+    cat "$ERRORS"
+    return 1
 }
 
 # The line it must say, then the command.
@@ -45,7 +21,9 @@ refuses() {
     line=$1
     shift
     sfdisk "$@" 2>"$ERRORS" && return 1
-    [ "$(cat "$ERRORS")" = "sfdisk: $line" ]
+    [ "$(cat "$ERRORS")" = "sfdisk: $line" ] && return
+    cat "$ERRORS"
+    return 1
 }
 
 creates() {
@@ -73,10 +51,6 @@ label_is() {
 
 only_dos() {
     [ "$(wipefs --noheadings -O TYPE "/dev/$1")" = dos ]
-}
-
-is_not() {
-    ! "$@"
 }
 
 stock_table() {
