@@ -1,18 +1,21 @@
 #!/bin/sh
 # SPDX-License-Identifier: MIT
-# The tool is killed at a random moment while it makes or takes down a data array, alone or with all
-# that it has started, and is run again: the machine is then as if nothing had happened.
+# The tool is killed at a random moment while it makes or takes down a data array, or sets up blank
+# disks, alone or with all that it has started, and is run again: the machine is then as if nothing
+# had happened.
 # disks: 2
 # size: 4672M
-# timeout: 240
+# timeout: 300
 # shellcheck disable=SC2317  # check must call the functions
 # shellcheck source=SCRIPTDIR/../lib.sh
 . /appliance/lib.sh
 # shellcheck source=SCRIPTDIR/../lib-setup.sh
 . /appliance/lib-setup.sh
-plan 6
+plan 8
 
-ROUNDS=20
+# Forty kills in all.
+ROUNDS=16
+SETUP_ROUNDS=4
 PID=/tmp/pid
 
 now() { # hundredths of a second
@@ -98,8 +101,61 @@ recover() {
     arrayctl newvol
 }
 
+# Disks that have never been in a machine.
+blank() {
+    for disk in sda sdb; do
+        for part in "/dev/$disk"[12]; do
+            mdadm -q --zero-superblock "$part" 2>/dev/null
+        done
+        must dd if=/dev/zero of="/dev/$disk" bs=1M count=1 conv=fsync
+        must blockdev --rereadpt "/dev/$disk"
+    done
+}
+
+# The driver has forgotten the arrays, as after a reboot: a partitioner leaves alone what is in use.
+reboot_arrays() {
+    for number in $(arrays_known); do
+        stop_arrays "$number"
+    done
+}
+
+partitions_of() {
+    set -- "/sys/block/$1/$1"[0-9]*
+    [ -e "$1" ] && echo "$#" || echo 0
+}
+
+# A disk with a system partition alone has no layout. It waits for somebody who knows it when the
+# other disk has one, and the arrays begin without it.
+disks_to_expect() {
+    case "$(partitions_of sda) $(partitions_of sdb)" in
+    '1 2') echo sdb missing ;;
+    '2 1') echo sda missing ;;
+    *) echo sda sdb ;;
+    esac
+}
+
+machine_is_set_up() {
+    for disk in "$@"; do
+        [ "$disk" = missing ] || table_is "$disk" "$LAYOUT_8" || return 1
+    done
+    system_arrays_are "$@"
+}
+
+setup_round() {
+    blank
+    moment=$(random_below "$initsys_length")
+    kill_at "$moment" "$1" initsys
+    reboot_arrays
+    disks=$(disks_to_expect)
+    arrayctl_awake initsys >/dev/null 2>&1
+    # shellcheck disable=SC2086
+    check "initsys, killed $1 after ${moment}0 ms" \
+        wait_for "$SETTLE_SECONDS" machine_is_set_up $disks
+    reboot_arrays
+}
+
 slow_resync
-machine internalportcfg=0x3 usbportcfg=0x40
+machine internalportcfg=0x3 usbportcfg=0x40 maxdisks=2
 lay_out sda "$LAYOUT_8"
 lay_out sdb "$LAYOUT_8"
 
@@ -125,4 +181,18 @@ for whom in alone all; do
     echo "superblocks wiped $wiped times, left $left times"
     verdict "superblocks after kills, $whom"
 done
+
+blank
+initsys_length=$(length_of initsys)
+check 'initsys' machine_is_set_up sda sdb
+verdict 'initsys without a kill'
+reboot_arrays
+for whom in alone all; do
+    turn=0
+    while [ "$turn" -lt "$SETUP_ROUNDS" ]; do
+        setup_round "$whom"
+        turn=$((turn + 1))
+    done
+done
+verdict "$((2 * SETUP_ROUNDS)) kills of the tool: initsys again"
 finish
