@@ -1,0 +1,182 @@
+#!/usr/bin/env python3
+# SPDX-License-Identifier: MIT
+"""Program, manual page and completion say the same: agreement.py BUILD_DIR
+
+What the program knows is asked of the program itself, in an empty root where it finds no disk and no
+tool, and read from the words it is made of.
+"""
+import glob
+import os
+import re
+import shutil
+import subprocess
+import sys
+import tempfile
+
+import cases
+
+ROOT = os.path.abspath(os.path.join(os.path.dirname(__file__), "../.."))
+PROGRAM = os.path.join(os.path.abspath(sys.argv[1]), "tool/arrayctl")
+COMMANDS = ("status", "destroy", "newvol", "initsys", "initsys-dd", "enumformatalldisks",
+            "enumformatalldisks_indualhead_install")
+MODEL = "maxdisks=4\nsupportraid=yes\nusbportcfg=0xf0\ninternalportcfg=0xf\n"
+LITERAL = r'((?:"(?:[^"\\]|\\.)*"\s*)+)'
+
+
+def read(path):
+    with open(os.path.join(ROOT, path), encoding="utf-8") as file:
+        return file.read()
+
+
+def sources():
+    paths = glob.glob("tool/*.cpp", root_dir=ROOT) + glob.glob("lib*/lib/*/*.cpp", root_dir=ROOT)
+    return "".join(read(path) for path in sorted(paths))
+
+
+def literal(text):
+    """The bytes of adjacent string literals."""
+    joined = "".join(re.findall(r'"((?:[^"\\]|\\.)*)"', text))
+    return joined.replace(r"\n", "\n").replace(r"\t", "\t").replace(r"\"", '"')
+
+
+def page():
+    """The page as it is read, one line a paragraph, in plain letters."""
+    text = subprocess.run(["mandoc", "-Tascii", "-O", "width=1000", "tool/arrayctl.8"], cwd=ROOT, check=True,
+                          capture_output=True, text=True).stdout
+    return re.sub(r".\x08", "", text)
+
+
+def section(name):
+    return re.search(rf"^{name}\n(.*?)(?=^[A-Z])", page(), re.S | re.M).group(1)
+
+
+def words_of(rows):
+    """The words of a constant table in the program."""
+    table = re.search(rf"{rows}\[\] = \{{(.*?)\n?\}};", read("tool/arrayctl.cpp"), re.S).group(1)
+    return re.findall(r'"([^"]*)"', re.sub(r"//.*", "", table))
+
+
+def run(*arguments):
+    """The program in an empty root that holds its loader, the C library and a model without disks."""
+    with tempfile.TemporaryDirectory() as root:
+        libraries = subprocess.run(["ldd", PROGRAM], check=True, capture_output=True, text=True).stdout
+        for library in re.findall(r"(/\S+)", libraries):
+            os.makedirs(root + os.path.dirname(library), exist_ok=True)
+            shutil.copy(library, root + library)
+        for folder in ("tmp", "etc.defaults", "dev"):
+            os.makedirs(os.path.join(root, folder))
+        open(os.path.join(root, "dev/null"), "w", encoding="ascii").close()
+        with open(os.path.join(root, "etc.defaults/nuroinfo.conf"), "w", encoding="ascii") as conf:
+            conf.write(MODEL)
+        shutil.copy(PROGRAM, root + "/arrayctl")
+        ended = subprocess.run(["chroot", root, "/arrayctl", *arguments], capture_output=True, text=True,
+                               check=False)
+        assert ended.stderr == "", ended.stderr
+        return ended.stdout, ended.returncode
+
+
+def case_the_page_has_the_commands_of_the_program():
+    cases.same(re.findall(r"^     arrayctl (\S+)", section("SYNOPSIS"), re.M), words_of("COMMANDS"), "SYNOPSIS")
+    cases.same(re.findall(r"^   (\S+)", section("DESCRIPTION"), re.M), words_of("COMMANDS"), "DESCRIPTION")
+
+
+def case_the_completion_has_the_commands_of_the_program():
+    listed = re.search(r"words=\((status.*?)\)", read("tool/completion/arrayctl"), re.S).group(1)
+    cases.same(listed.split(), words_of("COMMANDS"), "completion")
+
+
+def case_the_program_knows_these_commands_and_no_other():
+    cases.same(words_of("COMMANDS"), COMMANDS, "program")
+    for word in COMMANDS:
+        assert "command not recognized" not in run(word, "7")[0], word
+    assert run("stop")[0].startswith("command not recognized\nusage:\n")
+
+
+def case_the_usage_has_the_first_five_commands():
+    text, status = run()
+    assert status == 1
+    cases.same(re.findall(r"^\tarrayctl (\S+)", text, re.M), COMMANDS[:5], "usage")
+    assert "it leaves out the two enumerations" in page()
+
+
+def case_the_page_has_every_word_of_a_report():
+    for table in ("LEVEL_WORDS", "STATUS_WORDS", "REBUILD_WORDS", "DISK_WORDS"):
+        for word in words_of(table):
+            assert f"`{word[:15]}'" in page(), word
+
+
+def case_the_page_has_every_message():
+    """Each text of the program for people, up to the first value in it."""
+    printed = re.findall(r"(?:puts|printf)\(\s*" + LITERAL, read("tool/arrayctl.cpp"))
+    messages = {literal(text) for text in printed} - {"%s"}
+    heads = [re.split(r"%\d*[a-z.*]+|\n", message)[0].strip("\t [") or message for message in messages]
+    heads = [head.strip() for head in heads if not head.startswith("%s") and head.strip(" %s[]:.*\n\t")]
+    assert len(heads) >= 12, heads
+    for head in heads:
+        assert head in page(), head
+
+
+def case_the_page_has_the_exit_statuses():
+    statuses = section("EXIT STATUS")
+    cases.same(re.findall(r"^     (\d+|number of disks)\b", statuses, re.M), ("0", "1", "number of disks", "255"),
+               "EXIT STATUS")
+    expected = {"status": 1, "destroy": 0, "newvol": 1, "initsys": 1, "initsys-dd": 1, "enumformatalldisks": 0,
+                "enumformatalldisks_indualhead_install": 0}
+    for word, status in expected.items():
+        arguments = (word, "7") if word in ("status", "destroy") else (word,)
+        assert run(*arguments)[1] == status, word
+    constants = dict(re.findall(r"int (STATUS_\w+) = (-?\d+);", read("tool/arrayctl.cpp")))
+    assert constants == {"STATUS_OK": "0", "STATUS_FAILED": "1", "STATUS_PUSH_FAILED": "-1"}, constants
+
+
+def case_what_the_page_quotes_is_what_a_machine_without_disks_says():
+    assert run("status", "7") == ("RAID /dev/md7 is not found\n", 1)
+    assert run("destroy", "3") == ("Not found /dev/md3 \n", 0)
+    assert run("newvol") == ("No disk to create RAID... \n", 1)
+    assert run("initsys-dd")[0] == "system init with nurodd failed\n"
+    for quoted in ("RAID /dev/md7 is not found", "Not found /dev/md3", "No disk to create RAID...",
+                   "system init with nurodd failed"):
+        assert quoted in page(), quoted
+
+
+def case_the_page_has_every_configuration_key_that_a_command_asks():
+    asked = set(re.findall(r'NLIBCConfKeyIsYes\("(\w+)"\)', sources()))
+    asked |= set(re.findall(r'KEY_[A-Z_]+\[\] = "(\w+)"', sources()))
+    asked |= set(re.findall(r'NUROINFO_CONF_PATH, "(\w+)"', sources()))
+    asked |= set(re.findall(r'"(\w+portcfg)"', sources()))
+    # Asked by functions that no command calls.
+    asked -= {"supportsas", "no_disk_swap"}
+    assert len(asked) >= 10, asked
+    for key in asked:
+        assert re.search(rf"\b{key}\b", section("FILES")), key
+
+
+def case_the_page_has_every_file():
+    found = set(re.findall(r'"(/(?:tmp|etc\.defaults|var|run)/[^"%]+|/\.\w+)"', sources()))
+    found |= set(re.findall(r'LOG_PATH\[\] = "([^"]+)"', sources()))
+    assert len(found) >= 6, found
+    for path in found:
+        assert path in section("FILES"), path
+
+
+def case_the_page_is_clean():
+    lint = subprocess.run(["mandoc", "-Tlint", "-W", "warning", "tool/arrayctl.8"], cwd=ROOT,
+                          capture_output=True, text=True, check=False)
+    assert lint.returncode == 0 and lint.stdout == "", lint.stdout
+
+
+def case_the_log_page_has_every_line_that_ends_an_operation():
+    written = {literal(text) for text in re.findall(r"NLIBCLog\(LOG_ERR,\s*" + LITERAL, sources())}
+    calls = len(re.findall(r"NLIBCLog\(", sources()))
+    understood = len(re.findall(r"NLIBCLog\(LOG_(?:ERR|DEBUG),\s*" + LITERAL, sources()))
+    assert calls == understood, f"{calls - understood} log calls could not be read"
+    told = read("docs/log.md").split("### Notes", 1)[1].split("## The operation error log")[0]
+    told = re.sub(r"\n(?=[^|\n#])", " ", told)
+    listed = {text for text in re.findall(r"`([^`]+)`", told)}
+    missing = written - listed
+    assert not missing, f"docs/log.md lacks {sorted(missing)}"
+    foreign = {text for text in listed - written if re.search(r"%[a-z]", text)}
+    assert not foreign, f"docs/log.md has what nothing writes: {sorted(foreign)}"
+
+
+cases.run(sys.modules[__name__])
