@@ -105,6 +105,37 @@ TEST(DiskFormatType, WithoutANameThereIsNothingToDo)
     EXPECT_EQ(DiskFormatTypeGet(nullptr, 8), 0);
 }
 
+// A disk that was left alone has no child; if it had one, the child would not touch it.
+TEST(Partitioning, OfADiskThatIsLeftAloneFails)
+{
+    for (const int type : {0, 3, 5, 255}) {
+        EXPECT_EQ(PartitionInChild("no_such_disk", type, 8), 255) << type;
+    }
+}
+
+pid_t ChildWithStatus(int status)
+{
+    const pid_t pid = fork();
+    if (pid == 0) {
+        _exit(status);
+    }
+    return pid;
+}
+
+// A disk that finds no place in its list ends the collecting; the disk's kind tells the list.
+TEST(FormatTypes, ADiskThatFindsNoPlaceEndsTheCollecting)
+{
+    for (const int type : {FORMAT_NONE, FORMAT_WIPE, FORMAT_KEEP_DATA, FORMAT_UNRECOGNISED}) {
+        PNLIBSZLIST pAll = NLIBCSzListAlloc(0);
+        ASSERT_EQ(NLIBCSzListPush(&pAll, "sda"), 0);
+        FORMAT_LISTS lists = {.pAll = pAll, .pKeepData = nullptr, .pFormatAll = nullptr};
+        const DISK_CHILD child = {.pid = ChildWithStatus(type), .type = FORMAT_NONE};
+        const bool fPushed = type == FORMAT_WIPE || type == FORMAT_KEEP_DATA;
+        EXPECT_EQ(FormatTypesCollect(&child, lists), fPushed ? -1 : 0) << type;
+        NLIBCSzListFree(pAll);
+    }
+}
+
 // The option goes by the length of the path that is given.
 TEST(SystemRaidCreate, OldSuperblocksAreForTheSystemArrays)
 {

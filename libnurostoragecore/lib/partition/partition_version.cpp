@@ -33,13 +33,14 @@ void MemberDiskName(const char *szMember, char *szDisk)
     szDisk[cchDisk == 0 ? 0 : cchDisk - 1] = '\0';
 }
 
-// The running system array knows best: the first member with a known layout decides.
+// The running system array knows best: the first member with a known layout decides; no layout has
+// the version 0.
 void VersionOfMembers(const glob_t &members, u32 *pVersion)
 {
     for (size_t i = 0; i < members.gl_pathc; i++) {
         char szDisk[DISK_NAME_SIZE];
         MemberDiskName(members.gl_pathv[i], szDisk);
-        if (PartitionCheckLayout(szDisk, RAID_MACHINE, pVersion) == 1 && *pVersion != 0) {
+        if (PartitionCheckLayout(szDisk, RAID_MACHINE, pVersion) == 1) {
             return;
         }
     }
@@ -118,7 +119,7 @@ int PartitionLayoutGetMax(u32 *pVersion, int fChooseBiggest)
     if (globbed != 0 && globbed != GLOB_NOMATCH) {
         return -1;
     }
-    if (globbed == 0 && members.gl_pathc > 0) {
+    if (globbed == 0) {
         VersionOfMembers(members, pVersion);
         return 0;
     }

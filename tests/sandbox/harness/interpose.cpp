@@ -451,6 +451,7 @@ void InterposeActivate()
     g_nFault = 0;
     g_fRealSleep = false;
     g_fCallsTold = false;
+    g_nFork = 0; // what the process forked before was no part of the run
     g_fActive = DriverRead();
 }
 

@@ -1,0 +1,198 @@
+// SPDX-License-Identifier: MIT
+//
+// What a library function answers when an allocation fails in the middle of it: the lists and the
+// readers that fill them.
+#include "hwcontrol/disk_port.h"
+#include "nurocore/error.h"
+#include "nurocore/file.h"
+#include "nurocore/pipe.h"
+#include "nurocore/szlist.h"
+#include "nurocore/text.h"
+#include "nurostoragecore/partition_enum.h"
+#include "storage_machine.h"
+
+#include <cerrno>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <functional>
+#include <gtest/gtest.h>
+#include <string>
+
+namespace
+{
+
+constexpr u32 OLD_CODE = 0xFFFFFF00; // stands in the record before a call
+constexpr int CALLS_MAX = 40;
+constexpr int LONG_LENGTH = 300; // two of them do not fit a new list
+
+// Fails each allocation in turn until the body has had one run without a fault, and says how many
+// different answers of the wanted kind there were. The body returns what it has seen.
+int TimesSeen(MACHINE machine, const char *szFunction, const std::string &szWanted,
+              const std::function<std::string()> &body)
+{
+    int nSeen = 0;
+    for (int nCall = 1; nCall <= CALLS_MAX; nCall++) {
+        machine.faults = {{.szFunction = szFunction, .nCall = nCall, .error = ENOMEM}};
+        const RUN_RESULT result = MachineCall(machine, [&body] { printf("%s", body().c_str()); });
+        nSeen += result.szOut == szWanted ? 1 : 0;
+    }
+    return nSeen;
+}
+
+// "answer code": what a call said, and what stands in the record.
+std::string Told(long answer)
+{
+    char sz[64] = "";
+    (void)snprintf(sz, sizeof(sz), "%ld %X", answer, NLIBCErrGet());
+    return sz;
+}
+
+struct LIST_SCOPE {
+    PNLIBSZLIST p;
+
+    LIST_SCOPE(int nItem, char ch, int fMode) : p(NLIBCSzListAlloc(512))
+    {
+        char szItem[LONG_LENGTH + 1] = "";
+        for (int i = 0; p != nullptr && i < nItem; i++) {
+            memset(szItem, ch + i, LONG_LENGTH);
+            (void)NLIBCSzListPush(&p, szItem);
+        }
+        NLIBCSzListSort(p, fMode);
+        NLIBCErrSet(OLD_CODE, "before", 1);
+    }
+    LIST_SCOPE(const LIST_SCOPE &) = delete;
+    LIST_SCOPE &operator=(const LIST_SCOPE &) = delete;
+    ~LIST_SCOPE()
+    {
+        NLIBCSzListFree(p);
+    }
+};
+
+// One item each in two lists; the other's has no room in this one.
+struct OR_CASE {
+    const char *szName;
+    int fModeThis;
+    int fModeOther;
+    int flags;
+};
+
+constexpr OR_CASE OR_CASES[] = {
+    {"unsorted, in place", SZLIST_UNSORTED, SZLIST_UNSORTED, 0},
+    {"sorted other, in place", SZLIST_UNSORTED, SZLIST_SORTED, 0},
+    {"sorted other, in place, nothing removed", SZLIST_UNSORTED, SZLIST_SORTED, 1},
+    {"both sorted, in place", SZLIST_SORTED, SZLIST_SORTED, 0},
+    {"sorted, in place", SZLIST_SORTED, SZLIST_UNSORTED, 0},
+    {"new", SZLIST_UNSORTED, SZLIST_UNSORTED, SZLIST_OR_NEW},
+    {"sorted, new", SZLIST_SORTED, SZLIST_UNSORTED, SZLIST_OR_NEW},
+    {"sorted other, new", SZLIST_UNSORTED, SZLIST_SORTED, SZLIST_OR_NEW},
+    {"both sorted, new", SZLIST_SORTED, SZLIST_SORTED, SZLIST_OR_NEW},
+};
+
+TEST(WithoutMemory, MergedListsAreNone)
+{
+    for (const OR_CASE &row : OR_CASES) {
+        SCOPED_TRACE(row.szName);
+        const auto body = [&row] {
+            LIST_SCOPE list(1, 'a', row.fModeThis);
+            const LIST_SCOPE other(1, 'b', row.fModeOther);
+            if (list.p == nullptr || other.p == nullptr || list.p->nItem + other.p->nItem != 2) {
+                return std::string("no lists");
+            }
+            PNLIBSZLIST const pMerged = NLIBCSzListOr(&list.p, other.p, row.flags);
+            const std::string szTold = Told(pMerged == nullptr ? 0 : pMerged->nItem);
+            if (pMerged != list.p) {
+                NLIBCSzListFree(pMerged);
+            }
+            return szTold;
+        };
+        EXPECT_EQ(TimesSeen(MachineMake(), "malloc", "0 200", body), 1);
+    }
+}
+
+// A failed growth leaves the list to its owner.
+TEST(WithoutMemory, AListThatCannotGrowStaysAsItWas)
+{
+    const auto body = [] {
+        LIST_SCOPE list(1, 'a', SZLIST_UNSORTED);
+        if (list.p == nullptr || list.p->nItem != 1) {
+            return std::string("no list");
+        }
+        PNLIBSZLIST const pGrown = NLIBCSzListExpand(list.p);
+        if (pGrown != nullptr) {
+            list.p = pGrown;
+            return std::string("grown");
+        }
+        return Told(list.p->nItem) + NLIBCSzListGet(list.p, 0)[LONG_LENGTH - 1];
+    };
+    EXPECT_EQ(TimesSeen(MachineMake(), "malloc", "1 200a", body), 1);
+}
+
+// Four fields, of which two fit.
+TEST(WithoutMemory, FieldsAreNotSplit)
+{
+    const std::string szField(200, 'x');
+    const std::string szText = szField + " " + szField + " " + szField + " " + szField;
+    const auto body = [&szText] {
+        LIST_SCOPE list(0, 'a', SZLIST_UNSORTED);
+        return list.p == nullptr ? "no list" : Told(NLIBCStrTok(szText.c_str(), " ", &list.p));
+    };
+    EXPECT_EQ(TimesSeen(MachineMake(), "malloc", "-1 200", body), 2) << "copy and list";
+    EXPECT_EQ(TimesSeen(MachineMake(), "strdup", "-1 200", body), 1) << "the copy";
+}
+
+TEST(WithoutMemory, LinesAreNotRead)
+{
+    MACHINE machine = MachineMake();
+    MachineFile(machine, "/tmp/lines", std::string(400, 'x') + "\n" + std::string(400, 'y') + "\n");
+    const auto body = [] {
+        LIST_SCOPE list(0, 'a', SZLIST_UNSORTED);
+        return list.p == nullptr ? "no list" : Told(NLIBCFileReadLines("/tmp/lines", &list.p));
+    };
+    EXPECT_EQ(TimesSeen(machine, "malloc", "-1 200", body), 1);
+}
+
+// The list of paths is full of others, so that the first line makes it grow.
+TEST(WithoutMemory, PartitionsAreNotEnumerated)
+{
+    MACHINE machine = MachineMake();
+    MachineDiskAdd(machine, "sda");
+    const auto body = [] {
+        LIST_SCOPE list(1, 'a', SZLIST_UNSORTED);
+        if (list.p == nullptr || list.p->nItem != 1) {
+            return std::string("no list");
+        }
+        char szFiller[170 + 1] = "";
+        memset(szFiller, 'b', sizeof(szFiller) - 1);
+        (void)NLIBCSzListPush(&list.p, szFiller);
+        return Told(PartitionPathEnum(nullptr, &list.p));
+    };
+    EXPECT_GE(TimesSeen(machine, "malloc", "-1 200", body), 3);
+}
+
+TEST(WithoutMemory, NoToolIsPiped)
+{
+    MACHINE machine = MachineMake();
+    MachineTool(machine, "/sbin/pvs", {.nTimes = ANY_TIMES});
+    machine.faults = {{.szFunction = "calloc", .error = ENOMEM, .fGoOn = true}};
+    const RUN_RESULT result = MachineCall(machine, [] {
+        NLIBCErrSet(OLD_CODE, "before", 1);
+        EXPECT_EQ(NLIBCPopen("/sbin/pvs", "r", NULL), nullptr);
+        EXPECT_EQ(NLIBCErrGet(), ERR_OUT_OF_MEMORY);
+    });
+    EXPECT_EQ(LogText(result), "");
+    EXPECT_EQ(TranscriptText(result), "fault calloc 1\n");
+}
+
+TEST(Lists, NoListIsNotTouched)
+{
+    NLIBCErrSet(OLD_CODE, "before", 1);
+    NLIBCSzListCompact(nullptr);
+    NLIBCSzListClear(nullptr);
+    NLIBCSzListSort(nullptr, SZLIST_SORTED);
+    EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
+    EXPECT_EQ(NLIBCSzListDump(nullptr), -1);
+    EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
+}
+
+} // namespace
