@@ -26,16 +26,24 @@ def room(path):
 
 
 def read(root):
-    """{floor: {room: rooms it uses}}; a header and the source of the same name are one room."""
-    uses = {}
+    """{floor: {room: rooms it uses}}; a header and the source of the same name are one room.
+
+    What a library shares in a private header without a source is no room, and is left out.
+    """
+    uses, files = {}, {}
     for folder, _, _ in FLOORS:
-        rooms = uses.setdefault(folder, {})
         for where, _, names in os.walk(os.path.join(root, folder)):
+            public = "include" in os.path.relpath(where, root).split(os.sep)
             for name in names:
-                if name.endswith((".h", ".cpp")):
-                    with open(os.path.join(where, name), encoding="utf-8") as source:
-                        found = {room(target) for target in INCLUDE.findall(source.read())}
-                    rooms.setdefault(room(name), set()).update(found - {room(name)})
+                if name.endswith(".cpp") or (name.endswith(".h") and (public or room(name) + ".cpp" in names)):
+                    files.setdefault(folder, []).append(os.path.join(where, name))
+    known = {room(path) for paths in files.values() for path in paths}
+    for folder, paths in files.items():
+        rooms = uses.setdefault(folder, {})
+        for path in sorted(paths):
+            with open(path, encoding="utf-8") as source:
+                found = {room(target) for target in INCLUDE.findall(source.read())} & known
+            rooms.setdefault(room(path), set()).update(found - {room(path)})
     return uses
 
 
@@ -50,11 +58,12 @@ def levels(rooms, common):
     """Rows from the bottom up: a room stands above all rooms of its floor that it uses."""
     level = {}
 
-    def of(name):
+    def of(name, above=()):
+        if name in above:
+            sys.exit(f"rooms.py: a circle of rooms: {' '.join(above)} {name}")
         if name not in level:
-            level[name] = 0
-            level[name] = 1 + max((of(used) for used in rooms[name] if used in rooms and used not in common),
-                                  default=-1)
+            level[name] = 1 + max((of(used, (*above, name)) for used in sorted(rooms[name])
+                                   if used in rooms and used not in common), default=-1)
         return level[name]
 
     for name in sorted(rooms):
