@@ -130,11 +130,11 @@ void WordFixUp(WORD &word)
 }
 
 // The next word of the stream: blanks, tabs and new lines end one, '#' begins a comment up to the
-// line's end, quotes group blanks and are dropped. Empty at the end of the stream and without
+// line's end, quotes group blanks and are dropped. False at the end of the stream and without
 // memory.
-WORD WordRead(FILE *pFile)
+bool WordRead(FILE *pFile, WORD &word)
 {
-    WORD word;
+    word = {};
     int chQuote = 0;
     for (int ch = fgetc(pFile); ch != EOF; ch = fgetc(pFile)) {
         if (chQuote == 0 && ch == '#') {
@@ -154,11 +154,11 @@ WORD WordRead(FILE *pFile)
         } else if (chQuote == 0 && (ch == '"' || ch == '\'')) {
             chQuote = ch;
         } else if (!WordAppend(word, static_cast<char>(ch))) {
-            return {};
+            return false;
         }
     }
     WordFixUp(word);
-    return word;
+    return word.cch > 0;
 }
 
 constexpr i32 MAJOR_UNKNOWN = -1;
@@ -173,7 +173,8 @@ i32 MdpMajorRead()
     bool fBlockSection = false;
     bool fAfterBlock = false;
     i32 number = MAJOR_UNKNOWN;
-    for (WORD word = WordRead(pFile.get()); word.cch > 0; word = WordRead(pFile.get())) {
+    WORD word;
+    while (WordRead(pFile.get(), word)) {
         const char chFirst = word.pszText.get()[0];
         if (chFirst >= '0' && chFirst <= '9') {
             number = NLIBCStrToI32(word.pszText.get());
