@@ -15,6 +15,7 @@ PACKAGES=(
     fdisk util-linux             # reading back what the partitioner wrote
     python3                      # include-direction check, small reports
     binutils strace              # readelf and system-call counts
+    valgrind libbenchmark-dev    # instruction counts, the containers beside the standard ones
     libclang-rt-14-dev           # the fuzz ring
     valgrind                     # the valgrind ring
     qemu-system-x86 qemu-utils   # the virtual appliance

@@ -1,0 +1,7 @@
+// SPDX-License-Identifier: MIT
+//
+// What starting a C program costs, whatever it does then.
+int main(void)
+{
+    return 0;
+}

@@ -1,0 +1,170 @@
+#!/bin/sh
+# SPDX-License-Identifier: MIT
+#
+# The part of bench/compare that runs inside the virtual appliance: makes the arrays and prints one
+# line of numbers for each program.
+#
+#   guest.sh counts             what does not depend on the machine's mood
+#   guest.sh all RUNS ROUNDS    and times, and what the others take
+# shellcheck source=SCRIPTDIR/../tests/appliance/lib.sh
+. /appliance/lib.sh
+
+MEASURE=/appliance/bench/measure
+VALGRIND=/usr/bin/valgrind.bin
+PROFILE=/tmp/profile
+LETTERS='a b c d'
+PARTITIONS=10
+
+# A table of ten small partitions on each disk.
+tables_make() {
+    {
+        echo 'label: gpt'
+        for number in $(seq "$PARTITIONS"); do
+            echo ',24M'
+        done
+    } >/tmp/table
+    for letter in $LETTERS; do
+        must sh -c "sfdisk.stock -q --wipe always /dev/sd$letter </tmp/table"
+    done
+}
+
+# mirror MD MEMBER...
+mirror() {
+    mirror_number=$1
+    shift
+    make_array "$mirror_number" -e 1.2 --level=1 --raid-devices=$# --assume-clean "$@"
+}
+
+# The first of each disk's partitions from FIRST to LAST.
+members() {
+    for number in $(seq "$1" "$2"); do
+        for letter in $LETTERS; do
+            echo "/dev/sd$letter$number"
+        done
+    done
+}
+
+# Each number is the array's number of members.
+arrays_make() {
+    mirror 2 /dev/sda1 /dev/sdb1
+    # shellcheck disable=SC2046  # lists of nodes
+    mirror 4 $(members 2 2)
+    # shellcheck disable=SC2046
+    mirror 32 $(members 3 10)
+    settle 2 4 32
+}
+
+# The exit status of a run that went well: the list of commands is no success.
+status_of() {
+    case $1 in
+    usage*) echo 1 ;;
+    *) echo 0 ;;
+    esac
+}
+
+# measured WHAT KEY COMMAND...: with everything fixed that a program could take from around it.
+measured() {
+    what=$1
+    key=$2
+    shift 2
+    # shellcheck disable=SC2086  # "runs" brings its number
+    env -i PATH=/usr/bin "$MEASURE" $what "$(status_of "$key")" "$@"
+}
+
+# The allocating functions by the names that callgrind gives them; one that calls another counts
+# twice. A name stands in full where it occurs first, then only its number.
+# shellcheck disable=SC2016  # the fields are awk's
+ALLOCATIONS='
+    /^c?fn=/ {
+        number = $1
+        sub(/^c?fn=/, "", number)
+        if (NF > 1) { name[number] = $2 }
+        called = name[number]
+    }
+    /^calls=/ && called ~ /^(malloc|calloc|realloc)$/ { total += substr($1, 7) }
+    END { print total + 0 }'
+
+# instructions KEY COMMAND...: instructions and allocations.
+instructions() {
+    collected=$(measured answer "$@" 2>&1 | sed -n 's/.*Collected : *//p')
+    echo "$collected $(awk "$ALLOCATIONS" "$PROFILE")"
+}
+
+# calls KEY COMMAND...: system calls and children.
+calls() {
+    echo "calls $1 $(measured calls "$@" 2>/dev/null)"
+}
+
+# count KEY COMMAND...: these, instructions and allocations.
+count() {
+    calls "$@"
+    key=$1
+    shift
+    echo "instructions $key $(instructions "$key" "$VALGRIND" --tool=callgrind \
+        "--callgrind-out-file=$PROFILE" "$@")"
+}
+
+# runs KEY COMMAND...: minor faults, peak memory, microseconds.
+runs() {
+    echo "runs $1 $(measured "runs $RUNS" "$@" 2>/dev/null)"
+}
+
+# One of each kind of number that is recorded.
+counts() {
+    count usage /sbin/arrayctl help
+    count status /sbin/arrayctl status 2
+    calls status-4 /sbin/arrayctl status 4
+    calls status-32 /sbin/arrayctl status 32
+}
+
+# each WHAT: of every program of the table.
+each() {
+    $1 empty /appliance/bench/empty
+    $1 usage /sbin/arrayctl help
+    $1 usage_lazy /appliance/bench/arrayctl_lazy help
+    $1 floor /appliance/bench/floor 2
+    $1 floor_bound /appliance/bench/floor_bound 2
+    $1 status /sbin/arrayctl status 2
+    $1 status_lazy /appliance/bench/arrayctl_lazy status 2
+    $1 detail /usr/sbin/mdadm --detail /dev/md2
+    $1 export /usr/sbin/mdadm --detail --export /dev/md2
+    $1 lsblk /usr/bin/lsblk -s /dev/md2
+}
+
+# By turns, so that a busy minute of the host meets them all.
+programs() {
+    each count
+    for _ in $(seq "$ROUNDS"); do
+        each runs
+    done
+}
+
+# The large array gives way to one of its first members.
+mirror_again() {
+    must mdadm --stop /dev/md32
+    # shellcheck disable=SC2046
+    mirror 32 $(members 3 $((2 + $1 / 4)))
+}
+
+growth() {
+    for size in 2 4; do
+        count "status-$size" /sbin/arrayctl status "$size"
+        count "floor-$size" /appliance/bench/floor "$size"
+    done
+    for size in 32 16 8; do
+        [ "$size" = 32 ] || mirror_again "$size"
+        count "status-$size" /sbin/arrayctl status 32
+        count "floor-$size" /appliance/bench/floor 32
+    done
+}
+
+RUNS=${2:-1}
+ROUNDS=${3:-1}
+tables_make
+arrays_make
+if [ "$1" = counts ]; then
+    counts
+else
+    programs
+    growth
+fi
