@@ -166,6 +166,13 @@ def case_every_command_of_the_docs_is_run():
 
 # --- the rest ------------------------------------------------------------------------------------
 
+def case_the_rings_that_are_told_of_exist():
+    table = re.search(r"\| ring \|.*?\n\n", read("CONTRIBUTING.md"), re.S).group(0)
+    told = re.findall(r"^\| ([\w-]+) \|", table, re.M)[1:]
+    known = re.search(r"^rings: (.*)", run("./check", "--help"), re.M).group(1).split()
+    assert len(told) >= 10 and set(told) <= set(known), f"not in ./check: {sorted(set(told) - set(known))}"
+
+
 def case_links_lead_somewhere():
     for page in pages():
         for target in re.findall(r"\]\(([^)#]+)", read(page)):
