@@ -15,9 +15,9 @@ PACKAGES=(
     fdisk util-linux             # reading back what the partitioner wrote
     python3                      # include-direction check, small reports
     binutils strace              # readelf and system-call counts
-    valgrind libbenchmark-dev    # instruction counts, the containers beside the standard ones
+    libbenchmark-dev             # the containers beside the standard ones
     libclang-rt-14-dev           # the fuzz ring
-    valgrind                     # the valgrind ring
+    valgrind                     # the valgrind ring, instruction counts
     qemu-system-x86 qemu-utils   # the virtual appliance
     busybox-static kmod cpio gzip xz-utils
     g++-powerpc-linux-gnu        # the appliance's own processor: the compiler,
