@@ -47,8 +47,10 @@ void NumberTells(const std::string &name, size_t cbDisk)
     char szFormat[32];
     (void)snprintf(szFormat, sizeof(szFormat), IsMmc(name) ? "%%%zu[^p]p%%d" : "%%%zu[^1-9]%%d",
                    cbDisk - 1);
+#pragma GCC diagnostic push
 #pragma GCC diagnostic ignored "-Wformat-nonliteral"
     const int nScanned = sscanf(name.c_str(), szFormat, expected.data(), &expectedNumber);
+#pragma GCC diagnostic pop
     Claim(disk.data() == std::string(expected.data()), "the disk's name");
     if (nScanned < 0) {
         expectedNumber = -1;

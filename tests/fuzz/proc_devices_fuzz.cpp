@@ -2,7 +2,7 @@
 //
 // The input is /proc/devices. The room itself is compiled in: its answer is cached for the life of
 // a process, and the words are read behind that.
-#include "raid/raid_info.cpp" // NOLINT(bugprone-suspicious-include)
+#include "raid/raid_info.cpp"
 
 #include "fuzz.h"
 #include "outside.h"
