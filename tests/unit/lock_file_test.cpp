@@ -57,6 +57,7 @@ TEST(LockFileTable, HasItsRowsAndAnEnd)
         EXPECT_EQ(pTable[i].lockBit, ROWS[i].lockBit) << ROWS[i].szPath;
         EXPECT_EQ(pTable[i].pStream, nullptr);
         EXPECT_EQ(pTable[i].nHold, 0);
+        EXPECT_EQ(pTable[i].reserved, 0);
     }
     EXPECT_EQ(pTable[ROW_COUNT].lockBit, 0U);
 }
