@@ -231,13 +231,17 @@ TEST(HostileLimits, WithOneDescriptorTooFewAnArrayIsNotFound)
     EXPECT_EQ(result.szOut, "RAID /dev/md2 is not found\n");
 }
 
-// A sanitizer needs terabytes of addresses, an emulator its own.
+// A sanitizer needs terabytes of addresses, an emulator more than the program.
 #ifndef __SANITIZE_ADDRESS__
 TEST(HostileLimits, LittleMemoryEndsDestroyInOrder)
 {
-    constexpr rlim_t KIB = 1024;
-    for (rlim_t nKiB = IsEmulated() ? 4194304 : 1024; nKiB <= 4194304; nKiB += nKiB / 8) {
-        LimitedRunEnds(MirrorToDestroy(), {"destroy", "2"}, RLIMIT_AS, nKiB * KIB);
+    constexpr rlim_t MIB = 1024UL * 1024UL;
+    std::vector<rlim_t> limits = {RLIM_INFINITY};
+    for (rlim_t cb = MIB; cb <= 64 * MIB && !IsEmulated(); cb += cb / 16) {
+        limits.push_back(cb);
+    }
+    for (const rlim_t cb : limits) {
+        LimitedRunEnds(MirrorToDestroy(), {"destroy", "2"}, RLIMIT_AS, cb);
     }
 }
 #endif
