@@ -239,7 +239,7 @@ int PartitionZeroSuperblock(const char *szDisk, int partNum)
 
 i64 PartitionGeometryGet(int partNum, const char *szDisk, u64 *pStart, u32 *pType)
 {
-    if (partNum <= 0 || szDisk == nullptr) {
+    if (partNum <= 0 || szDisk == nullptr || pStart == nullptr || pType == nullptr) {
         return PARTITION_ABSENT;
     }
     const OPTION number = NumberOption(partNum);

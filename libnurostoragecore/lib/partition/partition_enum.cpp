@@ -66,7 +66,7 @@ int LineAppend(const PARTITION_ENUM_FILTER *pFilter, const char *szLine, PNLIBSZ
 
 int PartitionPathEnum(const PARTITION_ENUM_FILTER *pFilter, PNLIBSZLIST *ppList)
 {
-    if (ppList == nullptr) {
+    if (ppList == nullptr || *ppList == nullptr) {
         NLIBCLog(LOG_ERR, "bad parameters");
         return -1;
     }
