@@ -43,6 +43,21 @@ constexpr TRIM_CASE TRIM_CASES[] = {
     {"'word'", "'word'"},
 };
 
+// Quotes are dropped where they stand on both sides, and are left out here.
+TEST(StrTrimSpace, TakesFourBytesForBlankAndNoOther)
+{
+    for (int byte = 1; byte < 256; byte++) {
+        const char ch = static_cast<char>(byte);
+        const bool fBlank = ch == ' ' || ch == '\t' || ch == '\n' || ch == '\r';
+        char sz[] = {ch, 'x', ch, '\0'};
+        const std::string szWhole = sz;
+        if (ch != '"') {
+            EXPECT_EQ(NLIBCStrTrimSpace(sz, nullptr), fBlank ? 1 : 3) << byte;
+            EXPECT_EQ(sz, fBlank ? "x" : szWhole) << byte;
+        }
+    }
+}
+
 TEST(StrTrimSpace, InPlaceAndIntoAnotherBuffer)
 {
     for (const TRIM_CASE &row : TRIM_CASES) {
