@@ -354,6 +354,8 @@ TEST(ExternalDiskPortCheckName, TakesBareNamesAsTheyAre)
         EXPECT_EQ(ExternalDiskPortCheckName("nuroboot"), UNKNOWN_DEVICE);
         EXPECT_EQ(ExternalDiskPortCheckName("mmcblk0"), UNKNOWN_DEVICE);
         EXPECT_EQ(ExternalDiskPortCheckName("/dev/sda"), UNKNOWN_DEVICE);
+        EXPECT_EQ(ExternalDiskPortCheckName(nullptr), UNKNOWN_DEVICE);
+        EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
     });
     EXPECT_EQ(LogText(result), NoMatch("nuroboot") + NoMatch("mmcblk0") + NoMatch("/dev/sda"));
 }

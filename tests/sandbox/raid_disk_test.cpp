@@ -7,6 +7,7 @@
 #include <gtest/gtest.h>
 
 #include <cerrno>
+#include <cstddef>
 #include <cstdlib>
 
 namespace
@@ -14,6 +15,11 @@ namespace
 
 constexpr u32 CODE_BEFORE = 0x4200; // no code of the house: shows that nobody wrote the record
 constexpr const char *MEMBER = "/sys/block/md2/md/dev-sda3";
+
+// The order of the fields.
+static_assert(offsetof(RAID_DISK, szPath) == 0 && sizeof(RAID_DISK::szPath) == 128);
+static_assert(offsetof(RAID_DISK, state) == 128 && offsetof(RAID_DISK, slot) == 132);
+static_assert(offsetof(RAID_DISK, slot) < offsetof(RAID_DISK, pNext));
 
 void CodeReset()
 {
@@ -162,6 +168,23 @@ TEST(RaidDisk, TheSlotIsANumberOrNone)
             EXPECT_EQ(disk.pNext, nullptr);
             EXPECT_STREQ(disk.szPath, "/dev/sda3");
         });
+    }
+}
+
+TEST(RaidDisk, TheSlotIsReadUpTo63Characters)
+{
+    const std::string szZeros(61, '0');
+    const struct {
+        std::string szSlot;
+        i32 slot;
+    } slots[] = {
+        {szZeros + "12\n", 12},
+        {szZeros + "123\n", 12}, // its last digit is the 64th character
+        {std::string(59, ' ') + "none\n", 0},
+    };
+    for (const auto &row : slots) {
+        WithMember("in_sync\n", row.szSlot,
+                   [&](const RAID_DISK &disk) { EXPECT_EQ(disk.slot, row.slot); });
     }
 }
 
@@ -559,6 +582,25 @@ TEST(RaidDiskSearch, ANameThatIsTooLongIsNotEqual)
     });
 }
 
+// A line for every name that is too long, of each member that is compared.
+TEST(RaidDiskSearch, BothNamesAreCutForEachMember)
+{
+    const std::string szLine = "<11>disk_name.cpp:# buffer size of szDiskPath should be longer "
+                               "than string length of szPartPath\n";
+    const std::string szLong = "/dev/" + std::string(59, 'x');
+    const auto searched = [&](const char *szFirst, const char *szSecond, const char *szWanted) {
+        return LogText(MachineCall(MachineMake(), [&] {
+            RAID_DISK second = MemberMake(szSecond);
+            RAID_DISK first = MemberMake(szFirst, &second);
+            EXPECT_EQ(RAIDDiskListSearch(&first, szWanted, nullptr), 0);
+        }));
+    };
+    EXPECT_EQ(searched("/dev/sda3", "/dev/sdb3", "/dev/sdc"), "");
+    EXPECT_EQ(searched(szLong.c_str(), "/dev/sdb3", "/dev/sdc"), szLine);
+    EXPECT_EQ(searched("/dev/sda3", "/dev/sdb3", szLong.c_str()), szLine + szLine);
+    EXPECT_EQ(searched(szLong.c_str(), "/dev/sdb3", szLong.c_str()), szLine + szLine + szLine);
+}
+
 TEST(RaidDiskFree, NothingCanBeFreed)
 {
     MachineCall(MachineMake(), [] {
@@ -635,6 +677,8 @@ TEST(SyncAction, Fails)
         EXPECT_EQ(RAIDSyncActionGet(2, &action), -1);
         EXPECT_EQ(action, 99);
         EXPECT_EQ(NLIBCErrGet(), CODE_BEFORE);
+        EXPECT_EQ(RAIDSyncActionGet(2, nullptr), -1);
+        EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
     });
     EXPECT_EQ(LogText(result),
               "<11>raid_disk.cpp:# open \"/sys/block/md3/md/sync_action\" failed\n"

@@ -7,6 +7,7 @@
 #include <gtest/gtest.h>
 
 #include <cerrno>
+#include <cstddef>
 #include <cstring>
 #include <fcntl.h>
 #include <fstream>
@@ -18,6 +19,26 @@ namespace
 
 constexpr u32 CODE_BEFORE = 0x4200; // no code of the house: shows that nobody wrote the record
 constexpr u64 GIB = 1ULL << 30;
+
+// The order of the fields.
+static_assert(offsetof(RAID_REBUILD_STATUS, state) == 0);
+static_assert(offsetof(RAID_REBUILD_STATUS, state) < offsetof(RAID_REBUILD_STATUS, done));
+static_assert(offsetof(RAID_REBUILD_STATUS, done) < offsetof(RAID_REBUILD_STATUS, total));
+static_assert(offsetof(RAID_INFO, nMd) == 0);
+static_assert(offsetof(RAID_INFO, nMd) < offsetof(RAID_INFO, szPath));
+static_assert(offsetof(RAID_INFO, szPath) < offsetof(RAID_INFO, szUuid));
+static_assert(offsetof(RAID_INFO, szUuid) < offsetof(RAID_INFO, level));
+static_assert(offsetof(RAID_INFO, level) < offsetof(RAID_INFO, majorVersion));
+static_assert(offsetof(RAID_INFO, majorVersion) < offsetof(RAID_INFO, minorVersion));
+static_assert(offsetof(RAID_INFO, minorVersion) < offsetof(RAID_INFO, status));
+static_assert(offsetof(RAID_INFO, status) < offsetof(RAID_INFO, rebuild));
+static_assert(offsetof(RAID_INFO, rebuild) < offsetof(RAID_INFO, arraySize));
+static_assert(offsetof(RAID_INFO, arraySize) < offsetof(RAID_INFO, deviceSize));
+static_assert(offsetof(RAID_INFO, deviceSize) < offsetof(RAID_INFO, nRaidDisks));
+static_assert(offsetof(RAID_INFO, nRaidDisks) < offsetof(RAID_INFO, nActiveDisks));
+static_assert(offsetof(RAID_INFO, nActiveDisks) < offsetof(RAID_INFO, nSpareDisks));
+static_assert(offsetof(RAID_INFO, nSpareDisks) < offsetof(RAID_INFO, pDisks));
+static_assert(sizeof(RAID_INFO::szPath) == 128 && sizeof(RAID_INFO::szUuid) == 64);
 
 MACHINE ArrayMake(const MACHINE_MD &md)
 {
@@ -193,6 +214,37 @@ TEST(RaidInfo, ALongPathIsCutInTheRecord)
         EXPECT_EQ(pInfo->szPath, szLong.substr(0, 127));
         RAIDInfoFree(pInfo);
     });
+}
+
+TEST(RaidInfo, MembersAreThoseOfTheWholePath)
+{
+    // Cut to what the record holds, it would be the path of md0.
+    const std::string szLong = "/dev/md" + std::string(130, '0') + "2";
+    MACHINE machine = ArrayMake({.nMd = 2, .members = {{"sda3"}}});
+    machine.links[szLong] = "/dev/md2";
+    MachineCall(machine, [&] {
+        RAID_INFO *pInfo = nullptr;
+        ASSERT_EQ(RAIDInfoGet(szLong.c_str(), &pInfo), 1);
+        EXPECT_EQ(pInfo->nMd, 2);
+        EXPECT_NE(pInfo->pDisks, nullptr);
+        EXPECT_STREQ(pInfo->pDisks == nullptr ? "" : pInfo->pDisks->szPath, "/dev/sda3");
+        RAIDInfoFree(pInfo);
+    });
+}
+
+// A folder opens for reading alone.
+TEST(RaidInfo, TheNodeIsOpenedForReading)
+{
+    MACHINE machine = ArrayMake({.nMd = 2});
+    MachineRemove(machine, "/dev/md2");
+    MachineFolder(machine, "/dev/md2");
+    const RUN_RESULT result = MachineCall(machine, [] {
+        RAID_INFO *pInfo = nullptr;
+        ASSERT_EQ(RAIDInfoGet("/dev/md2", &pInfo), 1);
+        EXPECT_EQ(pInfo->arraySize, GIB);
+        RAIDInfoFree(pInfo);
+    });
+    EXPECT_EQ(LogText(result), "");
 }
 
 TEST(RaidInfo, FreeingNothingIsAllowed)
@@ -408,6 +460,8 @@ TEST(ComponentSize, WordsAreReadWithCommentsAndQuotes)
         {"quotes group blanks", "\"Block devices:\"\n254 mdp\n", PLAIN},
         {"a quoted comment mark is none", "Block devices:\n'#' 254 mdp\n", PARTITIONABLE},
         {"one quote in the other", "Block devices:\n\"'\" 254 mdp '\"'\n", PARTITIONABLE},
+        {"an odd quote ends with its line", "Block devices:\n253 o'x\n254 mdp\n", PARTITIONABLE},
+        {"an odd double quote, too", "Block devices:\n253 \"x\n254 mdp\n255 y\"\n", PARTITIONABLE},
     };
     for (const DEVICES_CASE &one : cases) {
         ExpectDevicesRead(one);
@@ -585,6 +639,34 @@ TEST(RaidInfoFailure, TheHealth)
                      "<15>raid_info.cpp:# Failed to ioctl for raid size, errno=0X8000\n");
 }
 
+// Of two steps that fail the first one alone is told.
+TEST(RaidInfoFailure, TheStepsHaveAnOrder)
+{
+    const std::string szLevel = "<15>raid_info.cpp:# Not supported RAID level: 4\n";
+    ExpectQueryFails({.nMd = 2, .level = 4, .errnoSize = ENODEV}, 0x0600,
+                     szLevel +
+                         "<15>raid_info.cpp:# Failed to ioctl for raid size, errno=0X600\n");
+    ExpectQueryFails({.nMd = 2, .level = 4, .errnoInfo = EINTR, .errnoSize = ENODEV}, 0xA700,
+                     "<15>raid_info.cpp:# Failed to ioctl for raid status, errno=0XA700\n");
+
+    const std::string szMember =
+        "<15>raid_disk.cpp:# Failed to get disk slot, errno=Success\n"
+        "<15>raid_disk.cpp:# Failed to get slot of /sys/block/md2/md/dev-sda3, errno=0XA00\n"
+        "<15>raid_disk.cpp:# Failed to create disk info from /sys/block/md2/md/dev-sda3 "
+        ",errno=0XA00\n";
+    const std::vector<MACHINE_MEMBER> members = {{"sda3", "in_sync\n", ""}};
+    ExpectQueryFails({.nMd = 2, .errnoSize = ENODEV, .errnoSync = EIO, .members = members}, 0x0600,
+                     "<15>raid_info.cpp:# Failed to ioctl for raid size, errno=0X600\n");
+    ExpectQueryFails({.nMd = 2, .errnoSync = ENODEV, .members = members}, 0x0600,
+                     szMember + "<15>raid_info.cpp:# Failed to get disk list for /dev/md2, "
+                                "errno=0X600\n");
+    ExpectQueryFails({.nMd = 2, .errnoHealth = ENODEV, .members = members}, 0x0600,
+                     szMember +
+                         "<15>raid_info.cpp:# Failed to ioctl for raid size, errno=0X600\n");
+    ExpectQueryFails({.nMd = 2, .errnoHealth = EINTR, .errnoSync = ENODEV}, 0x0600,
+                     "<15>raid_info.cpp:# Failed to get disk list for /dev/md2, errno=0X600\n");
+}
+
 // ---- the requests by themselves ----------------------------------------------------------------
 
 TEST(RaidRequest, NullIsABadParameter)
@@ -719,8 +801,11 @@ TEST(RaidRequest, TheResyncFails)
               "errno=Inappropriate ioctl for device\n"},
          }) {
         const RUN_RESULT result = WithArray({.nMd = 2, .errnoSync = one.error}, [&](int fd) {
-            RAID_REBUILD_STATUS rebuild = {};
+            RAID_REBUILD_STATUS rebuild = {97, 98, 99};
             EXPECT_EQ(RAIDRebuildStatusGet(fd, &rebuild), -1);
+            EXPECT_EQ(rebuild.state, 97U);
+            EXPECT_EQ(rebuild.done, 98U);
+            EXPECT_EQ(rebuild.total, 99U);
             EXPECT_EQ(NLIBCErrGet(), one.code);
         });
         EXPECT_EQ(LogText(result), one.szLog);

@@ -187,10 +187,14 @@ TEST(WithoutMemory, NoToolIsPiped)
 TEST(Lists, NoListIsNotTouched)
 {
     NLIBCErrSet(OLD_CODE, "before", 1);
-    NLIBCSzListCompact(nullptr);
-    NLIBCSzListClear(nullptr);
     NLIBCSzListSort(nullptr, SZLIST_SORTED);
     EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
+    NLIBCSzListCompact(nullptr);
+    EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
+    NLIBCErrSet(OLD_CODE, "before", 1);
+    NLIBCSzListClear(nullptr);
+    EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
+    NLIBCErrSet(OLD_CODE, "before", 1);
     EXPECT_EQ(NLIBCSzListDump(nullptr), -1);
     EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
 }

@@ -346,6 +346,7 @@ TEST(SzListOr, GivesUpWithoutCaseAtALetterTwoPlacesFurther)
         const TEST_LIST b({"C"}, SZLIST_CASE_SORTED);
         EXPECT_QUIET(NLIBCSzListOr(&a.p, b.p, flags), nullptr);
         EXPECT_EQ(ItemsOf(a.p), (ITEMS{"a", "f"}));
+        EXPECT_EQ(a.p->fMode, flags == IN_PLACE ? SZLIST_UNSORTED : SZLIST_CASE_SORTED);
         EXPECT_EQ(Defect(a.p), "");
         // The other way round the difference is +2, which is an ordinary one.
         TEST_LIST c({"C"}, SZLIST_CASE_SORTED);
@@ -380,7 +381,7 @@ TEST(SzListOr, RefusesAnUnknownOrderOfTheOther)
     for (const int flags : {IN_PLACE, SZLIST_OR_NEW}) {
         TEST_LIST a({"a"}, SZLIST_UNSORTED);
         const TEST_LIST b({"b"}, 2);
-        EXPECT_EQ(NLIBCSzListOr(&a.p, b.p, flags), nullptr);
+        EXPECT_FAILS(NLIBCSzListOr(&a.p, b.p, flags), nullptr, ERR_BAD_PARAMETER);
         EXPECT_EQ(ItemsOf(a.p), (ITEMS{"a"}));
     }
 }

@@ -271,6 +271,10 @@ DISK_PORT_TYPE ExternalDiskPortCheck(const char *szPath)
 
 DISK_PORT_TYPE ExternalDiskPortCheckName(const char *szName)
 {
+    if (szName == nullptr) {
+        NLIBCErrSetHere(ERR_BAD_PARAMETER);
+        return UNKNOWN_DEVICE;
+    }
     if (!MasksLoad()) {
         return UNKNOWN_DEVICE;
     }

@@ -64,10 +64,10 @@ int NLIBCSzListSet(PNLIBSZLIST *ppList, int index, const char *szItem);
 // another just the mode changes. NULL is ignored.
 void NLIBCSzListSort(PNLIBSZLIST pList, int fMode);
 
-// Drops the empty slots.
+// Drops the empty slots. NULL gives ERR_BAD_PARAMETER.
 void NLIBCSzListCompact(PNLIBSZLIST pList);
 
-// Drops all items; block size and mode stay.
+// Drops all items; block size and mode stay. NULL gives ERR_BAD_PARAMETER.
 void NLIBCSzListClear(PNLIBSZLIST pList);
 
 // Moves the list into a block of twice the size and frees the old one. Returns the new block, or
@@ -85,7 +85,8 @@ int NLIBCSzListJoin(const NLIBSZLIST *pList, const char *szSeparator, char **psz
 int NLIBCSzListDump2Str(const NLIBSZLIST *pList, const char *szSeparator, char *szOut, int cbOut);
 
 // Merges pOther into the list, or both into a new list with SZLIST_OR_NEW (the caller frees it).
-// Returns the result, NULL on failure.
+// Returns the result, NULL on failure: ERR_BAD_PARAMETER for lists whose modes do not go together.
+// A list in place then holds what was merged so far, unsorted.
 PNLIBSZLIST NLIBCSzListOr(PNLIBSZLIST *ppList, const NLIBSZLIST *pOther, int flags);
 
 // Prints the list with its addresses on standard output. Returns what the last printf returned.

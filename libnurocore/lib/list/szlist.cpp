@@ -449,6 +449,7 @@ void NLIBCSzListSort(PNLIBSZLIST pList, int fMode)
 void NLIBCSzListCompact(PNLIBSZLIST pList)
 {
     if (pList == nullptr) {
+        NLIBCErrSetHere(ERR_BAD_PARAMETER);
         return;
     }
     i32 *const pSlots = Slots(pList);
@@ -460,9 +461,11 @@ void NLIBCSzListCompact(PNLIBSZLIST pList)
 
 void NLIBCSzListClear(PNLIBSZLIST pList)
 {
-    if (pList != nullptr) {
-        Reset(pList);
+    if (pList == nullptr) {
+        NLIBCErrSetHere(ERR_BAD_PARAMETER);
+        return;
     }
+    Reset(pList);
 }
 
 PNLIBSZLIST NLIBCSzListExpand(PNLIBSZLIST pList)
@@ -611,7 +614,8 @@ bool OrSameOrder(PNLIBSZLIST *ppList, const NLIBSZLIST *pOther, bool fNew, PNLIB
         (*ppResult)->fMode = SZLIST_UNSORTED;
     }
     const bool isMerged = MergeSorted(*ppList, pOther, CompareOf(fMode), fNew, ppResult);
-    if (isMerged || !fNew) {
+    // One that gave up leaves a list in no order, and says so by its mode.
+    if (isMerged) {
         NLIBCSzListSort(*ppResult, fMode);
     }
     return isMerged;
@@ -628,6 +632,7 @@ bool OrSortedOther(const NLIBSZLIST *pThis, const NLIBSZLIST *pOther, int flags,
                    PNLIBSZLIST *ppResult)
 {
     if (!IsSortedMode(pOther->fMode)) {
+        NLIBCErrSetHere(ERR_BAD_PARAMETER);
         return false;
     }
     const i32 nThis = pThis->nItem;

@@ -63,5 +63,6 @@ void RAIDDiskListFree(RAID_DISK *pDisks);
 // ERR_BAD_PARAMETER for a NULL name.
 int RAIDDiskListSearch(RAID_DISK *pDisks, const char *szDisk, RAID_DISK **ppDisk);
 
-// What /dev/md<nMd> is doing, one of SYNC_ACTION_*. Returns 0, or -1 without a code.
+// What /dev/md<nMd> is doing, one of SYNC_ACTION_*. Returns 0, or -1: with
+// ERR_BAD_PARAMETER without a place for the answer, else without a code.
 int RAIDSyncActionGet(int nMd, int *pAction);

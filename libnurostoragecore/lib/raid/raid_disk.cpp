@@ -247,7 +247,11 @@ int RAIDDiskListSearch(RAID_DISK *pDisks, const char *szDisk, RAID_DISK **ppDisk
 
 int RAIDSyncActionGet(int nMd, int *pAction)
 {
-    if (nMd < 0 || pAction == nullptr) {
+    if (pAction == nullptr) {
+        NLIBCErrSetHere(ERR_BAD_PARAMETER);
+        return -1;
+    }
+    if (nMd < 0) {
         return -1;
     }
     char szFile[PATH_SIZE];

@@ -141,6 +141,9 @@ bool WordRead(FILE *pFile, WORD &word)
             CommentSkip(pFile);
             ch = '\n';
         }
+        if (ch == '\n') {
+            chQuote = 0; // an odd quote spoils its own line alone
+        }
         const bool fSeparator = chQuote == 0 && (ch == ' ' || ch == '\t' || ch == '\n');
         const bool fTorn = chQuote == 0 && ch == '(' && EndsInActive(word);
         if ((fSeparator || fTorn) && word.cch > 0) {
@@ -221,7 +224,8 @@ void GeometryStore(const mdu_array_info_t &array, RAID_INFO *pInfo)
     pInfo->nSpareDisks = array.spare_disks;
 }
 
-int InfoFill(int fd, RAID_INFO *pInfo)
+// The members are those of the path that was opened: the record's copy may be cut.
+int InfoFill(const char *szMd, int fd, RAID_INFO *pInfo)
 {
     mdu_array_info_t array = {};
     if (RAIDIoctlInfo(fd, &array) != 0) {
@@ -240,7 +244,7 @@ int InfoFill(int fd, RAID_INFO *pInfo)
     pInfo->deviceSize = HasDeviceSize(pInfo->level) ? nKiB * BYTES_PER_KIB : 0;
     // Kept: a failed rebuild query is told in the words of the member list, a failed health query
     // in those of the size.
-    if (RAIDDiskListGet(pInfo->szPath, &pInfo->pDisks) != 0 ||
+    if (RAIDDiskListGet(szMd, &pInfo->pDisks) != 0 ||
         RAIDRebuildStatusGet(fd, &pInfo->rebuild) != 0) {
         NLIBCLog(LOG_DEBUG, "Failed to get disk list for /dev/md%d, errno=0X%X", pInfo->nMd,
                  NLIBCErrGet());
@@ -281,7 +285,7 @@ int RAIDInfoGet(const char *szMd, RAID_INFO **ppInfo)
         NLIBCErrSetHere(ERR_OPEN_FAILED);
         return -1;
     }
-    const int result = InfoFill(fd.get(), pInfo.get());
+    const int result = InfoFill(szMd, fd.get(), pInfo.get());
     if (result == 1) {
         *ppInfo = pInfo.release();
     }
