@@ -245,28 +245,26 @@ TEST(ConfSupportDualHead, AsksTheModelAndLeavesAMarker)
     }
 }
 
-TEST(ConfSupportDualHead, TakesAFailedLookupForNo)
+void ExpectFailedLookupTakenForNo(const MACHINE &machine, const std::string &szCode)
 {
-    const auto ask = [] {
+    const RUN_RESULT result = MachineCall(machine, [] {
         EXPECT_EQ(NLIBCConfSupportDualHead(), 0);
         EXPECT_TRUE(IsMarked(MARKER_NOT));
-    };
-    const RUN_RESULT absent = MachineCall(MachineWithoutConf(), ask);
-    ASSERT_EQ(absent.log.size(), 1U);
-    EXPECT_EQ(absent.log[0].priority, 15);
-    EXPECT_EQ(absent.log[0].szText.find("keyvalue.cpp:# NLIBCFileGetKeyValue(support_dual_head) "
-                                        "failed [0x0900 keyvalue.cpp:"),
+    });
+    ASSERT_EQ(result.log.size(), 1U);
+    EXPECT_EQ(result.log[0].priority, 15);
+    EXPECT_EQ(result.log[0].szText.find("keyvalue.cpp:# NLIBCFileGetKeyValue(support_dual_head) "
+                                        "failed [" +
+                                        szCode + " keyvalue.cpp:"),
               0U)
-        << absent.log[0].szText;
+        << result.log[0].szText;
+}
 
-    const MACHINE longValue = MachineWithConf("support_dual_head=" + std::string(512, 'y') + "\n");
-    const RUN_RESULT tooLong = MachineCall(longValue, ask);
-    ASSERT_EQ(tooLong.log.size(), 1U);
-    EXPECT_EQ(tooLong.log[0].priority, 15);
-    EXPECT_EQ(tooLong.log[0].szText.find("keyvalue.cpp:# NLIBCFileGetKeyValue(support_dual_head) "
-                                         "failed [0x0100 keyvalue.cpp:"),
-              0U)
-        << tooLong.log[0].szText;
+TEST(ConfSupportDualHead, TakesAFailedLookupForNo)
+{
+    ExpectFailedLookupTakenForNo(MachineWithoutConf(), "0x0900");
+    ExpectFailedLookupTakenForNo(
+        MachineWithConf("support_dual_head=" + std::string(512, 'y') + "\n"), "0x0100");
 }
 
 struct MARKER_CASE {

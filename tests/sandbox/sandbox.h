@@ -237,7 +237,9 @@ RUN_RESULT MachineRunAgain(const MACHINE &machine, const std::vector<std::string
 RUN_RESULT MachineTryAgain(const MACHINE &machine, const std::vector<std::string> &arguments);
 
 // Lays the machine out and runs the body in a process of its own inside it, beside the libraries.
-// EXPECT and ASSERT failures of the body fail the test. What the body prints is in szOut.
+// EXPECT and ASSERT failures of the body fail the test. What the body prints is in szOut. Where
+// bodies run in the test program of another processor, that program has no results of the calls
+// before: a test must reach its later calls whatever came of the earlier ones.
 RUN_RESULT MachineCall(const MACHINE &machine, const std::function<void()> &body);
 
 // After a run of a machine with fCallsTold: each call that can be made to fail, in order within its

@@ -378,17 +378,22 @@ int SpaceExeclOf(const std::vector<std::string> &argv)
     return SpaceExecl(arg(0), arg(1), arg(2), arg(3), arg(4), arg(5), arg(6), NULL);
 }
 
+void ExpectLoggedWithBlanksAndRunAsItIs(const COMMAND_CASE &row)
+{
+    MACHINE machine = MachineMake();
+    MachineTool(machine, row.argv, {.szErr = "x"});
+    const RUN_RESULT result =
+        MachineCall(machine, [&row] { EXPECT_EQ(SpaceExeclOf(row.argv), 0); });
+    EXPECT_EQ(LinesOfLog(), LINES{Line(row.text, "x")});
+    ASSERT_EQ(result.events.size(), 1U);
+    EXPECT_EQ(result.events[0].argv, row.argv);
+}
+
 TEST(SpaceExecl, LogsTheCommandWithBlanksAndRunsItAsItIs)
 {
     for (const COMMAND_CASE &row : COMMAND_CASES) {
         SCOPED_TRACE(row.text);
-        MACHINE machine = MachineMake();
-        MachineTool(machine, row.argv, {.szErr = "x"});
-        const RUN_RESULT result =
-            MachineCall(machine, [&row] { EXPECT_EQ(SpaceExeclOf(row.argv), 0); });
-        EXPECT_EQ(LinesOfLog(), LINES{Line(row.text, "x")});
-        ASSERT_EQ(result.events.size(), 1U);
-        EXPECT_EQ(result.events[0].argv, row.argv);
+        ExpectLoggedWithBlanksAndRunAsItIs(row);
     }
 }
 

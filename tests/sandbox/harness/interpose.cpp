@@ -747,6 +747,18 @@ WRAP_CALL("scandir", sz, scandir64, int, -1,
            int (*pCompare)(const struct dirent64 **, const struct dirent64 **)),
           (sz, p, pFilter, pCompare))
 
+// What 32-bit programs with 64-bit times link to.
+#if __TIMESIZE == 32
+WRAP_AS("fcntl", __fcntl_time64, int, -1, (int fd, int command, long argument),
+        (fd, command, argument))
+WRAP_CALL("stat", sz, __stat64_time64, int, -1, (const char *sz, void *p), (sz, p))
+WRAP_AS("localtime_r", __localtime64_r, void *, nullptr, (const void *pTime, void *pLocal),
+        (pTime, pLocal))
+WRAP_CALL("glob", sz, __glob64_time64, int, errno == ENOMEM ? GLOB_NOSPACE : GLOB_ABORTED,
+          (const char *sz, int flags, int (*pError)(const char *, int), void *p),
+          (sz, flags, pError, p))
+#endif
+
 // Children of the program end by _exit, which drops what a program that counts has counted.
 VISIBLE void Wrap__exit(int status) __asm__("_exit");
 VISIBLE void Wrap__exit(int status)

@@ -232,7 +232,8 @@ std::string ProgramsCopy()
             return szProblem;
         }
     }
-    return "";
+    const char *const szBodies = getenv("ARRAYCTL_BODIES");
+    return szBodies == nullptr ? "" : FileCopy(szBodies, WIRE_BODIES);
 }
 
 std::string LogSocketMake()

@@ -37,6 +37,7 @@ namespace
 
 constexpr int STATUS_NOT_STARTED = 126;
 constexpr size_t LOG_LINE_SIZE = 65536;
+constexpr int EMULATOR_SLOWNESS = 10;
 
 // What the supervisor of a run tells at its end.
 struct CHILD_REPORT {
@@ -132,23 +133,32 @@ std::vector<std::string> EnvironmentOf(const MACHINE &machine)
 }
 
 // ARRAYCTL_RUNNER is a program, with arguments, that runs the tool: an emulator of its processor.
-[[noreturn]] void ProgramBecome(const MACHINE &machine, const std::vector<std::string> &arguments)
+[[noreturn]] void RunnerBecome(const std::string &szProgram, const std::string &szName,
+                               const std::vector<std::string> &arguments,
+                               std::vector<std::string> environment,
+                               const std::function<void()> &prepare = {})
 {
     std::vector<std::string> argv = WordsOf(getenv("ARRAYCTL_RUNNER"));
-    const std::string szProgram = argv.empty() ? WIRE_PROGRAM : argv[0];
+    const std::string szExecuted = argv.empty() ? szProgram : argv[0];
     if (argv.empty()) {
-        argv.emplace_back("arrayctl");
+        argv.push_back(szName);
     } else {
-        argv.insert(argv.end(), {"-0", "arrayctl", WIRE_PROGRAM});
+        argv.insert(argv.end(), {"-0", szName, szProgram});
     }
     argv.insert(argv.end(), arguments.begin(), arguments.end());
-    std::vector<std::string> environment = EnvironmentOf(machine);
-    if (machine.prepare) {
-        machine.prepare();
+    const std::vector<char *> words = Pointers(argv);
+    const std::vector<char *> variables = Pointers(environment);
+    if (prepare) {
+        prepare();
     }
-    (void)execve(szProgram.c_str(), Pointers(argv).data(), Pointers(environment).data());
-    fprintf(stderr, "sandbox: %s: %s\n", szProgram.c_str(), strerror(errno));
+    (void)execve(szExecuted.c_str(), words.data(), variables.data());
+    fprintf(stderr, "sandbox: %s: %s\n", szExecuted.c_str(), strerror(errno));
     _exit(STATUS_NOT_STARTED);
+}
+
+[[noreturn]] void ProgramBecome(const MACHINE &machine, const std::vector<std::string> &arguments)
+{
+    RunnerBecome(WIRE_PROGRAM, "arrayctl", arguments, EnvironmentOf(machine), machine.prepare);
 }
 
 // ---- its supervisor ----------------------------------------------------------------------------
@@ -247,10 +257,15 @@ void StatusTake(const CHILD_REPORT &report, RUN_RESULT &result)
     result.nRunning = report.nRunning;
 }
 
+int BoundOf(const MACHINE &machine)
+{
+    return machine.msBound * (getenv("ARRAYCTL_RUNNER") != nullptr ? EMULATOR_SLOWNESS : 1);
+}
+
 void RunProblemsAdd(const MACHINE &machine, bool fReported, RUN_RESULT &result)
 {
     if (result.fTimedOut) {
-        result.problems.push_back("it hangs: not done after " + std::to_string(machine.msBound) +
+        result.problems.push_back("it hangs: not done after " + std::to_string(BoundOf(machine)) +
                                   " ms");
     } else if (!fReported) {
         result.problems.emplace_back("the sandbox itself broke down");
@@ -303,7 +318,7 @@ RUN_RESULT Watch(const MACHINE &machine, const BODY &body, std::string &szFailur
     }
     close(fdReport[1]);
     CHILD_REPORT report = {};
-    const bool fReported = ReportAwait(fdReport[0], machine.msBound, result, report);
+    const bool fReported = ReportAwait(fdReport[0], BoundOf(machine), result, report);
     (void)kill(pid, SIGKILL);
     (void)waitpid(pid, nullptr, 0);
     close(fdReport[0]);
@@ -317,13 +332,39 @@ RUN_RESULT Watch(const MACHINE &machine, const BODY &body, std::string &szFailur
     }
     TranscriptTake(machine, result);
     RunProblemsAdd(machine, fReported, result);
+    TranscriptKeep(machine, result);
     return result;
+}
+
+// ---- bodies of another processor ---------------------------------------------------------------
+
+// ARRAYCTL_BODIES is this test program, built for the processor of ARRAYCTL_RUNNER. A body then
+// runs there: the other program is started inside the machine for the same test, passes by whatever
+// the test did before, and ends with the body. BODY_VARIABLE tells it which body that is, and where
+// its output and its failures go.
+constexpr char BODY_VARIABLE[] = "SANDBOX_BODY";
+
+struct BODY_ORDER {
+    int nCall;
+    int fdOut;
+    int fdFailures;
+};
+
+bool BodyOrderGet(BODY_ORDER &order)
+{
+    const char *const szOrder = getenv(BODY_VARIABLE);
+    return szOrder != nullptr &&
+           sscanf(szOrder, "%d %d %d", &order.nCall, &order.fdOut, &order.fdFailures) == 3;
 }
 
 RUN_RESULT ProgramWatch(const MACHINE &machine, const std::vector<std::string> &arguments,
                         void (*pLayOut)(const MACHINE &))
 {
     RUN_RESULT result;
+    BODY_ORDER order = {};
+    if (BodyOrderGet(order)) {
+        return result;
+    }
     if (!RoomEnter().empty()) {
         result.problems.push_back(RoomEnter());
         return result;
@@ -383,6 +424,7 @@ void FailuresReport(const std::string &szFailures)
         machine.prepare();
     }
     InterposeActivate();
+    errno = 0; // that of the test program says nothing about the machine
     body();
     InterposeDeactivate();
     (void)fflush(nullptr);
@@ -391,6 +433,44 @@ void FailuresReport(const std::string &szFailures)
         __gcov_dump();
     }
     _exit(0);
+}
+
+// Bodies of the current test so far, this one included.
+int BodyCount()
+{
+    static std::string szTest;
+    static int nCall = 0;
+    if (szTest != TestName()) {
+        szTest = TestName();
+        nCall = 0;
+    }
+    return ++nCall;
+}
+
+// Standard output is put aside until the body begins: the test program has messages of its own.
+[[noreturn]] void BodySend(int nCall, int fdFailures)
+{
+    const int fdOut = dup(STDOUT_FILENO);
+    const int fdNull = open("/dev/null", O_WRONLY | O_CLOEXEC);
+    (void)dup2(fdNull, STDOUT_FILENO);
+    (void)fcntl(fdFailures, F_SETFD, 0);
+    char szOrder[64] = "";
+    snprintf(szOrder, sizeof(szOrder), "%s=%d %d %d", BODY_VARIABLE, nCall, fdOut, fdFailures);
+    RunnerBecome(WIRE_BODIES, program_invocation_short_name, {"--gtest_filter=" + TestName()},
+                 {szOrder});
+}
+
+// In the other program: passes by every body but the one that is asked for, and ends with that.
+void BodyReceive(const BODY_ORDER &order, const MACHINE &machine, const std::function<void()> &body)
+{
+    if (BodyCount() != order.nCall) {
+        return;
+    }
+    (void)fflush(nullptr);
+    (void)dup2(order.fdOut, STDOUT_FILENO);
+    close(order.fdOut);
+    (void)fcntl(order.fdFailures, F_SETFD, FD_CLOEXEC);
+    BodyRun(machine, body, order.fdFailures);
 }
 
 } // namespace
@@ -418,14 +498,25 @@ RUN_RESULT MachineRunAgain(const MACHINE &machine, const std::vector<std::string
 RUN_RESULT MachineCall(const MACHINE &machine, const std::function<void()> &body)
 {
     RUN_RESULT result;
+    BODY_ORDER order = {};
+    if (BodyOrderGet(order)) {
+        BodyReceive(order, machine, body);
+        return result;
+    }
     if (!RoomEnter().empty()) {
         ADD_FAILURE() << RoomEnter();
         return result;
     }
     RoomLayOut(machine);
     std::string szFailures;
+    const int nCall = BodyCount();
+    const bool fElsewhere = getenv("ARRAYCTL_BODIES") != nullptr;
     result = Watch(
-        machine, [&](const RUN_STREAMS &streams) { BodyRun(machine, body, streams.fdFailures); },
+        machine,
+        [&](const RUN_STREAMS &streams) {
+            fElsewhere ? BodySend(nCall, streams.fdFailures)
+                       : BodyRun(machine, body, streams.fdFailures);
+        },
         szFailures);
     FailuresReport(szFailures);
     if (result.status != 0 && !result.fTimedOut) {

@@ -3,7 +3,11 @@
 
 #include "wire.h"
 
+#include <gtest/gtest.h>
+
+#include <algorithm>
 #include <cctype>
+#include <cstdio>
 #include <cstdlib>
 #include <cstring>
 
@@ -141,7 +145,70 @@ void EventProblemsAdd(const RUN_EVENT &event, RUN_RESULT &result)
     }
 }
 
+// True for a command that may be run or not: which of the two it is, is chance.
+bool IsOptional(const MACHINE &machine, const RUN_EVENT &event)
+{
+    return std::any_of(machine.rows.begin(), machine.rows.end(), [&](const TOOL_ROW &row) {
+        return row.answer.nTimes == ANY_TIMES && !event.argv.empty() &&
+               event.argv[0] == row.argv[0];
+    });
+}
+
+// Each kind of thing under a heading of its own; every command with all that is known of it. Last
+// words before a signal are the C library's, and the emulator's.
+std::string KeptText(const MACHINE &machine, const RUN_RESULT &result)
+{
+    std::string szText = "status " + std::to_string(result.status) + " signal " +
+                         std::to_string(result.signal) + "\n== output\n" + result.szOut +
+                         "\n== errors\n" + (result.signal == 0 ? result.szErr : "") + "\n== log\n";
+    for (const LOG_LINE &line : result.log) {
+        szText +=
+            "<" + std::to_string(line.priority) + ">" + line.szTag + ": " + line.szText + "\n";
+    }
+    szText += "== events\n";
+    for (const RUN_EVENT &event : result.events) {
+        if (event.kind == EVENT_KIND::SLEEP) {
+            szText += WordsText(event.argv) + "\n";
+        } else if (event.kind == EVENT_KIND::COMMAND && !IsOptional(machine, event)) {
+            szText += WordsText(event.argv) + "\n";
+            szText += "    " + event.szExecuted + " null " + std::to_string(event.fNullInput) +
+                      std::to_string(event.fNullOutput) + std::to_string(event.fNullError) +
+                      " open " + std::to_string(event.nDescriptors) + " environment " +
+                      WordsText(event.environment) + "\n";
+        }
+    }
+    return szText;
+}
+
 } // namespace
+
+std::string TestName()
+{
+    const testing::TestInfo *const pTest = testing::UnitTest::GetInstance()->current_test_info();
+    return pTest == nullptr ? "" : std::string(pTest->test_suite_name()) + "." + pTest->name();
+}
+
+void TranscriptKeep(const MACHINE &machine, const RUN_RESULT &result)
+{
+    static std::string szTest;
+    static int nRun = 0;
+    const char *const szFolder = getenv("ARRAYCTL_TRANSCRIPTS");
+    if (szFolder == nullptr) {
+        return;
+    }
+    nRun = szTest == TestName() ? nRun + 1 : 1;
+    szTest = TestName();
+    std::string szPath = szTest + "." + std::to_string(nRun);
+    std::replace(szPath.begin(), szPath.end(), '/', '_');
+    szPath = std::string(szFolder) + "/" + szPath;
+    FILE *const pFile = fopen(szPath.c_str(), "we");
+    const std::string szText = KeptText(machine, result);
+    if (pFile == nullptr || fwrite(szText.data(), 1, szText.size(), pFile) != szText.size() ||
+        fclose(pFile) != 0) {
+        perror(szPath.c_str());
+        abort();
+    }
+}
 
 LOG_LINE LogLineParse(std::string_view szDatagram)
 {

@@ -9,3 +9,10 @@ LOG_LINE LogLineParse(std::string_view szDatagram);
 
 // Reads the records of the last run into the result, and compares them with the machine's rows.
 void TranscriptTake(const MACHINE &machine, RUN_RESULT &result);
+
+// "Suite.Test" of the test that runs; "" outside of tests.
+std::string TestName();
+
+// Puts all that the program did in the run into the folder ARRAYCTL_TRANSCRIPTS, when there is one,
+// so that its behaviour on two processors can be compared.
+void TranscriptKeep(const MACHINE &machine, const RUN_RESULT &result);

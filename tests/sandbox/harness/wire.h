@@ -12,6 +12,7 @@
 #define WIRE_DRIVER WIRE_FOLDER "/driver"         // what requests answer, which calls fail
 #define WIRE_CALLS WIRE_FOLDER "/calls" // every call that can be made to fail, a line each
 #define WIRE_PROGRAM WIRE_FOLDER "/arrayctl"
+#define WIRE_BODIES WIRE_FOLDER "/bodies" // bodies of another processor
 #define WIRE_INTERPOSE WIRE_FOLDER "/interpose.so"
 #define WIRE_STANDIN WIRE_FOLDER "/standin"
 #define WIRE_SHELL WIRE_FOLDER "/sh"
