@@ -23,7 +23,8 @@ PACKAGES=(
     g++-powerpc-linux-gnu        # the appliance's own processor: the compiler,
     qemu-user-static             # its programs on this machine,
     qemu-system-ppc              # a whole machine of it,
-    linux-source-6.1 make bc bison flex # and the kernel of that machine
+    linux-source-6.1 make bc bison flex # the kernel of that machine
+    dpkg-dev                     # and its programs, from source packages
     g++-12-multilib              # 32-bit words on this machine
     mdadm lvm2 dmsetup e2fsprogs gdisk
     mandoc lintian               # the manual page, the Debian packages

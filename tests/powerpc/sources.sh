@@ -1,0 +1,106 @@
+# SPDX-License-Identifier: MIT
+# shellcheck shell=bash disable=SC2034
+#
+# The PowerPC machine's kernel and programs, all made from Debian's source packages with the cross
+# compiler. They are made once and kept in the cache folder.
+
+CROSS=powerpc-linux-gnu
+CROSS_ROOT=/usr/$CROSS
+KERNEL_PACKAGE=linux-source-6.1
+KERNEL_ARCHIVE=/usr/src/$KERNEL_PACKAGE.tar.xz
+SOURCE_JOBS=$(nproc)
+
+# Source packages are looked for beside the machine's own list of packages, which stays as it is.
+DEBIAN_KEYRING=/usr/share/keyrings/debian-archive-keyring.gpg
+DEBIAN_MIRROR=http://deb.debian.org/debian
+DEBIAN_SUITE=bookworm
+
+# Each source package, and the function that makes what is needed of it.
+declare -A SOURCE_BUILDS=(
+    [busybox]=busybox_build
+    [mdadm]=mdadm_build
+    [util-linux]=util_linux_build
+)
+
+# What was made, and where it lies inside.
+GUEST_PROGRAMS=(
+    busybox/busybox:/usr/bin/busybox
+    mdadm/mdadm:/usr/sbin/mdadm
+    util-linux/sfdisk:/usr/sbin/sfdisk.stock
+    util-linux/blkid:/usr/sbin/blkid
+    util-linux/wipefs:/usr/sbin/wipefs
+)
+
+# run_logged LOG COMMAND...: silent unless it fails.
+run_logged() {
+    local szLog=$1
+    shift
+    "$@" >>"$szLog" 2>&1 || { tail -n 30 "$szLog" >&2; die "'$1' failed, see $szLog"; }
+}
+
+# source_fetch PACKAGE FOLDER: FOLDER/PACKAGE is the unpacked source.
+source_fetch() {
+    local szApt=$2/apt
+    local -a options=(
+        -o Dir::Etc::sourcelist=/dev/null -o "Dir::Etc::sourceparts=$szApt/parts"
+        -o "Dir::State::lists=$szApt/lists" -o "Dir::Cache=$szApt/cache" -o APT::Sandbox::User=root
+    )
+    if [ ! -d "$szApt" ]; then
+        mkdir -p "$szApt/parts" "$szApt/lists/partial" "$szApt/cache"
+        printf 'deb-src [signed-by=%s] %s %s main\n' \
+            "$DEBIAN_KEYRING" "$DEBIAN_MIRROR" "$DEBIAN_SUITE" >"$szApt/parts/source.list"
+        run_logged "$2/apt.log" apt-get -q "${options[@]}" update
+    fi
+    note "fetching the source of $1"
+    (cd "$2" && run_logged "$2/$1.log" apt-get -q "${options[@]}" source --download-only "$1")
+    run_logged "$2/$1.log" dpkg-source -x "$2/$1"_*.dsc "$2/$1"
+}
+
+kernel_build() {
+    local szWork=$1 szOut=$2
+    local -a make=(make -C "$szWork/linux" ARCH=powerpc "CROSS_COMPILE=$CROSS-" -j "$SOURCE_JOBS")
+    note "making the kernel of the PowerPC machine (once, some minutes)"
+    mkdir "$szWork/linux"
+    tar -xJf "$KERNEL_ARCHIVE" -C "$szWork/linux" --strip-components 1
+    run_logged "$szWork/linux.log" "${make[@]}" "KCONFIG_ALLCONFIG=$POWERPC_DIR/kernel.config" allnoconfig
+    kernel_config_check "$szWork/linux/.config"
+    run_logged "$szWork/linux.log" "${make[@]}" vmlinux
+    "$CROSS-strip" -o "$szOut/vmlinux" "$szWork/linux/vmlinux"
+}
+
+# The kernel's configuration drops what it cannot have without a word.
+kernel_config_check() {
+    local szMissing
+    szMissing=$(grep '^CONFIG_' "$POWERPC_DIR/kernel.config" | grep -vxFf "$1" || true)
+    [ -z "$szMissing" ] || die "the kernel does not take: $szMissing"
+}
+
+busybox_build() {
+    local szSource=$1
+    local -a make=(make -C "$szSource" ARCH=powerpc "CROSS_COMPILE=$CROSS-" -j "$SOURCE_JOBS")
+    "${make[@]}" defconfig
+    # Its tc does not build with the headers of newer kernels.
+    sed -i -e 's/^CONFIG_TC=y/# CONFIG_TC is not set/' \
+        -e 's/^# CONFIG_STATIC is not set/CONFIG_STATIC=y/' "$szSource/.config"
+    "${make[@]}" busybox
+}
+
+mdadm_build() {
+    # It hands the driver 64 bits of a device number where the request takes one word: the upper
+    # half, on this processor.
+    sed -i 's/^\(\t*\)rdev))) {$/\1(unsigned long)rdev))) {/' "$1/Manage.c"
+    grep -q '(unsigned long)rdev))) {' "$1/Manage.c" || return
+    make -C "$1" -j "$SOURCE_JOBS" "CC=$CROSS-gcc" "CXFLAGS=-O2 -DNO_LIBUDEV -D_FILE_OFFSET_BITS=64" \
+        CWFLAGS= CHECK_RUN_DIR=0 mdadm
+}
+
+util_linux_build() {
+    cd "$1" || return
+    ./configure "--host=$CROSS" --prefix=/usr --disable-nls --disable-shared --enable-static \
+        --disable-chfn-chsh --disable-login --disable-su --disable-runuser \
+        --disable-nologin --disable-sulogin --disable-liblastlog \
+        --without-python --without-ncurses --without-ncursesw --without-tinfo --without-systemd \
+        --without-udev --without-readline --without-econf --disable-bash-completion \
+        --disable-asciidoc CFLAGS=-O2 &&
+        make -j "$SOURCE_JOBS" ACLOCAL=: AUTOMAKE=: AUTOCONF=: AUTOHEADER=: sfdisk blkid wipefs
+}
