@@ -863,6 +863,7 @@ int CommandRun(const COMMAND &command, int argc, char *argv[])
 
 int main(int argc, char *argv[])
 {
+    NLIBCStdioOccupy();
     if (argc <= 1) {
         return Usage();
     }

@@ -153,6 +153,9 @@ TEST(HostileStreams, AMissingArrayWithoutStandardOutputIsNotFound)
     const RUN_RESULT result = MachineRun(machine, {"status", "7"});
     EXPECT_EQ(result.status, 1);
     EXPECT_EQ(result.szOut + result.szErr, "");
+    // The log's socket has not become the standard output.
+    EXPECT_EQ(LogText(result), "<15>raid_info.cpp:# Failed to open /dev/md7, errno=No such file or "
+                               "directory\n");
 }
 
 // The pipes of the tools then have the numbers of the standard streams.

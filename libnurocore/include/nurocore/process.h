@@ -40,5 +40,9 @@ int NLIBCForkCloseIo();
 // caller's. NULL without a code when there is no memory.
 char **NLIBCArgvAlloc(const char *szPath, va_list arguments);
 
+// Puts /dev/null where a standard stream is closed: a device or the system log would get its number
+// next, and what is printed with it.
+void NLIBCStdioOccupy();
+
 // Makes /dev/null standard input, output and error; they stay as they are if it does not open.
 void NLIBCStdioToNull();

@@ -137,6 +137,17 @@ int RunResult(pid_t pid)
 
 } // namespace
 
+void NLIBCStdioOccupy()
+{
+    int fd = open(_PATH_DEVNULL, O_RDWR | O_CLOEXEC);
+    while (fd >= 0 && fd <= STDERR_FILENO) {
+        (void)fcntl(fd, F_SETFD, 0); // for the tools, too
+        fd = open(_PATH_DEVNULL, O_RDWR | O_CLOEXEC);
+    }
+    // The one above the streams stays open: no tool gets it, and to close it would be a system call
+    // of every run.
+}
+
 void NLIBCStdioToNull()
 {
     const int fd = open(_PATH_DEVNULL, O_RDWR);
