@@ -92,11 +92,14 @@ int MembersCollect(const glob_t &matches, RAID_DISK **ppDisks)
     return 0;
 }
 
+// Partition numbers aside. A name that is too long is told and equal to nothing, itself included.
 bool IsSameDisk(const char *szPath, const char *szWanted)
 {
     char szDisk[DISK_NAME_SIZE];
-    return DiskPartitionNumRemove(szPath, szDisk, DISK_NAME_SIZE) == 0 &&
-           strcmp(szDisk, szWanted) == 0;
+    char szWantedDisk[DISK_NAME_SIZE];
+    const int removed = DiskPartitionNumRemove(szPath, szDisk, DISK_NAME_SIZE);
+    const int removedWanted = DiskPartitionNumRemove(szWanted, szWantedDisk, DISK_NAME_SIZE);
+    return removed == 0 && removedWanted == 0 && strcmp(szDisk, szWantedDisk) == 0;
 }
 
 } // namespace
@@ -232,9 +235,7 @@ int RAIDDiskListSearch(RAID_DISK *pDisks, const char *szDisk, RAID_DISK **ppDisk
         return -1;
     }
     for (RAID_DISK *pDisk = pDisks; pDisk != nullptr; pDisk = pDisk->pNext) {
-        char szWanted[DISK_NAME_SIZE];
-        if (DiskPartitionNumRemove(szDisk, szWanted, DISK_NAME_SIZE) != 0 ||
-            !IsSameDisk(pDisk->szPath, szWanted)) {
+        if (!IsSameDisk(pDisk->szPath, szDisk)) {
             continue;
         }
         if (ppDisk != nullptr) {
