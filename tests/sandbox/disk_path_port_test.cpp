@@ -7,8 +7,10 @@
 
 #include <cerrno>
 #include <climits>
+#include <fcntl.h>
 #include <gtest/gtest.h>
 #include <string>
+#include <syslog.h>
 #include <vector>
 
 namespace
@@ -27,6 +29,15 @@ MACHINE MachineWithPorts()
     MachineFile(machine, "/sys/class/scsi_host/host0/nuro_pm_info",
                 "nuro_device_list=/dev/sdg,/dev/sdha,/dev/sdhb\n");
     return machine;
+}
+
+int DescriptorsCount()
+{
+    int nOpen = 0;
+    for (int fd = 0; fd < 64; fd++) {
+        nOpen += fcntl(fd, F_GETFD) != -1;
+    }
+    return nOpen;
 }
 
 void RecordReset()
@@ -149,6 +160,20 @@ TEST(DiskPathParse, FailsForPathsOf32Characters)
               "of szPartPath\n"
               "<11>disk_path.cpp:# bad paramters: unknown device, disk path: " +
                   path + "\n");
+}
+
+// The card's name is looked at up to its 31st character: a number behind that is none.
+TEST(DiskPathParse, CutsTheNameOfACardAt31Characters)
+{
+    const std::string name = "mmcblk" + std::string(25, '1');
+    const RUN_RESULT result = MachineCall(MachineWithPorts(), [&name] {
+        DISK_PATH_INFO info = {};
+        EXPECT_EQ(DiskPathParse(("/dev/" + name + "p3").c_str(), &info), 0);
+        EXPECT_EQ(info.partitionNum, 3);
+        EXPECT_EQ(DiskPathParse(("/dev/" + name + "1p3").c_str(), &info), 0);
+        EXPECT_EQ(info.partitionNum, -1);
+    });
+    EXPECT_EQ(LogText(result), "");
 }
 
 TEST(DiskPathParse, RefusesNullInSilence)
@@ -314,12 +339,25 @@ TEST(DiskIsExist, OpensTheDeviceAndAsksItsSize)
             machine.faults = {{.szFunction = "open", .error = row.openError}};
         }
         const RUN_RESULT result = MachineCall(machine, [&row] {
+            openlog(nullptr, LOG_NDELAY, LOG_USER); // the log's own descriptor is none of its
+            const int nOpen = DescriptorsCount();
             RecordReset();
             EXPECT_EQ(DiskIsExist(row.szPath), row.result);
             EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
+            EXPECT_EQ(DescriptorsCount(), nOpen);
         });
         EXPECT_EQ(LogText(result), row.szLog);
     }
+}
+
+// A folder opens for reading alone.
+TEST(DiskIsExist, OpensTheDeviceForReading)
+{
+    MACHINE machine = MachineMake();
+    MachineFolder(machine, "/dev/sda");
+    machine.deviceSizes.push_back({.szPath = "/dev/sda", .cb = 6442450944});
+    const RUN_RESULT result = MachineCall(machine, [] { EXPECT_EQ(DiskIsExist("/dev/sda"), 1); });
+    EXPECT_EQ(LogText(result), "");
 }
 
 } // namespace

@@ -635,6 +635,48 @@ TEST(ExpansionUnit, IsNoneWhenItsListIsTooLongForTheCheck)
     EXPECT_EQ(LogText(MachineCall(machine, check(ESATA_DEVICE))), "");
 }
 
+// Fills the units' list with `cbOther` bytes of other disks and reports sdb behind them.
+MACHINE MachineWithLongList(size_t cbOther)
+{
+    MACHINE machine = MachineWithConf("usbportcfg=1\nesataportcfg=2\n");
+    int nHost = 10; // two digits sort as they count
+    while (cbOther > 0) {
+        std::string devices;
+        for (int i = 0; i < 12 && cbOther > 0; i++) {
+            const size_t cbName = cbOther > 32 ? 15 : (cbOther > 16 ? cbOther / 2 : cbOther) - 1;
+            devices += (i == 0 ? "/dev/" : ",/dev/") + std::string(cbName, 'x');
+            cbOther -= cbName + 1;
+        }
+        UnitAdd(machine, "host" + std::to_string(nHost++), devices);
+    }
+    UnitAdd(machine, "host" + std::to_string(nHost), "/dev/sdb");
+    return machine;
+}
+
+// "sdb" has room when it ends at the 1024th byte at the latest, but loses its last letter there to
+// the end of the text.
+TEST(ExpansionUnit, HasAListOf1024Bytes)
+{
+    const struct {
+        size_t cbOther;
+        int type;
+    } rows[] = {{1019, EUNIT_DEVICE},
+                {1020, EUNIT_DEVICE},
+                {1021, ESATA_DEVICE},
+                {1022, ESATA_DEVICE},
+                {1023, ESATA_DEVICE}};
+    for (const auto &row : rows) {
+        SCOPED_TRACE(row.cbOther);
+        const RUN_RESULT result = MachineCall(MachineWithLongList(row.cbOther), [&row] {
+            std::array<char, 1024> list = {};
+            (void)ExternalDiskPortEnumEunit(0, list.data(), 1024);
+            EXPECT_EQ(strspn(list.data(), "x "), row.cbOther);
+            EXPECT_EQ(ExternalDiskPortCheck("sdb"), row.type);
+        });
+        EXPECT_EQ(LogText(result), "");
+    }
+}
+
 // ---- enumeration -------------------------------------------------------------------------------
 
 std::string ItemsOf(PNLIBSZLIST pList)

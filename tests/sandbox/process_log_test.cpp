@@ -8,8 +8,10 @@
 
 #include <cerrno>
 #include <climits>
+#include <csignal>
 #include <cstdio>
 #include <cstdlib>
+#include <fcntl.h>
 #include <gtest/gtest.h>
 #include <string>
 #include <unistd.h>
@@ -32,6 +34,15 @@ MACHINE MachineWithFault(const MACHINE_FAULT &fault)
 void RecordReset()
 {
     NLIBCErrSet(OLD_CODE, "before", 1);
+}
+
+int DescriptorsCount()
+{
+    int nOpen = 0;
+    for (int fd = 0; fd < 64; fd++) {
+        nOpen += fcntl(fd, F_GETFD) != -1;
+    }
+    return nOpen;
 }
 
 std::string StreamRead(FILE *pStream)
@@ -80,6 +91,74 @@ TEST(Fork, LogsWhenTheGrandchildOfADaemonCannotBeMade)
     });
     EXPECT_EQ(LogText(result),
               "<11>process.cpp:# Failed to fork(). errno=[12/Cannot allocate memory]\n");
+}
+
+volatile sig_atomic_t g_childStatus = -1;
+
+void ChildStatusKeep(int, siginfo_t *pInfo, void *)
+{
+    g_childStatus = pInfo->si_code == CLD_EXITED ? pInfo->si_status : -2;
+}
+
+TEST(Fork, TheFirstChildOfADaemonEndsWith255WhenItCannotFork)
+{
+    const MACHINE machine = MachineWithFault({.szFunction = "fork", .nCall = 2, .error = ENOMEM});
+    MachineCall(machine, [] {
+        struct sigaction action = {};
+        action.sa_sigaction = ChildStatusKeep;
+        action.sa_flags = SA_SIGINFO;
+        ASSERT_EQ(sigaction(SIGCHLD, &action, nullptr), 0);
+        EXPECT_EQ(NLIBCFork(FORK_DAEMONIZE), -1);
+        EXPECT_EQ(g_childStatus, 255);
+    });
+}
+
+// One call for each flag, and the fork of the grandchild.
+bool IsFlagsCall(const std::string &szCall)
+{
+    for (const char *szName : {"setpriority", "clearenv", "open", "fork", "setsid", "chdir"}) {
+        if (szCall.rfind(szName + std::string(" "), 0) == 0) {
+            return true;
+        }
+    }
+    return false;
+}
+
+// What a process of the last run has called for its flags.
+std::string FlagsCalls(const std::string &szProcess)
+{
+    std::string calls;
+    for (const std::string &szLine : MachineCalls()) {
+        const std::string szCall =
+            szLine.rfind(szProcess + " ", 0) == 0 ? szLine.substr(szProcess.size() + 1) : "";
+        calls += IsFlagsCall(szCall) ? szCall + "\n" : "";
+    }
+    return calls;
+}
+
+// The first child applies its flags up to its own fork, the grandchild goes on from there. That
+// descriptors are closed is left to other tests: so would be the end of the pipe here.
+TEST(Fork, AppliesItsFlagsInOrder)
+{
+    MACHINE machine = MachineMake();
+    machine.fCallsTold = true;
+    machine.fMayLeaveChildren = true;
+    const RUN_RESULT result = MachineCall(machine, [] {
+        int fdEnd[2] = {-1, -1};
+        ASSERT_EQ(pipe(fdEnd), 0);
+        const int forked = NLIBCFork(0xFB);
+        if (forked == 0) {
+            _exit(0);
+        }
+        EXPECT_EQ(forked, 1);
+        char ch = 0;
+        (void)close(fdEnd[1]);
+        EXPECT_EQ(read(fdEnd[0], &ch, 1), 0); // the grandchild has ended
+        (void)close(fdEnd[0]);
+    });
+    EXPECT_EQ(FlagsCalls("0.1"), "setpriority -\nclearenv -\nopen /dev/null\nfork -\n");
+    EXPECT_EQ(FlagsCalls("0.1.1"), "setsid -\nchdir -\n");
+    EXPECT_EQ(TranscriptText(result), "sleep 0.000001\n");
 }
 
 TEST(Execl, LeavesTheCodeOfTheRunWhenItCannotFork)
@@ -178,10 +257,12 @@ TEST(Popen, SetsACodeAndLogsNothingWhenItFails)
         MachineTool(machine, "/sbin/pvs", {.nTimes = ANY_TIMES});
         machine.fMayLeaveChildren = true;
         const RUN_RESULT result = MachineCall(machine, [&row] {
+            const int nOpen = DescriptorsCount();
             RecordReset();
             EXPECT_EQ(NLIBCPopen("/sbin/pvs", "r", NULL), nullptr);
             EXPECT_EQ(NLIBCErrGet(), row.code);
             EXPECT_STREQ(NLIBCErrGetFile(), "pipe.cpp");
+            EXPECT_EQ(DescriptorsCount(), nOpen);
         });
         EXPECT_EQ(LogText(result), "");
     }

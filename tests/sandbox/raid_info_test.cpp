@@ -644,8 +644,7 @@ TEST(RaidInfoFailure, TheStepsHaveAnOrder)
 {
     const std::string szLevel = "<15>raid_info.cpp:# Not supported RAID level: 4\n";
     ExpectQueryFails({.nMd = 2, .level = 4, .errnoSize = ENODEV}, 0x0600,
-                     szLevel +
-                         "<15>raid_info.cpp:# Failed to ioctl for raid size, errno=0X600\n");
+                     szLevel + "<15>raid_info.cpp:# Failed to ioctl for raid size, errno=0X600\n");
     ExpectQueryFails({.nMd = 2, .level = 4, .errnoInfo = EINTR, .errnoSize = ENODEV}, 0xA700,
                      "<15>raid_info.cpp:# Failed to ioctl for raid status, errno=0XA700\n");
 
@@ -661,8 +660,7 @@ TEST(RaidInfoFailure, TheStepsHaveAnOrder)
                      szMember + "<15>raid_info.cpp:# Failed to get disk list for /dev/md2, "
                                 "errno=0X600\n");
     ExpectQueryFails({.nMd = 2, .errnoHealth = ENODEV, .members = members}, 0x0600,
-                     szMember +
-                         "<15>raid_info.cpp:# Failed to ioctl for raid size, errno=0X600\n");
+                     szMember + "<15>raid_info.cpp:# Failed to ioctl for raid size, errno=0X600\n");
     ExpectQueryFails({.nMd = 2, .errnoHealth = EINTR, .errnoSync = ENODEV}, 0x0600,
                      "<15>raid_info.cpp:# Failed to get disk list for /dev/md2, errno=0X600\n");
 }

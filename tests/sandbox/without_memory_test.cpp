@@ -5,6 +5,7 @@
 #include "hwcontrol/disk_port.h"
 #include "nurocore/error.h"
 #include "nurocore/file.h"
+#include "nurocore/keyvalue.h"
 #include "nurocore/pipe.h"
 #include "nurocore/szlist.h"
 #include "nurocore/text.h"
@@ -15,9 +16,11 @@
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <fcntl.h>
 #include <functional>
 #include <gtest/gtest.h>
 #include <string>
+#include <unistd.h>
 
 namespace
 {
@@ -46,6 +49,12 @@ std::string Told(long answer)
     char sz[64] = "";
     (void)snprintf(sz, sizeof(sz), "%ld %X", answer, NLIBCErrGet());
     return sz;
+}
+
+// And how many items its list has then.
+std::string ToldWithItems(long answer, const PNLIBSZLIST &pList)
+{
+    return Told(answer) + " " + std::to_string(pList->nItem);
 }
 
 struct LIST_SCOPE {
@@ -135,10 +144,14 @@ TEST(WithoutMemory, FieldsAreNotSplit)
     const std::string szText = szField + " " + szField + " " + szField + " " + szField;
     const auto body = [&szText] {
         LIST_SCOPE list(0, 'a', SZLIST_UNSORTED);
-        return list.p == nullptr ? "no list" : Told(NLIBCStrTok(szText.c_str(), " ", &list.p));
+        if (list.p == nullptr) {
+            return std::string("no list");
+        }
+        return ToldWithItems(NLIBCStrTok(szText.c_str(), " ", &list.p), list.p);
     };
-    EXPECT_EQ(TimesSeen(MachineMake(), "malloc", "-1 200", body), 2) << "copy and list";
-    EXPECT_EQ(TimesSeen(MachineMake(), "strdup", "-1 200", body), 1) << "the copy";
+    EXPECT_EQ(TimesSeen(MachineMake(), "malloc", "-1 200 0", body), 1) << "the copy";
+    EXPECT_EQ(TimesSeen(MachineMake(), "malloc", "-1 200 2", body), 1) << "the list";
+    EXPECT_EQ(TimesSeen(MachineMake(), "strdup", "-1 200 0", body), 1) << "the copy";
 }
 
 TEST(WithoutMemory, LinesAreNotRead)
@@ -147,9 +160,41 @@ TEST(WithoutMemory, LinesAreNotRead)
     MachineFile(machine, "/tmp/lines", std::string(400, 'x') + "\n" + std::string(400, 'y') + "\n");
     const auto body = [] {
         LIST_SCOPE list(0, 'a', SZLIST_UNSORTED);
-        return list.p == nullptr ? "no list" : Told(NLIBCFileReadLines("/tmp/lines", &list.p));
+        if (list.p == nullptr) {
+            return std::string("no list");
+        }
+        return ToldWithItems(NLIBCFileReadLines("/tmp/lines", &list.p), list.p);
     };
-    EXPECT_EQ(TimesSeen(machine, "malloc", "-1 200", body), 1);
+    EXPECT_EQ(TimesSeen(machine, "malloc", "-1 200 1", body), 1);
+}
+
+TEST(WithoutMemory, ALineMatchesNoKey)
+{
+    const auto body = [] {
+        NLIBCErrSet(OLD_CODE, "before", 1);
+        return Told(NLIBCFileLineKeyMatch("key=value\n", "key"));
+    };
+    EXPECT_EQ(TimesSeen(MachineMake(), "strndup", "0 FFFFFF00", body), 1);
+    EXPECT_EQ(TimesSeen(MachineMake(), "strndup", "1 FFFFFF00", body), CALLS_MAX - 1);
+}
+
+// The list is full, so that the first disk makes it grow.
+TEST(WithoutMemory, DisksAreNotEnumerated)
+{
+    MACHINE machine = MachineMake();
+    MachineConf(machine, "usbportcfg=0x10\ninternalportcfg=0xf\n");
+    MachineDiskAdd(machine, "sda");
+    const auto body = [] {
+        LIST_SCOPE list(1, 'a', SZLIST_UNSORTED);
+        if (list.p == nullptr || list.p->nItem != 1) {
+            return std::string("no list");
+        }
+        char szFiller[174 + 1] = "";
+        memset(szFiller, 'b', sizeof(szFiller) - 1);
+        (void)NLIBCSzListPush(&list.p, szFiller);
+        return ToldWithItems(ExternalDiskPortEnum(INTERNAL_DEVICE, &list.p), list.p);
+    };
+    EXPECT_EQ(TimesSeen(machine, "malloc", "-1 200 2", body), 1);
 }
 
 // The list of paths is full of others, so that the first line makes it grow.
@@ -179,6 +224,32 @@ TEST(WithoutMemory, NoToolIsPiped)
         NLIBCErrSet(OLD_CODE, "before", 1);
         EXPECT_EQ(NLIBCPopen("/sbin/pvs", "r", NULL), nullptr);
         EXPECT_EQ(NLIBCErrGet(), ERR_OUT_OF_MEMORY);
+    });
+    EXPECT_EQ(LogText(result), "");
+    EXPECT_EQ(TranscriptText(result), "fault calloc 1\n");
+}
+
+// The pipe is there before the memory for its record, and stays.
+TEST(WithoutMemory, APipeWithoutARecordStaysOpen)
+{
+    MACHINE machine = MachineMake();
+    MachineTool(machine, "/sbin/pvs", {.nTimes = ANY_TIMES});
+    machine.faults = {{.szFunction = "calloc", .error = ENOMEM}};
+    const RUN_RESULT result = MachineCall(machine, [] {
+        char szTool[] = "/sbin/pvs";
+        char *argv[] = {szTool, nullptr};
+        const int fdFirst = dup(STDERR_FILENO);
+        const int fdSecond = dup(STDERR_FILENO);
+        const int fdThird = dup(STDERR_FILENO);
+        (void)close(fdFirst);
+        (void)close(fdSecond);
+        (void)close(fdThird);
+        NLIBCErrSet(OLD_CODE, "before", 1);
+        EXPECT_EQ(NLIBCPopenV(szTool, "r", argv), nullptr);
+        EXPECT_EQ(NLIBCErrGet(), ERR_OUT_OF_MEMORY);
+        EXPECT_EQ(fcntl(fdFirst, F_GETFD), FD_CLOEXEC);
+        EXPECT_EQ(fcntl(fdSecond, F_GETFD), FD_CLOEXEC);
+        EXPECT_EQ(fcntl(fdThird, F_GETFD), -1);
     });
     EXPECT_EQ(LogText(result), "");
     EXPECT_EQ(TranscriptText(result), "fault calloc 1\n");

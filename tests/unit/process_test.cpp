@@ -19,6 +19,8 @@ constexpr char SHELL[] = "/bin/sh";
 constexpr char DEV_NULL[] = "/dev/null";
 constexpr char MISSING_PROGRAM[] = "/nonexistent/program";
 
+static_assert(FORK_RUN_AND_WAIT == 0xBB);
+
 // --- what a child of NLIBCFork leaves behind
 
 std::string EnvironmentText()

@@ -133,11 +133,20 @@ TEST(SzListDump2Str, StopsBeforeTheUnitThatDoesNotFit)
     }
 }
 
-TEST(SzListDump2Str, ClearsTheTextOfAnEmptyList)
+TEST(SzListDump2Str, ClearsTheWholeText)
 {
-    char szOut[8] = "XXXXXXX";
-    EXPECT_QUIET(NLIBCSzListDump2Str(TEST_LIST().p, ",", szOut, 8), 0);
-    EXPECT_STREQ(szOut, "");
+    char achOut[8] = {'X', 'X', 'X', 'X', 'X', 'X', 'X', 'X'};
+    EXPECT_QUIET(NLIBCSzListDump2Str(TEST_LIST().p, ",", achOut, 7), 0);
+    EXPECT_EQ(std::string(achOut, 8), std::string(7, '\0') + "X");
+
+    memset(achOut, 'X', 8);
+    EXPECT_QUIET(NLIBCSzListDump2Str(TEST_LIST({"ab"}, SZLIST_UNSORTED).p, ",", achOut, 7), 2);
+    EXPECT_EQ(std::string(achOut, 8), "ab" + std::string(5, '\0') + "X");
+
+    memset(achOut, 'X', 8);
+    const TEST_LIST list({"ab", "cdefg"}, SZLIST_UNSORTED);
+    EXPECT_FAILS(NLIBCSzListDump2Str(list.p, ",", achOut, 7), -1, ERR_OUT_OF_SPACE);
+    EXPECT_EQ(std::string(achOut, 8), "ab" + std::string(5, '\0') + "X");
 }
 
 TEST(SzListDump2Str, RefusesBadArguments)

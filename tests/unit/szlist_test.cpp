@@ -297,6 +297,20 @@ TEST(SzListFind, SearchesASortedListByHalves)
     EXPECT_QUIET(NLIBCSzListCaseFind(TEST_LIST({}, SZLIST_CASE_SORTED).p, "a"), -1);
 }
 
+// Halving would look for "a" before "b" and for "c" behind it.
+TEST(SzListFind, AModeThatIsNoOrderIsSearchedFromTheStart)
+{
+    constexpr int NO_ORDER = 2;
+    const TEST_LIST list({"c", "b", "a"}, NO_ORDER);
+    ASSERT_EQ(list.p->fMode, NO_ORDER);
+    for (const char *szItem : {"a", "b", "c"}) {
+        EXPECT_QUIET(NLIBCSzListFind(list.p, szItem), 'c' - szItem[0]);
+        EXPECT_QUIET(NLIBCSzListCaseFind(list.p, szItem), 'c' - szItem[0]);
+    }
+    EXPECT_QUIET(NLIBCSzListFind(list.p, "d"), -1);
+    EXPECT_QUIET(NLIBCSzListCaseFind(list.p, "d"), -1);
+}
+
 // The middle of 0..3 is 1, the middle of 0..2 is 1, the middle of 0..4 is 2.
 TEST(SzListFind, AmongDuplicatesAnswersWhatTheHalvingHits)
 {
