@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: MIT
 #include "storage_machine.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <csignal>
 #include <gtest/gtest.h>
@@ -130,6 +131,21 @@ TEST(FormatAll, PrintsEveryDiskWhereTheMarkerStands)
     MachineDiskAdd(machine, "sdd");
     ExpectNumbers(machine, "1 2 3 4 ", 4);
     EXPECT_EQ(TranscriptText(MachineRun(machine, {WORD})), "");
+}
+
+// None at all, and fewer, are sizes like any: the disk is not blank.
+TEST(FormatAll, TakesAListedPartitionForOneWhateverItsSize)
+{
+    MACHINE machine = MachineOfEight(CONF_RAID);
+    DecidedDiskAdd(machine, "sda", PLACES_8);
+    MachineDiskAdd(machine, "sdb");
+    MachineTool(machine, ListingCommand("sdb", 1), {.szOut = "/dev/sdb1 1 2 -2 83\n"});
+    MachineTool(machine, ListingCommand("sdb", 2), {.szOut = "/dev/sdb2 1 2 -7 83\n"});
+    MachineDiskAdd(machine, "sdc");
+    MachineTool(machine, ListingCommand("sdc", 1), {.szOut = "/dev/sdc1 1 2 0 83\n"});
+    MachineTool(machine, ListingCommand("sdc", 2));
+    BlankDiskAdd(machine, "sdd");
+    ExpectNumbers(machine, "4 ", 1);
 }
 
 // ---- the wanted layout -------------------------------------------------------------------------
@@ -370,6 +386,30 @@ TEST(FormatAllFails, ToNumberADiskWhosePortIsUnknown)
                       szDisk + "\n<11>arrayctl.cpp:# DiskPathParse(/dev/" + szDisk + ") fail\n";
     }
     EXPECT_EQ(LogErrors(result), szExpected);
+}
+
+// The second disk's port alone is unknown: of the last four look-ups, which are its ports', the
+// first one fails. It has no number, not the first disk's.
+TEST(FormatAllFails, ToNumberADiskBehindANumberedOne)
+{
+    MACHINE machine = MachineWithConf("supportraid=yes\nsupport_buildin_storage=no\nusbportcfg=0\n"
+                                      "internalportcfg=0xf\n");
+    MachineFile(machine, FORCE_MARKER, "");
+    MachineDiskAdd(machine, "sda");
+    MachineDiskAdd(machine, "sdb");
+    machine.fCallsTold = true;
+    ExpectPrinted(MachineRun(machine, {WORD}), "1 2 ", 2);
+    const std::vector<std::string> calls = MachineCalls();
+    const auto nOpened = std::count_if(calls.begin(), calls.end(), [](const std::string &szCall) {
+        return szCall.rfind("0 fopen ", 0) == 0;
+    });
+    machine.faults = {{.szFunction = "fopen",
+                       .nCall = static_cast<int>(nOpened) - 3,
+                       .error = EMFILE,
+                       .szProcess = "0"}};
+    const RUN_RESULT result = MachineRun(machine, {WORD});
+    ExpectPrinted(result, "1 0 ", 2);
+    EXPECT_EQ(LogOf(result, "arrayctl.cpp"), "<11>arrayctl.cpp:# DiskPathParse(/dev/sdb) fail\n");
 }
 
 // Whichever calls they are that ask for memory. The C library's own are among them, and its glob()

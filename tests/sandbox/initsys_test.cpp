@@ -270,6 +270,43 @@ TEST(InitsysSlots, AreCutWhereTheTextOfMissingEnds)
                                szMissing + "> /dev/null 2>&1\n");
 }
 
+// The number is looked up before the wanted layout: so the log has it.
+TEST(InitsysSlots, AreCountedBeforeTheLayoutIsChosen)
+{
+    MACHINE machine = MachineWithConf("usbportcfg=0x30\ninternalportcfg=0xf\nsupportraid=no\n");
+    MachineFile(machine, "/.force_clean_all_disk", "");
+    PartitionedDiskAdd(machine, "sda", PLACES_8);
+    RenewExpect(machine, "sda", RANGE_ALL, MADE_NO_RAID);
+    MachineTool(machine, "/sbin/mdadm --zero-superblock /dev/sda1");
+    MachineTool(machine, "/sbin/mdadm --zero-superblock /dev/sda2");
+    const RUN_RESULT result = MachineRun(machine, {"initsys"});
+    EXPECT_EQ(result.status, 1);
+    EXPECT_EQ(
+        LogErrors(result),
+        "<11>conf.cpp:# Failed to NLIBCFileGetKeyValue(/etc.defaults/nuroinfo.conf,maxdisks)\n"
+        "<11>partition_version.cpp:# Choose biggest partition layout version 8.\n" +
+            std::string(NO_DISK));
+}
+
+// Nor is there room for more than 511 characters of members: 46 paths of eleven, and five.
+TEST(InitsysSlots, AreTakenByAsManyMembersAsTheTextHasRoomFor)
+{
+    MACHINE machine = MachineWithConf(std::string(CONF_TWO_UNITS) + "max_sys_raid_disks=47\n");
+    MachineFile(machine, "/.force_clean_all_disk", "");
+    std::string szSystem;
+    std::string szSwap;
+    for (const std::string &szDisk : TwoUnitsAdd(machine, 47)) {
+        szSystem += "/dev/" + szDisk + "1 ";
+        szSwap += "/dev/" + szDisk + "2 ";
+    }
+    MachineTool(machine, "/sbin/sfdisk ...", {.nTimes = ANY_TIMES});
+    MachineTool(machine, "/sbin/mdadm -C ...", {.nTimes = 2});
+    machine.msBound = 60000;
+    const RUN_RESULT result = MachineRun(machine, {"initsys"});
+    EXPECT_EQ(result.status, 0);
+    EXPECT_EQ(LogErrors(result), Inited(szSystem.substr(0, 511), szSwap.substr(0, 511)));
+}
+
 // ---- what is decided for a disk ----------------------------------------------------------------
 
 TEST(InitsysDecides, ToKeepTheDataOfADiskOfTheWantedLayout)
@@ -646,6 +683,19 @@ TEST(InitsysFails, NotWithoutAShell)
               "<11>arrayctl.cpp:# szCmd=[/sbin/mdadm -C /dev/md1 -e 0.9 -amd -R -l1 -f -n4 "
               "/dev/sda2   missing missing missing> /dev/null 2>&1]\n" +
                   Inited("/dev/sda1 ", "/dev/sda2 "));
+}
+
+// Its exit status is that of the bits 8 to 15, and a signal stands below them.
+TEST(InitsysFails, NotWhenTheShellIsKilled)
+{
+    MACHINE machine = MachineWithConf(CONF_RAID);
+    BlankDiskWipe(machine, "sda");
+    ShellKill(machine);
+    const RUN_RESULT result = MachineRun(machine, {"initsys-dd"});
+    EXPECT_EQ(result.status, 0);
+    EXPECT_EQ(result.szOut, "");
+    EXPECT_EQ(CommandsBeside(result, ABCD), "sleep 3\nsleep 3\n");
+    EXPECT_EQ(LogErrors(result), Inited("/dev/sda1 ", "/dev/sda2 "));
 }
 
 TEST(InitsysFails, WithoutAPartitionerForEveryDisk)

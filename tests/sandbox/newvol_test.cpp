@@ -371,6 +371,17 @@ TEST(NewvolFails, WithoutAShell)
               "<11>arrayctl.cpp:# Failed to create RAID '/dev/md2' on '/dev/sda3 ', errno=255\n");
 }
 
+// Its exit status is that of the bits 8 to 15, and a signal stands below them.
+TEST(NewvolFails, NotWhenTheShellIsKilled)
+{
+    MACHINE machine = MachineWithDisks(CONF_RAID, FirstDisks(1));
+    ShellKill(machine);
+    const RUN_RESULT result = MachineRun(machine, {"newvol"});
+    EXPECT_EQ(result.status, 0);
+    EXPECT_EQ(TranscriptText(result), RenewText("sda"));
+    EXPECT_EQ(LogText(result), "");
+}
+
 // ---- dual-head machines ------------------------------------------------------------------------
 
 constexpr char LETTERS[] = "abcdefghijklmnopqrstuvwxyz";
@@ -417,6 +428,25 @@ std::string OverLimit(size_t nTaken)
 {
     return "<11>arrayctl.cpp:# Get " + std::to_string(nTaken) +
            " disks, more than raid group split unit\n";
+}
+
+// 46 paths of eleven characters and five of the next: 511.
+TEST(NewvolDualHead, NamesAsManyMembersAsTheTextHasRoomFor)
+{
+    MACHINE machine = MachineWithConf(std::string(CONF_TWO_UNITS) + "raidgroup_split_units=50\n");
+    const std::vector<std::string> disks = TwoUnitsAdd(machine, 50);
+    MachineTool(machine, "/sbin/sfdisk ...", {.nTimes = 150});
+    MachineTool(machine, "/sbin/mdadm -C /dev/md2 ...", {.status = 1});
+    ShellWatch(machine);
+    machine.msBound = 60000;
+    const RUN_RESULT result = MachineRun(machine, {"newvol"});
+    EXPECT_EQ(result.status, 1);
+    const std::string szMembers = MembersText(disks).substr(0, 511);
+    EXPECT_EQ(szMembers.substr(506), "/dev/");
+    EXPECT_EQ(ShellText(),
+              "/sbin/mdadm -C /dev/md2 -amd -R -l5  -n50 " + szMembers + "> /dev/null 2>&1\n");
+    EXPECT_EQ(LogText(result), "<11>arrayctl.cpp:# Failed to create RAID '/dev/md2' on '" +
+                                   szMembers + "', errno=1\n");
 }
 
 struct LIMIT_CASE {

@@ -42,6 +42,14 @@ inline constexpr char CONF_DUAL_HEAD[] = "maxdisks=\"4\"\n"
                                          "esataportcfg=\"0x40\"\n"
                                          "internalportcfg=\"0xf\"\n";
 
+// Two eSATA ports, sdf and sdg.
+inline constexpr char CONF_TWO_UNITS[] = "supportraid=\"yes\"\n"
+                                         "support_buildin_storage=\"no\"\n"
+                                         "support_dual_head=\"yes\"\n"
+                                         "usbportcfg=\"0x10\"\n"
+                                         "esataportcfg=\"0x60\"\n"
+                                         "internalportcfg=\"0xf\"\n";
+
 inline MACHINE MachineWithConf(const std::string &szConf)
 {
     MACHINE machine = MachineMake();
@@ -54,6 +62,27 @@ inline void ExpansionUnitAdd(MACHINE &machine, const std::string &szHost,
 {
     MachineFile(machine, "/sys/class/scsi_host/" + szHost + "/nuro_pm_info",
                 "nuro_device_list=\"" + szDevices + "\"\n");
+}
+
+// Disks behind the eSATA ports of sdf and sdg, as many as 52; each host tells of ten.
+inline std::vector<std::string> TwoUnitsAdd(MACHINE &machine, size_t nDisk)
+{
+    constexpr size_t LETTERS = 26;
+    constexpr size_t DISKS_OF_HOST = 10;
+    std::vector<std::string> disks;
+    std::vector<std::string> devices(nDisk / DISKS_OF_HOST + 1);
+    for (size_t i = 0; i < nDisk; i++) {
+        const char ach[] = {'s', 'd', i < LETTERS ? 'f' : 'g',
+                            static_cast<char>('a' + i % LETTERS)};
+        disks.emplace_back(ach, sizeof(ach));
+        MachineDiskAdd(machine, disks.back());
+        std::string &szDevices = devices[i / DISKS_OF_HOST];
+        szDevices += (szDevices.empty() ? "/dev/" : ",/dev/") + disks.back();
+    }
+    for (size_t i = 0; i < devices.size(); i++) {
+        ExpansionUnitAdd(machine, "host" + std::to_string(i), devices[i]);
+    }
+    return disks;
 }
 
 // ---- disks -------------------------------------------------------------------------------------
@@ -270,6 +299,13 @@ inline void ShellWatch(MACHINE &machine)
                             "printf '%s\\n' \"$szText\" >> ") +
                     SHELL_RECORD + "\nexec /usr/bin/dash -c \"$szText\"\n",
                 0755);
+}
+
+// From now on every shell ends by a signal before it runs anything.
+inline void ShellKill(MACHINE &machine)
+{
+    machine.tools["/bin/sh"] = TOOL_KIND::MISSING; // the stand-in of it, that is
+    MachineFile(machine, "/bin/sh", "#!/usr/bin/dash\nkill -9 $$\n", 0755);
 }
 
 inline std::string ShellText()

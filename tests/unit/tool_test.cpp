@@ -100,9 +100,25 @@ TEST(SystemRaidCreate, NeedsADeviceAndMembers)
     EXPECT_EQ(SystemRaidCreate("/dev/md0", 1, 4, nullptr), -1);
 }
 
+// What is logged as an error meanwhile, with its line number masked.
+std::string ErrorLogged(void (*pBody)())
+{
+    constexpr char DIGITS[] = "0123456789";
+    openlog("tool", LOG_PERROR, LOG_USER);
+    const int maskBefore = setlogmask(LOG_MASK(LOG_ERR));
+    testing::internal::CaptureStderr();
+    pBody();
+    std::string szLog = testing::internal::GetCapturedStderr();
+    (void)setlogmask(maskBefore);
+    openlog(nullptr, 0, LOG_USER);
+    const size_t iNumber = std::min(szLog.find_first_of(DIGITS), szLog.size());
+    return szLog.replace(iNumber, strspn(szLog.c_str() + iNumber, DIGITS), "#");
+}
+
 TEST(DiskFormatType, WithoutANameThereIsNothingToDo)
 {
-    EXPECT_EQ(DiskFormatTypeGet(nullptr, 8), 0);
+    EXPECT_EQ(ErrorLogged([] { EXPECT_EQ(DiskFormatTypeGet(nullptr, 8), 0); }),
+              "tool: arrayctl.cpp:# Null List Error\n");
 }
 
 // A disk that was left alone has no child; if it had one, the child would not touch it.
