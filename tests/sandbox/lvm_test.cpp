@@ -98,6 +98,17 @@ TEST(LVMGetLVPath, ARowThatIsTooLongComesInPieces)
     });
 }
 
+// As many as 1023 characters, the last separator among them.
+TEST(LVMGetLVPath, ARowMayFillTheWholeLine)
+{
+    const std::string szRow = "/dev/md2:vg1:lv1:";
+    MachineCall(MachineWithRows(std::string(1023 - szRow.size(), ' ') + szRow + "origin\n"), [] {
+        char szPath[256] = "";
+        EXPECT_EQ(LVMGetLVPath("/dev/md2", szPath, sizeof(szPath)), 0);
+        EXPECT_STREQ(szPath, "/dev/vg1/lv1");
+    });
+}
+
 TEST(LVMGetLVPath, IsCutToTheBuffer)
 {
     MachineCall(MachineWithRows("  /dev/md2:vg1:lv1:\n"), [] {
@@ -165,9 +176,13 @@ TEST(LVMGetLVPath, ACommandThatCannotBeStartedIsTold)
     machine.faults = {{.szFunction = "pipe2", .error = EMFILE, .fGoOn = true}};
     const RUN_RESULT result = MachineCall(machine, [] {
         char szPath[256] = "before";
+        RecordReset();
         EXPECT_EQ(LVMGetLVPath("/dev/md2", szPath, sizeof(szPath)), -1);
         EXPECT_STREQ(szPath, "before");
+        EXPECT_EQ(NLIBCErrGet(), ERR_PIPE_FAILED);
+        RecordReset();
         EXPECT_EQ(LVMRmLVPath("/dev/md2"), 0); // as if there was none
+        EXPECT_EQ(NLIBCErrGet(), ERR_PIPE_FAILED);
     });
     const std::string szTold = "<11>lvm.cpp:# Fail to do [/sbin/pvs -o "
                                "pv_name,vg_name,lv_name,origin --noheading --separator :]\n";
@@ -409,6 +424,46 @@ TEST(LVMRmLVPath, EscapesOfTheTableAreRead)
     EXPECT_EQ(LogText(result), "");
 }
 
+// Of a longer path the first 255 characters are the volume, and the "s" comes behind them.
+TEST(LVMRmLVPath, AVolumePathIsCutTo255Characters)
+{
+    const std::string szVolume = "/dev/vg1/" + std::string(246, 'v');
+    ASSERT_EQ(szVolume.size(), 255U);
+    for (const char *const szBehind : {"", "w"}) {
+        SCOPED_TRACE(szBehind);
+        MACHINE machine =
+            MachineWithRows("  /dev/md2:vg1:" + std::string(246, 'v') + szBehind + ":\n");
+        MachineFile(machine, "/proc/mounts",
+                    szVolume + "1 /volume1 ext4 rw 0 0\n" + szVolume + "s1 /volume2 ext4 rw 0 0\n");
+        MachineFolder(machine, "/volume2");
+        const std::vector<std::string> commands = {
+            "/bin/umount -R -A -k /volume2", "/sbin/lvremove -f " + szVolume + "s1",
+            "/sbin/lvremove -f " + szVolume, "/sbin/vgremove -f /dev/vg1",
+            "/sbin/pvremove -f /dev/md2"};
+        for (const std::string &szCommand : commands) {
+            MachineTool(machine, szCommand);
+        }
+        EXPECT_EQ(LogText(Remove(machine)), "");
+    }
+}
+
+// Of a longer entry the first 4095 characters are read: a type that ends behind them is another.
+TEST(LVMRmLVPath, AMountEntryIsCutTo4095Characters)
+{
+    const std::string szStart = "/dev/vg1/lv1s1 /volume1";
+    const std::string szBlanks(4095 - szStart.size() - 4, ' ');
+    const RUN_RESULT whole = Remove(MachineWithMounts(szStart + szBlanks +
+                                                      "aufs rw 0 0\n"
+                                                      "tmpfs /tmp tmpfs rw 0 0\n"));
+    EXPECT_EQ(TranscriptText(whole), Transcript({}));
+
+    MACHINE machine = MachineWithMounts(szStart + szBlanks + " aufs rw 0 0\n");
+    MachineFolder(machine, "/volume1");
+    MachineTool(machine, "/bin/umount -R -A -k /volume1");
+    MachineTool(machine, "/sbin/lvremove -f /dev/vg1/lv1s1");
+    EXPECT_EQ(LogText(Remove(machine)), "");
+}
+
 // A mounted volume /volume1 whose folder can go, with this answer of umount and of the removal.
 MACHINE MachineWithMount(const TOOL_ANSWER &unmount, const TOOL_ANSWER &removal)
 {
@@ -469,6 +524,18 @@ TEST(LVMRmLVPath, AFolderThatStaysIsTold)
     EXPECT_EQ(LogText(result), "<11>lvm.cpp:# Failed to rmdir(/volume1)\n");
     EXPECT_EQ(TranscriptText(result), Transcript(MOUNT_STEPS));
     EXPECT_EQ(MachineFileRead("/volume1/file"), "");
+}
+
+// The mount has a second to go before its folder is taken away.
+TEST(LVMRmLVPath, TheFolderIsRemovedBehindThePause)
+{
+    MACHINE machine = MachineWithMount({}, {});
+    machine.faults = {{.szFunction = "rmdir", .error = EBUSY}};
+    const RUN_RESULT result = Remove(machine);
+    EXPECT_EQ(LogText(result), "<11>lvm.cpp:# Failed to rmdir(/volume1)\n");
+    EXPECT_EQ(TranscriptText(result),
+              Transcript({"/bin/umount -R -A -k /volume1", "sleep 1", "fault rmdir 1",
+                          "/sbin/lvremove -f /dev/vg1/lv1s1"}));
 }
 
 TEST(LVMRmLVPath, AFolderThatIsGoneIsTold)

@@ -609,6 +609,37 @@ TEST(RAIDRemove, TakesTheUuidOfTheRecord)
     EXPECT_EQ(LogText(result), CLEAN_TOLD + WipedTold("sdb3"));
 }
 
+// As many characters as a report's UUID can have, and all of them count.
+TEST(RAIDRemove, TakesTheWholeUuidOfTheRecord)
+{
+    const std::string szUuid = std::string(62, 'a') + "b";
+    MACHINE machine = MachineWithMirror();
+    MachineTool(machine, STOP_MD2);
+    ExamineExpect(machine, "sda3", std::string(62, 'a') + "c");
+    ExamineExpect(machine, "sdb3", szUuid);
+    MachineTool(machine, WipeCommand("sdb3"));
+    const RUN_RESULT result = MachineCall(machine, [&szUuid] {
+        const RAID_INFO info = RecordOf("/dev/md2", szUuid);
+        EXPECT_EQ(RAIDRemove(&info, nullptr), 0);
+    });
+    EXPECT_EQ(LogText(result), CLEAN_TOLD + WipedTold("sdb3"));
+}
+
+TEST(RAIDRemove, TakesTheWholeUuidOfTheMember)
+{
+    const std::string szUuid = std::string(62, 'a') + "b";
+    MACHINE machine = MachineWithMirror();
+    ExamineExpect(machine, "sda3", std::string(62, 'a') + "c");
+    ExamineExpect(machine, "sdb3", szUuid, 2);
+    MachineTool(machine, STOP_MD2);
+    MachineTool(machine, WipeCommand("sdb3"));
+    const RUN_RESULT result = MachineCall(machine, [] {
+        const RAID_INFO info = RecordOf("/dev/md2");
+        EXPECT_EQ(RAIDRemove(&info, nullptr), 0);
+    });
+    EXPECT_EQ(LogText(result), CLEAN_TOLD + WipedTold("sdb3"));
+}
+
 TEST(RAIDRemove, TakesTheCallersMapAndLeavesItToHim)
 {
     MACHINE machine = MachineWithMirror();
