@@ -250,8 +250,7 @@ TEST(PartitionCreateVersion, ThatCannotBeFoundEndsIt)
     MACHINE machine = MachineWithConf(CONF_RAID);
     MachineDiskAdd(machine, "sda");
     machine.faults = {{.szFunction = "glob", .nCall = 1, .error = EIO}};
-    const RUN_RESULT result =
-        MachineCall(machine, [] { EXPECT_EQ(PartitionCreate("/dev/sda", 2, nullptr), -1); });
+    const RUN_RESULT result = Create(machine, "/dev/sda", 2, std::nullopt, -1);
     EXPECT_EQ(LogErrors(result), "<11>partition_edit.cpp:# Failed to get partition version\n");
     EXPECT_EQ(TranscriptText(result), "fault glob 1\n");
 }
@@ -353,8 +352,11 @@ TEST(PartitionClean, GoesOnWhateverFails)
 
 TEST(PartitionClean, RefusesNull)
 {
-    const RUN_RESULT result =
-        MachineCall(MachineMake(), [] { EXPECT_EQ(PartitionClean(nullptr, 3), -1); });
+    const RUN_RESULT result = MachineCall(MachineMake(), [] {
+        NLIBCErrSet(OLD_CODE, "before", 1);
+        EXPECT_EQ(PartitionClean(nullptr, 3), -1);
+        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
+    });
     EXPECT_EQ(LogText(result), "<11>partition_edit.cpp:# Bad parameters\n");
     EXPECT_EQ(TranscriptText(result), "");
 }
@@ -373,8 +375,11 @@ TEST(PartitionTable, GetsAnMsDosSignature)
     EXPECT_EQ(LogText(failed), "<11>partition_edit.cpp:# Failed to add ms-dos signature to "
                                "/dev/sdc, err=256\n");
 
-    const RUN_RESULT null =
-        MachineCall(MachineMake(), [] { EXPECT_EQ(PartitionTableAdd(nullptr), -1); });
+    const RUN_RESULT null = MachineCall(MachineMake(), [] {
+        NLIBCErrSet(OLD_CODE, "before", 1);
+        EXPECT_EQ(PartitionTableAdd(nullptr), -1);
+        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
+    });
     EXPECT_EQ(LogText(null), "<11>partition_edit.cpp:# Bad parameters\n");
 }
 
@@ -417,10 +422,12 @@ TEST(PartitionZero, FailsSilentlyWithTheCommand)
 TEST(PartitionZero, RefusesNullAndNumbersThatAreNotPositive)
 {
     const RUN_RESULT result = MachineCall(MachineMake(), [] {
+        NLIBCErrSet(OLD_CODE, "before", 1);
         EXPECT_EQ(PartitionZeroSuperblock(nullptr, 1), -1);
         EXPECT_EQ(PartitionZeroSuperblock("/dev/sda", 0), -1);
         EXPECT_EQ(PartitionZeroSuperblock("/dev/sda", -1), -1);
         EXPECT_EQ(PartitionZeroSuperblock("/dev/nuroboot", 1), -1);
+        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
     });
     EXPECT_EQ(LogErrors(result),
               "<11>partition_edit.cpp:# Bad parameters\n"
@@ -505,11 +512,29 @@ TEST(PartitionGeometry, AsksForTheDiskByItsPath)
         EXPECT_EQ(PartitionGeometryGet(-1, "/dev/sdb", &start, &type), -1);
         EXPECT_EQ(PartitionGeometryGet(INT_MIN, "/dev/sdb", &start, &type), -1);
         EXPECT_EQ(PartitionGeometryGet(5, nullptr, &start, &type), -1);
+        EXPECT_EQ(PartitionGeometryGet(5, "/dev/sdb", nullptr, &type), -1);
+        EXPECT_EQ(PartitionGeometryGet(5, "/dev/sdb", &start, nullptr), -1);
     });
     EXPECT_EQ(LogText(result), "");
     ASSERT_EQ(result.events.size(), 2U);
     EXPECT_TRUE(result.events[0].fNullInput);
     EXPECT_TRUE(result.events[0].fNullError);
+}
+
+// "/dev/" and 58 characters of a name.
+TEST(PartitionGeometry, CutsThePathToSixtyThreeCharacters)
+{
+    const std::string szDisk(58, 'x');
+    MACHINE machine = MachineMake();
+    MachineTool(machine, "/sbin/sfdisk -l -uS -N1 /dev/" + szDisk,
+                {.szOut = "/dev/x1 1 2 3 4\n", .nTimes = 3});
+    MachineCall(machine, [&szDisk] {
+        for (const std::string &szName : {szDisk, szDisk + "y", "/dev/" + szDisk + "yz"}) {
+            u64 start = 0;
+            u32 type = 0;
+            EXPECT_EQ(PartitionGeometryGet(1, szName.c_str(), &start, &type), 3) << szName;
+        }
+    });
 }
 
 TEST(PartitionGeometry, TakesAPartitionerThatCannotBeRunForNone)
@@ -537,6 +562,28 @@ TEST(PartitionGeometry, TakesAPartitionerThatCannotBeRunForNone)
             u32 type = UNTOUCHED;
             EXPECT_EQ(PartitionGeometryGet(1, "/dev/sda", &start, &type), -1);
             EXPECT_EQ(start, UNTOUCHED);
+        });
+    }
+}
+
+// Of a longer line the first 256 bytes are read, here the type or half of it.
+TEST(PartitionGeometry, ReadsNoFurtherThan256Bytes)
+{
+    const std::string szFields = "/dev/sda1 1 2 3";
+    const std::string szBlanks(256 - szFields.size() - 2, ' ');
+    struct {
+        std::string szLine;
+        u32 type;
+    } const cases[] = {{szFields + szBlanks + "83 Linux\n", 0x83},
+                       {szFields + szBlanks + " 83 Linux\n", 0x8}};
+    for (const auto &row : cases) {
+        MACHINE machine = MachineMake();
+        MachineTool(machine, "/sbin/sfdisk -l -uS -N1 /dev/sda", {.szOut = row.szLine});
+        MachineCall(machine, [&row] {
+            u64 start = 0;
+            u32 type = 0;
+            EXPECT_EQ(PartitionGeometryGet(1, "/dev/sda", &start, &type), 3);
+            EXPECT_EQ(type, row.type);
         });
     }
 }

@@ -188,9 +188,13 @@ TEST(PartitionPathEnum, WithoutAListFails)
     const RUN_RESULT result = MachineCall(MachineWithNames({"sda"}), [] {
         RecordReset();
         EXPECT_EQ(PartitionPathEnum(nullptr, nullptr), -1);
+        PNLIBSZLIST pNone = nullptr;
+        EXPECT_EQ(PartitionPathEnum(nullptr, &pNone), -1);
+        EXPECT_EQ(pNone, nullptr);
         EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
     });
-    EXPECT_EQ(LogText(result), "<11>partition_enum.cpp:# bad parameters\n");
+    EXPECT_EQ(LogText(result), "<11>partition_enum.cpp:# bad parameters\n"
+                               "<11>partition_enum.cpp:# bad parameters\n");
 }
 
 TEST(PartitionPathEnum, WithoutTheKernelsListFails)
@@ -223,8 +227,16 @@ TEST(PartitionPathEnum, AnEmptyListFails)
 {
     MACHINE machine = MachineMake();
     MachineFile(machine, "/proc/partitions", "");
-    EnumGives(machine,
-              {nullptr, -1, "", "<11>partition_enum.cpp:# There's no line in /proc/partitions\n"});
+    const RUN_RESULT result = MachineCall(machine, [] {
+        PNLIBSZLIST pList = NLIBCSzListAlloc(512);
+        RecordReset();
+        EXPECT_EQ(PartitionPathEnum(nullptr, &pList), -1);
+        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
+        EXPECT_EQ(pList->nItem, 0);
+        EXPECT_EQ(pList->fMode, 1);
+        NLIBCSzListFree(pList);
+    });
+    EXPECT_EQ(LogText(result), "<11>partition_enum.cpp:# There's no line in /proc/partitions\n");
 }
 
 // Both work lists, and the result in its old order.

@@ -323,6 +323,15 @@ TEST(PartitionStartSize, ReadsSixtyFourBitsOfTheFirstLine)
     MachineCall(machine, [] { ExpectPlace("sda", 1, 18446744073709551615ULL, 4294967296ULL); });
 }
 
+// Of a longer line the first 128 bytes are read.
+TEST(PartitionStartSize, ReadsNoFurtherThan128Bytes)
+{
+    MACHINE machine = MachineMake();
+    MachineFile(machine, "/sys/block/sda/sda1/start", std::string(126, '0') + "12\n");
+    MachineFile(machine, "/sys/block/sda/sda1/size", std::string(127, '0') + "12\n");
+    MachineCall(machine, [] { ExpectPlace("sda", 1, 12, 1); });
+}
+
 TEST(PartitionStartSize, TellsAnAbsentPartitionFromAFailure)
 {
     MACHINE machine = MachineMake();
@@ -469,6 +478,26 @@ TEST(PartitionCheck, LooksAtNoFurtherPartition)
     MachinePartitionAdd(machine, "sda", 3, 1, 1);
     MachinePartitionAdd(machine, "sda", 4, 2, 2);
     MachineCall(machine, [] { ExpectLayout(1, 7); });
+}
+
+// Before the partitions: the lookup's code stands, unless a partition's comes behind it.
+TEST(PartitionCheck, AsksForTheBuiltInStorageFirst)
+{
+    MACHINE machine = MachineWithConf("supportraid=yes\n");
+    MachineDiskAdd(machine, "sda");
+    MachineDiskAdd(machine, "sdb");
+    MachineFile(machine, "/sys/block/sdb/sdb1/size", "1\n");
+    MachineCall(machine, [] {
+        NLIBCErrSet(OLD_CODE, "before", 1);
+        EXPECT_EQ(PartitionCheckLayout("sda", 1, nullptr), 0);
+        EXPECT_EQ(NLIBCErrGet(), ERR_KEY_NOT_FOUND);
+        NLIBCErrSet(OLD_CODE, "before", 1);
+        EXPECT_EQ(PartitionCheckLayout("sdb", 1, nullptr), 0);
+        EXPECT_EQ(NLIBCErrGet(), ERR_OPEN_FAILED);
+        NLIBCErrSet(OLD_CODE, "before", 1);
+        EXPECT_EQ(PartitionCheckLayout(nullptr, 1, nullptr), 0);
+        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
+    });
 }
 
 TEST(PartitionCheck, TellsWhichPartitionIsNotThere)

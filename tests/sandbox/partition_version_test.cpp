@@ -2,11 +2,14 @@
 #include "nurostoragecore/partition_version.h"
 
 #include "nurocore/error.h"
+#include "nurostoragecore/partition_layout.h"
 #include "storage_machine.h"
 
 #include <cerrno>
+#include <filesystem>
 #include <gtest/gtest.h>
 #include <string>
+#include <vector>
 
 namespace
 {
@@ -80,6 +83,45 @@ TEST(PartitionVersion, OfTheSystemArrayIsThatOfTheFirstKnownMember)
     MachineDiskAdd(machine, "sdc");
     SystemArrayAdd(machine, {{"sda1"}, {"sdb1"}, {"sdc1"}});
     ExpectVersion(machine, 1, 6);
+}
+
+// The first member of a folder as it is read.
+std::string FirstMember(const char *szFolder)
+{
+    for (const auto &entry : std::filesystem::directory_iterator(szFolder)) {
+        const std::string szName = entry.path().filename();
+        if (szName.rfind("dev-", 0) == 0) {
+            return szName;
+        }
+    }
+    return "";
+}
+
+// A folder has them in the order of making them or the other way round, so made in both orders the
+// later name is the first once.
+TEST(PartitionVersion, OfTheSystemArrayIsThatOfTheMemberThatTheFolderHasFirst)
+{
+    constexpr char FOLDER[] = "/sys/block/md0/md";
+    MACHINE machine = MachineWithConf(CONF_RAID);
+    PartitionedDiskAdd(machine, "sda", PLACES_6);
+    PartitionedDiskAdd(machine, "sdb", PLACES_7);
+    MachineFolder(machine, FOLDER);
+    const std::vector<std::string> orders[] = {{"dev-sda1", "dev-sdb1"}, {"dev-sdb1", "dev-sda1"}};
+    std::string szFirsts;
+    for (const std::vector<std::string> &order : orders) {
+        const RUN_RESULT result = MachineCall(machine, [&order, &FOLDER] {
+            for (const std::string &szName : order) {
+                std::filesystem::create_directory(FOLDER + ("/" + szName));
+            }
+            u32 version = 0;
+            EXPECT_EQ(PartitionLayoutGet(&version), 0);
+            const std::string szFirst = FirstMember(FOLDER);
+            EXPECT_EQ(version, szFirst == "dev-sda1" ? 6U : 7U);
+            printf("%s ", szFirst.c_str());
+        });
+        szFirsts += result.szOut;
+    }
+    EXPECT_NE(szFirsts.find("dev-sdb1"), std::string::npos) << szFirsts;
 }
 
 TEST(PartitionVersion, OfTheSystemArrayIsAlwaysThatOfARaidMachine)
@@ -196,8 +238,30 @@ TEST(PartitionVersion, KnowsABuiltInStorageAsSeven)
     ExpectFirst(machine, 7);
 }
 
-// ---- on a RAID machine the disk has to hold data
-// -------------------------------------------------
+// Before the disks are looked for: the code that stands in the end is that of a port's key.
+TEST(PartitionVersion, AsksForRaidBeforeTheDisks)
+{
+    // Such a value is no yes, and too long to be looked at.
+    MACHINE machine = MachineWithConf("supportraid=perhaps\nsupport_dual_head=no\n"
+                                      "support_buildin_storage=no\nusbportcfg=0x30\n"
+                                      "internalportcfg=0xf\n");
+    MachineDiskAdd(machine, "sda");
+    MachineCall(machine, [] {
+        u32 version = 0;
+        EXPECT_EQ(PartitionLayoutGet(&version), 0);
+        EXPECT_EQ(version, 8U);
+        EXPECT_EQ(NLIBCErrGet(), ERR_KEY_NOT_FOUND);
+        NLIBCErrSet(OLD_CODE, "before", 1);
+        EXPECT_EQ(IsSupportRaid(), 0);
+        EXPECT_EQ(NLIBCErrGet(), OLD_CODE); // it was asked above
+    });
+    MachineCall(machine, [] {
+        EXPECT_EQ(IsSupportRaid(), 0);
+        EXPECT_EQ(NLIBCErrGet(), ERR_BUF_TOO_SMALL);
+    });
+}
+
+// ---- on a RAID machine the disk has to hold data -----------------------------------------------
 
 struct ARRAY_CASE {
     int nMd;

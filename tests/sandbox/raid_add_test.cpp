@@ -22,10 +22,13 @@ MACHINE MachineWithArray(int level)
     return machine;
 }
 
-RUN_RESULT Add(const MACHINE &machine, int resultExpected)
+RUN_RESULT Add(const MACHINE &machine, int resultExpected, u32 codeExpected = OLD_CODE)
 {
-    return MachineCall(
-        machine, [resultExpected] { EXPECT_EQ(RAIDAdd("/dev/md2", "/dev/sdc3"), resultExpected); });
+    return MachineCall(machine, [resultExpected, codeExpected] {
+        NLIBCErrSet(OLD_CODE, "before", 1);
+        EXPECT_EQ(RAIDAdd("/dev/md2", "/dev/sdc3"), resultExpected);
+        EXPECT_EQ(NLIBCErrGet(), codeExpected);
+    });
 }
 
 TEST(RaidAdd, AddsToArraysWithRedundancy)
@@ -65,6 +68,15 @@ TEST(RaidAdd, TellsTheCommandThatFails)
     EXPECT_EQ(LogText(Add(machineLinear, -1)),
               "<11>raid_add.cpp:# Failed to '/sbin/mdadm --grow /dev/md2 -a /dev/sdc3', "
               "ret = 512\n");
+}
+
+// The code is the runner's last one: without a stream there is nothing to keep of it.
+TEST(RaidAdd, TellsACommandThatCannotBeStarted)
+{
+    MACHINE machine = MachineWithArray(1);
+    machine.faults = {{.szFunction = "fork", .nCall = 1, .error = EAGAIN}};
+    EXPECT_EQ(LogText(Add(machine, -1, ERR_BAD_PARAMETER)),
+              "<11>raid_add.cpp:# Failed to '/sbin/mdadm /dev/md2 -a /dev/sdc3', ret = -1\n");
 }
 
 // A disk's path may be longer than the text that the log has room for; the command gets all of it.
@@ -109,7 +121,7 @@ TEST(RaidAdd, StopsWithoutAnArray)
 
     MACHINE machine = MachineWithArray(1);
     machine.arrays[0].errnoInfo = ENODEV;
-    const RUN_RESULT inactive = Add(machine, -1);
+    const RUN_RESULT inactive = Add(machine, -1, ERR_SYSCALL_FAILED);
     EXPECT_EQ(LogErrors(inactive), NO_ARRAY);
     EXPECT_EQ(TranscriptText(inactive), "");
 }
@@ -154,10 +166,12 @@ TEST(RaidParity, IsCountedByLevel)
 TEST(RaidParity, OfAnUnknownLevelIsRefused)
 {
     const RUN_RESULT result = MachineCall(MachineMake(), [] {
+        NLIBCErrSet(OLD_CODE, "before", 1);
         EXPECT_EQ(RAIDParityDiskCount(0, 4), -1);
         EXPECT_EQ(RAIDParityDiskCount(3, 4), -1);
         EXPECT_EQ(RAIDParityDiskCount(64, 4), -1);
         EXPECT_EQ(RAIDParityDiskCount(0xFFFFFFFF, 4), -1);
+        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
     });
     EXPECT_EQ(LogText(result), "<15>raid_add.cpp:# bad parameters: unknown raid level='0'\n"
                                "<15>raid_add.cpp:# bad parameters: unknown raid level='3'\n"

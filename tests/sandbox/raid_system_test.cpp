@@ -93,15 +93,30 @@ TEST(SystemDiskDetail, RefusesNull)
     EXPECT_EQ(LogText(result), "");
 }
 
-// A name that is too long for a disk cannot be searched.
+// The longest path that is searched, and the first that is too long.
+TEST(SystemDiskDetail, SearchesPathsOfUpTo127Characters)
+{
+    MachineCall(MachineWithConf(CONF_RAID), [] {
+        const std::string szDisk(127, 'x');
+        ExpectDetail({}, {}, szDisk.c_str(), 0, NONE, NONE);
+        RAID_INFO *pair[2] = {InfoMake({}), InfoMake({})};
+        u32 state = UNTOUCHED;
+        EXPECT_EQ(RAIDSystemDiskStatusDetailGet(pair, (szDisk + "x").c_str(), &state, &state), -1);
+        RAIDInfoPairFree(pair);
+    });
+}
+
+// A name that is too long for a disk cannot be searched. The code is that of the search.
 TEST(SystemDiskDetail, FailsWhenTheDiskCannotBeSearched)
 {
     const RUN_RESULT result = MachineCall(MachineWithConf(CONF_RAID), [] {
         RAID_INFO *pair[2] = {InfoMake({{"/dev/sda1", NORMAL}}), InfoMake({})};
         const std::string szDisk = "/dev/" + std::string(128, 'x');
         u32 status = UNTOUCHED;
+        NLIBCErrSet(OLD_CODE, "before", 1);
         EXPECT_EQ(RAIDSystemDiskStatusGet(pair, szDisk.c_str(), &status), -1);
         EXPECT_EQ(status, UNTOUCHED);
+        EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
         RAIDInfoPairFree(pair);
     });
     EXPECT_EQ(LogErrors(result),
@@ -192,6 +207,25 @@ TEST(SystemDiskStatus, TakesAModelWithoutFileForOneWithSwap)
             << line.szText;
     }
     EXPECT_EQ(result.log.size(), 2U); // it is asked each time
+}
+
+// Of a disk in one of the arrays, though its root state decides alone; not of any other disk.
+TEST(SystemDiskStatus, AsksForTheSwapOfEveryMember)
+{
+    for (const u32 root : {NONE, FAILED, CRASHING, NORMAL}) {
+        const RUN_RESULT result = MachineCall(MachineWithConf("maxdisks=4\n"), [root] {
+            RAID_INFO *pair[2] = {InfoMake(Members("/dev/sda1", root)),
+                                  InfoMake({{"/dev/sda2", NORMAL}})};
+            NLIBCErrSet(OLD_CODE, "before", 1);
+            EXPECT_EQ(RAIDSystemDiskStatusGet(pair, "/dev/sda", nullptr), 1);
+            EXPECT_EQ(NLIBCErrGet(), ERR_KEY_NOT_FOUND) << root;
+            NLIBCErrSet(OLD_CODE, "before", 1);
+            EXPECT_EQ(RAIDSystemDiskStatusGet(pair, "/dev/sdb", nullptr), 0);
+            EXPECT_EQ(NLIBCErrGet(), OLD_CODE) << root;
+            RAIDInfoPairFree(pair);
+        });
+        EXPECT_EQ(LogText(result), "");
+    }
 }
 
 TEST(SystemPair, IsFreedAndForgotten)
