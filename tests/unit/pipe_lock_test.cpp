@@ -26,15 +26,21 @@
 namespace
 {
 
+constexpr int ATTEMPTS_MAX = 1000000;
+
 int g_nAttempt = 0;
 
+int Yield();
+void StreamsUnlock();
+
+// A wait that never yields comes to its end, too.
 u32 Attempt(u32 value)
 {
-    g_nAttempt++;
+    if (++g_nAttempt == ATTEMPTS_MAX) {
+        StreamsUnlock();
+    }
     return value;
 }
-
-int Yield();
 
 } // namespace
 
