@@ -41,6 +41,12 @@ powerpc_base_key() {
     } | sha256sum | cut -c1-16
 }
 
+powerpc_script() { # TEXT PATH
+    rm -f "$2"
+    printf '#!/bin/sh\n%s\n' "$1" >"$2"
+    chmod +x "$2"
+}
+
 powerpc_programs() {
     local szWork=$1 szRoot=$2 szPair szApplet
     for szPair in "${GUEST_PROGRAMS[@]}"; do
@@ -52,10 +58,9 @@ powerpc_programs() {
         szApplet=$szRoot/usr/${szApplet#usr/}
         [ -e "$szApplet" ] || ln -s /usr/bin/busybox "$szApplet"
     done < <(qemu-ppc-static "$szRoot/usr/bin/busybox" --list-full | grep -v '^linuxrc$')
-    # Everything is built into this kernel.
-    rm "$szRoot/usr/sbin/modprobe"
-    printf '#!/bin/sh\n' >"$szRoot/usr/sbin/modprobe"
-    chmod +x "$szRoot/usr/sbin/modprobe"
+    # Everything is built into this kernel. Where the cases make a file system, any will do.
+    powerpc_script '' "$szRoot/usr/sbin/modprobe"
+    powerpc_script 'exec mkfs.ext2 "$@"' "$szRoot/usr/sbin/mkfs.ext4"
 }
 
 powerpc_base_build() {
@@ -70,6 +75,7 @@ powerpc_base_build() {
     kernel_build "$szWork" "$szWork/out"
     base_root "$szWork/root"
     powerpc_programs "$szWork" "$szWork/root"
+    libfdisk_keep "$szWork" "$szWork/out"
     pack "$szWork/root" "$szWork/out/base.cpio"
     mv "$szWork/out" "$szBase"
     rm -rf "$szWork"

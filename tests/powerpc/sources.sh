@@ -19,6 +19,7 @@ DEBIAN_SUITE=bookworm
 declare -A SOURCE_BUILDS=(
     [busybox]=busybox_build
     [mdadm]=mdadm_build
+    [strace]=strace_build
     [util-linux]=util_linux_build
 )
 
@@ -26,6 +27,7 @@ declare -A SOURCE_BUILDS=(
 GUEST_PROGRAMS=(
     busybox/busybox:/usr/bin/busybox
     mdadm/mdadm:/usr/sbin/mdadm
+    strace/src/strace:/usr/bin/strace
     util-linux/sfdisk:/usr/sbin/sfdisk.stock
     util-linux/blkid:/usr/sbin/blkid
     util-linux/wipefs:/usr/sbin/wipefs
@@ -94,6 +96,14 @@ mdadm_build() {
         CWFLAGS= CHECK_RUN_DIR=0 mdadm
 }
 
+strace_build() {
+    cd "$1" || return
+    ./configure "--host=$CROSS" --prefix=/usr --enable-mpers=no --disable-gcc-Werror \
+        --without-libdw --without-libunwind --without-libselinux CFLAGS=-O1 &&
+        make -j "$SOURCE_JOBS" -C src
+}
+
+# Its generated files are newer than what they are made of, whatever the packages' patches say.
 util_linux_build() {
     cd "$1" || return
     ./configure "--host=$CROSS" --prefix=/usr --disable-nls --disable-shared --enable-static \
@@ -103,4 +113,22 @@ util_linux_build() {
         --without-udev --without-readline --without-econf --disable-bash-completion \
         --disable-asciidoc CFLAGS=-O2 &&
         make -j "$SOURCE_JOBS" ACLOCAL=: AUTOMAKE=: AUTOCONF=: AUTOHEADER=: sfdisk blkid wipefs
+}
+
+# What the appliance's partitioner is linked with.
+libfdisk_keep() { # WORK OUT
+    local szLibrary
+    install -D -m 644 "$1/util-linux/libfdisk/src/libfdisk.h" "$2/libfdisk/libfdisk.h"
+    for szLibrary in fdisk blkid uuid; do
+        install -m 644 "$1/util-linux/.libs/lib$szLibrary.a" "$2/libfdisk/"
+    done
+}
+
+# partitioner_build LIBFDISK SOURCE OUT: the compiler's own libraries go in, as there is but the C
+# library inside.
+partitioner_build() {
+    mkdir -p "$(dirname "$3")"
+    "$CROSS-g++" -std=c++20 -O2 -fno-exceptions -fno-rtti -D_GNU_SOURCE -D_FILE_OFFSET_BITS=64 \
+        -D_TIME_BITS=64 -I "$1" "$2"/*.cpp -L "$1" -static-libgcc -Wl,--as-needed \
+        -lfdisk -lblkid -luuid -o "$3"
 }

@@ -145,6 +145,12 @@ void EventProblemsAdd(const RUN_EVENT &event, RUN_RESULT &result)
     }
 }
 
+std::vector<std::string> Sorted(std::vector<std::string> words)
+{
+    std::sort(words.begin(), words.end());
+    return words;
+}
+
 // True for a command that may be run or not: which of the two it is, is chance.
 bool IsOptional(const MACHINE &machine, const RUN_EVENT &event)
 {
@@ -174,7 +180,7 @@ std::string KeptText(const MACHINE &machine, const RUN_RESULT &result)
             szText += "    " + event.szExecuted + " null " + std::to_string(event.fNullInput) +
                       std::to_string(event.fNullOutput) + std::to_string(event.fNullError) +
                       " open " + std::to_string(event.nDescriptors) + " environment " +
-                      WordsText(event.environment) + "\n";
+                      WordsText(Sorted(event.environment)) + "\n";
         }
     }
     return szText;
