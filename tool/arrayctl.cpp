@@ -50,6 +50,12 @@ constexpr char USAGE[] = "usage:\n"
                          "\tarrayctl initsys \n"
                          "\tarrayctl initsys-dd ";
 
+int Usage()
+{
+    (void)puts(USAGE);
+    return STATUS_FAILED;
+}
+
 // --- status ------------------------------------------------------------------------------------
 
 // Kept: every word of the report lives in a field of 16 bytes, so its first 15 characters are
@@ -197,14 +203,15 @@ TEXT DiskPath(const char *szDisk)
     return cch < 0 ? TEXT{} : path;
 }
 
-PNLIBSZLIST DiskListAlloc()
+// Tells the log when there was no memory for a list of disks.
+bool IsAllocated(const NLIBSZLIST *pDisks)
 {
-    NLIBSZLIST *const pDisks = NLIBCSzListAlloc(DISK_LIST_SIZE);
     if (pDisks == nullptr) {
         NLIBCLog(LOG_ERR, "Out of memeory, failed to allocate memory for PNLIBSZLIST via "
                           "NLIBCSzListAlloc");
+        return false;
     }
-    return pDisks;
+    return true;
 }
 
 // The disks of the machine: a dual-head machine's are in its expansion unit.
@@ -512,9 +519,9 @@ int SystemArraysCreate(const SYSTEM_MEMBERS &members, int nSlot)
 
 int SystemInit(bool fDuplicate)
 {
-    PNLIBSZLIST pDisks = DiskListAlloc();
-    const LIST_OWNER disksOwner(&pDisks);
-    if (pDisks == nullptr) {
+    PNLIBSZLIST pDisks = NLIBCSzListAlloc(DISK_LIST_SIZE);
+    const LIST_OWNER owner(&pDisks);
+    if (!IsAllocated(pDisks)) {
         return STATUS_FAILED;
     }
     const int nSlot = NLIBCConfMaxSysRaidDisksGet();
@@ -652,12 +659,9 @@ int DataVolumeCreate(int argc)
     PNLIBSZLIST pDisks = NLIBCSzListAlloc(DISK_LIST_SIZE);
     const LIST_OWNER owner(&pDisks);
     if (argc != NEWVOL_ARGUMENT_COUNT) {
-        (void)puts(USAGE);
-        return STATUS_FAILED;
+        return Usage();
     }
-    if (pDisks == nullptr) {
-        NLIBCLog(LOG_ERR, "Out of memeory, failed to allocate memory for PNLIBSZLIST via "
-                          "NLIBCSzListAlloc");
+    if (!IsAllocated(pDisks)) {
         return STATUS_FAILED;
     }
     if (!DisksEnum(&pDisks)) {
@@ -744,8 +748,8 @@ int FormatAllDisksEnum(bool fDualHeadInstall)
     const LIST_OWNER keepDataOwner(&lists.pKeepData);
     const LIST_OWNER formatAllOwner(&lists.pFormatAll);
     for (PNLIBSZLIST *const ppList : {&lists.pAll, &lists.pKeepData, &lists.pFormatAll}) {
-        *ppList = DiskListAlloc();
-        if (*ppList == nullptr) {
+        *ppList = NLIBCSzListAlloc(DISK_LIST_SIZE);
+        if (!IsAllocated(*ppList)) {
             return STATUS_FAILED;
         }
     }
@@ -836,12 +840,6 @@ constexpr COMMAND COMMANDS[] = {
 
 constexpr int RAID_ID_ARGUMENT = 2;
 constexpr int RAID_ID_ARGUMENT_COUNT = RAID_ID_ARGUMENT + 1;
-
-int Usage()
-{
-    (void)puts(USAGE);
-    return STATUS_FAILED;
-}
 
 int CommandRun(const COMMAND &command, int argc, char *argv[])
 {
