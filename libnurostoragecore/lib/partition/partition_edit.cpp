@@ -10,6 +10,7 @@
 #include "nurostoragecore/partition_layout.h"
 #include "nurostoragecore/partition_version.h"
 #include "nurostoragecore/space.h"
+#include "partition/partition_type.h"
 #include "raid/raid_tool.h"
 
 #include <array>
@@ -29,10 +30,6 @@ constexpr int ERR_TABLE_NOT_ADDED = 255;
 constexpr int ERR_NO_KIND = -1;
 
 constexpr int PARTITION_DATA = 3;
-
-constexpr u32 TYPE_LINUX = 0x83;
-constexpr u32 TYPE_SWAP = 0x82;
-constexpr u32 TYPE_RAID = 0xfd;
 
 struct OPTION {
     char szText[OPTION_SIZE];

@@ -8,6 +8,7 @@
 #include "nurocore/io.h"
 #include "nurocore/log.h"
 #include "nurocore/text.h"
+#include "partition/partition_type.h"
 
 #include <array>
 #include <cstdio>
@@ -20,10 +21,6 @@ namespace
 constexpr int NAME_SIZE = 128;
 constexpr int PATH_SIZE = 512;
 constexpr int LINE_SIZE = 129; // a line of at most 128 bytes
-
-constexpr u32 TYPE_LINUX = 0x83;
-constexpr u32 TYPE_SWAP = 0x82;
-constexpr u32 TYPE_RAID = 0xfd;
 
 // The swap partition begins where the system partition ends; the data partition is not fixed.
 constexpr PARTITION_LAYOUT Row(u32 version, u32 raid, u64 start, u64 systemSize, u64 swapSize,
