@@ -1,0 +1,13 @@
+# SPDX-License-Identifier: MIT
+#
+# GoogleTest for every ring: the installed library when it fits the target, else its sources
+# (32-bit and foreign targets).
+find_package(GTest CONFIG QUIET)
+if(NOT TARGET GTest::gtest_main)
+    set(INSTALL_GTEST OFF CACHE BOOL "" FORCE)
+    set(BUILD_GMOCK OFF CACHE BOOL "" FORCE)
+    add_subdirectory(/usr/src/googletest "${CMAKE_BINARY_DIR}/googletest" EXCLUDE_FROM_ALL)
+    if(NOT TARGET GTest::gtest_main)
+        add_library(GTest::gtest_main ALIAS gtest_main)
+    endif()
+endif()
