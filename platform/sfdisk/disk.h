@@ -26,7 +26,7 @@ struct DESCRIPTOR {
     bool operator==(const DESCRIPTOR &) const = default;
 };
 
-struct DescriptorClose {
+struct DESCRIPTOR_DELETER {
     using pointer = DESCRIPTOR;
     void operator()(DESCRIPTOR descriptor) const
     {
@@ -34,14 +34,14 @@ struct DescriptorClose {
     }
 };
 
-using UniqueDescriptor = std::unique_ptr<DESCRIPTOR, DescriptorClose>;
+using DESCRIPTOR_OWNER = std::unique_ptr<DESCRIPTOR, DESCRIPTOR_DELETER>;
 
 struct DISK {
     const char *szPath;
     bool fBlock; // false: an image file, of which the kernel knows no partitions
     dev_t device;
-    UniqueDescriptor file;
-    UniqueDescriptor claim;
+    DESCRIPTOR_OWNER file;
+    DESCRIPTOR_OWNER claim;
 };
 
 // Opens the disk and holds the advisory lock of the whole disk until the program ends, shared

@@ -25,22 +25,22 @@ constexpr timespec PAUSE = {0, 20'000'000};
 constexpr int NAME_SIZE = 64;
 constexpr int PATH_SIZE = 512;
 
-struct DirectoryClose {
+struct DIRECTORY_DELETER {
     void operator()(DIR *pDirectory) const
     {
         closedir(pDirectory);
     }
 };
 
-struct StreamClose {
+struct STREAM_DELETER {
     void operator()(FILE *pStream) const
     {
         fclose(pStream);
     }
 };
 
-using UniqueDirectory = std::unique_ptr<DIR, DirectoryClose>;
-using UniqueStream = std::unique_ptr<FILE, StreamClose>;
+using DIRECTORY_OWNER = std::unique_ptr<DIR, DIRECTORY_DELETER>;
+using STREAM_OWNER = std::unique_ptr<FILE, STREAM_DELETER>;
 
 struct KERNEL_PARTITION {
     PARTITION partition;
@@ -61,7 +61,7 @@ bool AttributeRead(const char *szFolder, const char *szPartition, const char *sz
     if (cb >= PATH_SIZE) {
         return false;
     }
-    const UniqueStream pStream{fopen(szPath, "re")};
+    const STREAM_OWNER pStream{fopen(szPath, "re")};
     return pStream && fgets(szText, NAME_SIZE, pStream.get());
 }
 
@@ -100,7 +100,7 @@ int KernelListRead(const DISK *pDisk, PARTITION_LIST *pList)
 {
     char szFolder[PATH_SIZE];
     DiskFolderGet(pDisk, szFolder);
-    const UniqueDirectory pDirectory{opendir(szFolder)};
+    const DIRECTORY_OWNER pDirectory{opendir(szFolder)};
     if (!pDirectory) {
         return Complain("cannot read %s: %s", szFolder, strerror(errno));
     }
@@ -185,7 +185,7 @@ bool PartitionHasNode(const DISK *pDisk, int number)
 {
     char szFolder[PATH_SIZE];
     DiskFolderGet(pDisk, szFolder);
-    const UniqueDirectory pDirectory{opendir(szFolder)};
+    const DIRECTORY_OWNER pDirectory{opendir(szFolder)};
     while (const dirent *pEntry = pDirectory ? readdir(pDirectory.get()) : nullptr) {
         KERNEL_PARTITION item = {};
         if (KernelPartitionRead(szFolder, pEntry->d_name, &item) &&

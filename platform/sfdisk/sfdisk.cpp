@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: MIT
+//
 // The appliance's partitioner: makes, deletes and shows single entries of an ms-dos table.
 // Every command checks all it can before the first change; what it refuses changes nothing.
 #include "disk.h"
@@ -14,7 +15,7 @@ namespace
 
 constexpr int CREATED_NUMBER_MAX = 4; // no logical partitions are made
 
-struct TextFree {
+struct HEAP_DELETER {
     void operator()(char *szText) const
     {
         free(szText);
@@ -186,7 +187,7 @@ int CommandList(DISK *pDisk, TABLE *pTable, const REQUEST *pRequest)
     if (!pFound) {
         return 0;
     }
-    const std::unique_ptr<char, TextFree> szName{
+    const std::unique_ptr<char, HEAP_DELETER> szName{
         fdisk_partname(pDisk->szPath, static_cast<size_t>(pFound->number))};
     if (!szName) {
         return Complain("out of memory");

@@ -18,22 +18,22 @@ constexpr u64 MBR_LAST_SECTOR = UINT32_MAX;
 constexpr char GPT_SIGNATURE[] = {'E', 'F', 'I', ' ', 'P', 'A', 'R', 'T'};
 constexpr size_t DISK_SECTOR_MAX = 4096;
 
-struct FdiskPartitionFree {
+struct FDISK_PARTITION_DELETER {
     void operator()(fdisk_partition *pPartition) const
     {
         fdisk_unref_partition(pPartition);
     }
 };
 
-struct FdiskTypeFree {
+struct FDISK_TYPE_DELETER {
     void operator()(fdisk_parttype *pType) const
     {
         fdisk_unref_parttype(pType);
     }
 };
 
-using UniquePartition = std::unique_ptr<fdisk_partition, FdiskPartitionFree>;
-using UniqueType = std::unique_ptr<fdisk_parttype, FdiskTypeFree>;
+using FDISK_PARTITION_OWNER = std::unique_ptr<fdisk_partition, FDISK_PARTITION_DELETER>;
+using FDISK_TYPE_OWNER = std::unique_ptr<fdisk_parttype, FDISK_TYPE_DELETER>;
 
 // libfdisk answers 0, or a negative error number.
 int FdiskCheck(const TABLE *pTable, int result, const char *szWhat)
@@ -98,7 +98,7 @@ int PartitionRead(const TABLE *pTable, size_t slot, PARTITION *pPartition)
                    "read the partition table of") != 0) {
         return 1;
     }
-    const UniquePartition pEntry{pRaw};
+    const FDISK_PARTITION_OWNER pEntry{pRaw};
     fdisk_parttype *pType = fdisk_partition_get_type(pRaw);
 
     pPartition->number = static_cast<int>(slot) + 1;
@@ -216,8 +216,8 @@ int TableRenew(TABLE *pTable)
 int TableAdd(TABLE *pTable, const PARTITION &partition)
 {
     fdisk_context *pContext = pTable->pContext.get();
-    const UniquePartition pNew{fdisk_new_partition()};
-    const UniqueType pType{fdisk_new_parttype()};
+    const FDISK_PARTITION_OWNER pNew{fdisk_new_partition()};
+    const FDISK_TYPE_OWNER pType{fdisk_new_parttype()};
     if (!pNew || !pType) {
         return Complain("out of memory");
     }

@@ -12,7 +12,7 @@ enum TABLE_LABEL {
     TABLE_FOREIGN, // GPT and the like, also an ms-dos table that only protects a GPT
 };
 
-struct ContextFree {
+struct FDISK_CONTEXT_DELETER {
     void operator()(fdisk_context *pContext) const
     {
         fdisk_unref_context(pContext);
@@ -20,7 +20,7 @@ struct ContextFree {
 };
 
 struct TABLE {
-    std::unique_ptr<fdisk_context, ContextFree> pContext;
+    std::unique_ptr<fdisk_context, FDISK_CONTEXT_DELETER> pContext;
     const char *szPath;
     int fd;
     TABLE_LABEL label;
