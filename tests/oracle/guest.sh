@@ -1,11 +1,12 @@
 #!/bin/sh
 # SPDX-License-Identifier: MIT
 #
-# Sets up one machine after the other from /oracle/machines, runs the tool on each and hands back
-# what was seen of it: behind the line "# records" stands an archive in base64.
-# shellcheck source=SCRIPTDIR/lib.sh
+# The part of tests/oracle/run-real that runs inside the virtual appliance: sets up one machine after
+# the other from /oracle/machines, runs the tool on each and hands back what was seen of it: behind
+# the line "# records" stands an archive in base64.
+# shellcheck source=SCRIPTDIR/../appliance/lib.sh
 . /appliance/lib.sh
-# shellcheck source=SCRIPTDIR/lib-setup.sh
+# shellcheck source=SCRIPTDIR/../appliance/lib-setup.sh
 . /appliance/lib-setup.sh
 
 ORACLE=/oracle
