@@ -145,13 +145,6 @@ claims_of() {
         -e 's/^this *[0-9]* *[0-9]* *[0-9]* *\([0-9]*\) .*/\1/p' | tr '\n' ' '
 }
 
-# have_no_superblock PARTITION...
-have_no_superblock() {
-    # shellcheck disable=SC2046
-    mdadm -E $(printf '/dev/%s ' "$@") 2>&1 | sort >"$SEEN"
-    printf 'mdadm: No md superblock detected on /dev/%s.\n' "$@" | sort | diff - "$SEEN"
-}
-
 uuid_of() {
     mdadm --detail "/dev/md$1" | sed -n 's/^ *UUID : \([^ ]*\).*/\1/p'
 }
@@ -183,13 +176,6 @@ system_arrays_are() {
             echo "seen '$seen_claims'"
             return 1
         }
-    done
-}
-
-stop_arrays() {
-    for number in "$@"; do
-        must mdadm --stop "/dev/md$number"
-        wait_for "$SETTLE_SECONDS" array_is_gone "$number" || abort "md$number does not go away"
     done
 }
 

@@ -162,12 +162,18 @@ array_is_gone() {
     ! grep -q "^md$1 :" /proc/mdstat
 }
 
+# stop_arrays MD...: superblocks and members stay as they are.
+stop_arrays() {
+    for number in "$@"; do
+        must mdadm --stop "/dev/md$number"
+        wait_for "$SETTLE_SECONDS" array_is_gone "$number" || abort "md$number does not go away"
+    done
+}
+
 # drop_array MD MEMBER...: stops it and takes its superblocks off, so that the next one starts blank.
 drop_array() {
-    number=$1
+    stop_arrays "$1"
     shift
-    must mdadm --stop "/dev/md$number"
-    wait_for "$SETTLE_SECONDS" array_is_gone "$number" || abort "md$number does not go away"
     for member in "$@"; do
         must mdadm --zero-superblock "$member"
     done
@@ -235,13 +241,11 @@ arrays_known() {
     sed -n 's/^md\([0-9]*\) :.*/\1/p' /proc/mdstat | sort -n | xargs
 }
 
-# MEMBER...: mdadm has to say it of each.
-has_no_superblock() {
-    for member in "$@"; do
-        echo "mdadm: No md superblock detected on /dev/$member."
-    done >/tmp/members
+# have_no_superblock MEMBER...: mdadm has to say it of each.
+have_no_superblock() {
+    printf 'mdadm: No md superblock detected on /dev/%s.\n' "$@" >/tmp/members
     # shellcheck disable=SC2046  # a list of nodes
-    mdadm -E $(printf '/dev/%s ' "$@") 2>&1 | cmp /tmp/members -
+    mdadm -E $(printf '/dev/%s ' "$@") 2>&1 | diff /tmp/members -
 }
 
 # On no disk and no partition, whatever array they belong to.
@@ -376,7 +380,7 @@ check_left_nothing() {
     uuid=$2
     shift 2
     check 'the array is gone' wait_for "$SETTLE_SECONDS" array_left_nothing "$number"
-    check 'no superblock' has_no_superblock "$@"
+    check 'no superblock' have_no_superblock "$@"
     check 'no signature' has_no_signature "$@"
     check 'no superblock anywhere' uuid_is_nowhere "$uuid"
 }

@@ -183,7 +183,7 @@ boot_2() {
     done
     members='sda3 sdb3 sdc3 sdd3 sda5 sdb5 sdc5 sdd5 sda6 sdb6 sdc6 sdd6'
     # shellcheck disable=SC2086
-    check 'superblocks' has_no_superblock $members
+    check 'superblocks' have_no_superblock $members
     # shellcheck disable=SC2086
     check 'signatures' has_no_signature $members
     verdict 'no trace of them on the disks'

@@ -142,7 +142,7 @@ an_array_held_open() {
     log_of_removal 3 sda5 sdb5 >"$EXPECTED"
     check_log_of_members free 2
     check 'gone' wait_for "$SETTLE_SECONDS" array_left_nothing 3
-    check 'no superblock' has_no_superblock sda5 sdb5
+    check 'no superblock' have_no_superblock sda5 sdb5
     verdict 'the same array goes once it is free'
 }
 

@@ -203,7 +203,7 @@ boot_2() {
     check 'no other' test "$(arrays_known)" = 4
     verdict 'only the neighbour assembles'
 
-    check 'superblocks' has_no_superblock sda3 sdb3 sdc3 sdb5 sdc5 sdd5 sdc6 sdd6
+    check 'superblocks' have_no_superblock sda3 sdb3 sdc3 sdb5 sdc5 sdd5 sdc6 sdd6
     check 'signatures' has_no_signature sda3 sdb3 sdc3 sdb5 sdc5 sdd5 sdc6 sdd6
     check 'groups' test "$(vgs --noheadings -o vg_name | xargs)" = neighbour
     check 'physical volumes' test "$(pvs --noheadings -o pv_name | xargs)" = /dev/md4
