@@ -10,7 +10,7 @@ namespace
 using std::string;
 using std::to_string;
 using std::vector;
-using Texts = vector<string>;
+using TEXTS = vector<string>;
 
 string WordsText(const ORACLE_WORDS &words)
 {
@@ -82,9 +82,9 @@ string ActionText(const ORACLE_ACTION &action)
 }
 
 template <typename TEST>
-Texts ActionTexts(const ORACLE_STRAND &strand, TEST wanted)
+TEXTS ActionTexts(const ORACLE_STRAND &strand, TEST wanted)
 {
-    Texts texts;
+    TEXTS texts;
     for (const ORACLE_ACTION &action : strand.actions) {
         if (wanted(action)) {
             texts.push_back(ActionText(action));
@@ -103,7 +103,7 @@ bool IsErrorLog(const ORACLE_ACTION &action)
     return action.kind == ORACLE_KIND::ERROR_LOG;
 }
 
-void ListCompare(const string &szWhat, const Texts &expected, const Texts &seen, Texts &differences)
+void ListCompare(const string &szWhat, const TEXTS &expected, const TEXTS &seen, TEXTS &differences)
 {
     if (expected == seen) {
         return;
@@ -124,12 +124,12 @@ void ListCompare(const string &szWhat, const Texts &expected, const Texts &seen,
     differences.push_back(text);
 }
 
-void BagCompare(const string &szWhat, Texts expected, Texts seen, Texts &differences)
+void BagCompare(const string &szWhat, TEXTS expected, TEXTS seen, TEXTS &differences)
 {
     std::sort(expected.begin(), expected.end());
     std::sort(seen.begin(), seen.end());
-    Texts missing;
-    Texts extra;
+    TEXTS missing;
+    TEXTS extra;
     std::set_difference(expected.begin(), expected.end(), seen.begin(), seen.end(),
                         std::back_inserter(missing));
     std::set_difference(seen.begin(), seen.end(), expected.begin(), expected.end(),
@@ -151,7 +151,7 @@ vector<T> SliceTake(const vector<T> &all, size_t &at, size_t count, bool fLast)
 // The parent takes the disks one after the other: it works on a disk only when the children of that
 // disk and of those before it have ended.
 void PatienceCompare(const string &szPhase, const ORACLE_PHASE &phase,
-                     const vector<ORACLE_WORDS> &seen, Texts &differences)
+                     const vector<ORACLE_WORDS> &seen, TEXTS &differences)
 {
     std::map<string, size_t> places;
     for (size_t i = 0; i + 1 < phase.size(); i++) {
@@ -171,9 +171,9 @@ void PatienceCompare(const string &szPhase, const ORACLE_PHASE &phase,
 }
 
 void PhaseCompare(const string &szPhase, const ORACLE_PHASE &phase,
-                  const vector<ORACLE_WORDS> &seen, Texts &differences)
+                  const vector<ORACLE_WORDS> &seen, TEXTS &differences)
 {
-    std::map<string, Texts> bySeen;
+    std::map<string, TEXTS> bySeen;
     for (const ORACLE_WORDS &words : seen) {
         bySeen[phase.size() == 1 ? "" : CommandDisk(words)].push_back(WordsText(words));
     }
@@ -190,19 +190,19 @@ void PhaseCompare(const string &szPhase, const ORACLE_PHASE &phase,
 }
 
 template <typename TEST>
-Texts PhaseTexts(const ORACLE_PHASE &phase, TEST wanted)
+TEXTS PhaseTexts(const ORACLE_PHASE &phase, TEST wanted)
 {
-    Texts texts;
+    TEXTS texts;
     for (const ORACLE_STRAND &strand : phase) {
-        const Texts own = ActionTexts(strand, wanted);
+        const TEXTS own = ActionTexts(strand, wanted);
         texts.insert(texts.end(), own.begin(), own.end());
     }
     return texts;
 }
 
 // The lines of one process come in its order, whoever else writes in between.
-void OrderCompare(const string &szWhat, const ORACLE_PHASE &phase, const Texts &seen,
-                  Texts &differences)
+void OrderCompare(const string &szWhat, const ORACLE_PHASE &phase, const TEXTS &seen,
+                  TEXTS &differences)
 {
     for (const ORACLE_STRAND &strand : phase) {
         auto at = seen.begin();
@@ -218,7 +218,7 @@ void OrderCompare(const string &szWhat, const ORACLE_PHASE &phase, const Texts &
     }
 }
 
-void CommandsCompare(const ORACLE_ANSWER &answer, const ORACLE_SEEN &seen, Texts &differences)
+void CommandsCompare(const ORACLE_ANSWER &answer, const ORACLE_SEEN &seen, TEXTS &differences)
 {
     size_t at = 0;
     for (size_t i = 0; i < answer.phases.size(); i++) {
@@ -229,16 +229,16 @@ void CommandsCompare(const ORACLE_ANSWER &answer, const ORACLE_SEEN &seen, Texts
     }
 }
 
-void LinesCompare(const ORACLE_ANSWER &answer, const ORACLE_SEEN &seen, Texts &differences)
+void LinesCompare(const ORACLE_ANSWER &answer, const ORACLE_SEEN &seen, TEXTS &differences)
 {
-    Texts lines;
+    TEXTS lines;
     for (const auto &[priority, szLine] : seen.lines) {
         lines.push_back(LineText(priority, OracleLineMask(szLine)));
     }
     size_t at = 0;
     for (size_t i = 0; i < answer.phases.size(); i++) {
-        const Texts expected = PhaseTexts(answer.phases[i], IsLog);
-        const Texts own = SliceTake(lines, at, expected.size(), i + 1 == answer.phases.size());
+        const TEXTS expected = PhaseTexts(answer.phases[i], IsLog);
+        const TEXTS own = SliceTake(lines, at, expected.size(), i + 1 == answer.phases.size());
         const string szWhat = "phase " + to_string(i) + ": syslog";
         if (answer.phases[i].size() == 1) {
             ListCompare(szWhat, expected, own, differences);
@@ -249,11 +249,11 @@ void LinesCompare(const ORACLE_ANSWER &answer, const ORACLE_SEEN &seen, Texts &d
     }
 }
 
-void ErrorLogCompare(const ORACLE_ANSWER &answer, const ORACLE_SEEN &seen, Texts &differences)
+void ErrorLogCompare(const ORACLE_ANSWER &answer, const ORACLE_SEEN &seen, TEXTS &differences)
 {
-    Texts expected;
+    TEXTS expected;
     for (const ORACLE_PHASE &phase : answer.phases) {
-        const Texts own = PhaseTexts(phase, IsErrorLog);
+        const TEXTS own = PhaseTexts(phase, IsErrorLog);
         expected.insert(expected.end(), own.begin(), own.end());
     }
     BagCompare(ORACLE_ERROR_LOG_PATH, expected, seen.errorLog, differences);
@@ -264,13 +264,13 @@ void ErrorLogCompare(const ORACLE_ANSWER &answer, const ORACLE_SEEN &seen, Texts
 std::vector<std::string> OracleDifferences(const ORACLE_ANSWER &answer, const ORACLE_SEEN &seen)
 {
     const ORACLE_ANSWER expected = AnswerAsSeen(answer, seen.fShellText);
-    Texts differences;
+    TEXTS differences;
     ListCompare("standard output", {expected.szOut}, {seen.szOut}, differences);
     ListCompare("standard error", {""}, {seen.szErr}, differences);
     ListCompare("exit status", {to_string(expected.nStatus)}, {to_string(seen.nStatus)},
                 differences);
-    ListCompare("marker files", Texts(expected.markers.begin(), expected.markers.end()),
-                Texts(seen.markers.begin(), seen.markers.end()), differences);
+    ListCompare("marker files", TEXTS(expected.markers.begin(), expected.markers.end()),
+                TEXTS(seen.markers.begin(), seen.markers.end()), differences);
     CommandsCompare(expected, seen, differences);
     LinesCompare(expected, seen, differences);
     ErrorLogCompare(expected, seen, differences);

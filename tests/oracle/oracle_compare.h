@@ -1,7 +1,8 @@
 // SPDX-License-Identifier: MIT
+#pragma once
+
 // Compares what a run left behind with what the model says. Children of one phase run side by side,
 // so the commands of each disk are compared in their order, and their lines without one.
-#pragma once
 
 #include "oracle_model.h"
 
@@ -12,8 +13,7 @@
 // What was seen of one run.
 struct ORACLE_SEEN {
     std::vector<ORACLE_WORDS> commands{}; // in order; a pause is "sleep" and its seconds
-    bool fShellText =
-        false; // the shell's own call ("sh", "-c", text) is seen, not what comes of it
+    bool fShellText = false; // commands of a shell are seen as "sh", "-c" and their text
     std::vector<std::pair<int, std::string>> lines{}; // priority and whole syslog line, in order
     std::vector<std::string> errorLog{};              // lines without their time stamp
     std::string szOut{};

@@ -1,8 +1,9 @@
 // SPDX-License-Identifier: MIT
+#pragma once
+
 // What the machine's rules say a command must do, as a pure function: a description of a machine
 // and a command go in; every command run, every byte printed, every syslog line and the exit
 // status come out. Nothing here runs anything, and nothing here is shared with the tool.
-#pragma once
 
 #include <array>
 #include <cstdint>

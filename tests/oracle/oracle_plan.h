@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: MIT
-// Random machines that can be set up with real disks: the same seed gives the same one everywhere.
 #pragma once
+
+// Random machines that can be set up with real disks: the same seed gives the same one everywhere.
 
 #include "oracle_machine.h"
 

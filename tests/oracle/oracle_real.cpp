@@ -290,13 +290,6 @@ int PlanAll(u64 first, u64 count)
     return EXIT_SUCCESS;
 }
 
-bool NumberParse(const char *szText, u64 &number)
-{
-    char *pEnd = nullptr;
-    number = strtoull(szText, &pEnd, 10);
-    return pEnd != szText && *pEnd == '\0';
-}
-
 } // namespace
 
 int main(int argc, char *argv[])
@@ -306,7 +299,7 @@ int main(int argc, char *argv[])
     u64 first = 0;
     u64 count = 0;
     if ((!fPlan && szWord != "compare" && szWord != "show") || argc != (fPlan ? 4 : 5) ||
-        !NumberParse(argv[2], first) || !NumberParse(argv[3], count) || count == 0) {
+        !OracleNumberParse(argv[2], first) || !OracleNumberParse(argv[3], count) || count == 0) {
         fprintf(stderr, "usage: oracle_real plan SEED N | compare|show SEED N FOLDER\n");
         return EXIT_FAILURE;
     }

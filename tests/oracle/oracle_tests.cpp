@@ -393,17 +393,10 @@ int RingRun(const OPTIONS &options)
     return tally.failed == 0 ? EXIT_SUCCESS : EXIT_FAILURE;
 }
 
-bool NumberParse(const char *szText, u64 &number)
-{
-    char *pEnd = nullptr;
-    number = strtoull(szText, &pEnd, 10);
-    return pEnd != szText && *pEnd == '\0';
-}
-
 bool OptionsParse(int argc, char *argv[], OPTIONS &options)
 {
     const char *szSeed = getenv("ORACLE_SEED");
-    if (szSeed != nullptr && !NumberParse(szSeed, options.seed)) {
+    if (szSeed != nullptr && !OracleNumberParse(szSeed, options.seed)) {
         return false;
     }
     const std::pair<const char *, u64 *> numbers[] = {
@@ -417,7 +410,7 @@ bool OptionsParse(int argc, char *argv[], OPTIONS &options)
             return strcmp(entry.first, argv[i]) == 0;
         });
         if (option == std::end(numbers) || i + 1 == argc ||
-            !NumberParse(argv[++i], *option->second)) {
+            !OracleNumberParse(argv[++i], *option->second)) {
             return false;
         }
     }
