@@ -1,11 +1,11 @@
 // SPDX-License-Identifier: MIT
-//
+#pragma once
+
 // What the stock md driver publishes of an array in sysfs, turned into the two answers that the
 // appliance's own driver gives directly: the array's health and the progress of its resync.
 //
 // The attributes are text in, the answers are records out; reading the files is one function,
 // with the folder as its argument, so that a test can lay out an array without a driver.
-#pragma once
 
 #include <cstddef>
 #include <cstdint>

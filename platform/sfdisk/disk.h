@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: MIT
-// One whole disk, opened and locked: a block device, or an image file.
 #pragma once
+
+// One whole disk, opened and locked: a block device, or an image file.
 
 #include "partition.h"
 

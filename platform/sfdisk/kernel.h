@@ -1,7 +1,8 @@
 // SPDX-License-Identifier: MIT
+#pragma once
+
 // What the kernel knows of the partitions of a disk, changed one partition at a time, so that
 // the others may be in use. Both do nothing for an image file.
-#pragma once
 
 #include "table.h"
 

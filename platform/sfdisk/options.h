@@ -1,11 +1,12 @@
 // SPDX-License-Identifier: MIT
+#pragma once
+
 // The command line of the partitioner:
 //   sfdisk -M1 DISK
 //   sfdisk -N<n> -uS -j<skip> -z<size|-1> -t<hex> [-q] [-f] [-F] DISK
 //   sfdisk --fast-delete <from:to|-1> DISK
 //   sfdisk -l -uS -N<n> DISK
 // An empty argument stands for nothing, wherever it is. Counts are 512-byte sectors.
-#pragma once
 
 #include "partition.h"
 

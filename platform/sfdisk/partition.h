@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: MIT
-// What the partitioner knows of the partitions of one disk, and how it reports a failure.
 #pragma once
+
+// What the partitioner knows of the partitions of one disk, and how it reports a failure.
 
 #include <cstdint>
 

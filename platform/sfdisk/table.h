@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: MIT
-// The partition table of one disk, in memory until TableWrite.
 #pragma once
+
+// The partition table of one disk, in memory until TableWrite.
 
 #include "disk.h"
 

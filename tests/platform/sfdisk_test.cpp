@@ -24,7 +24,7 @@ namespace
 
 using std::string;
 using u64 = std::uint64_t;
-using Words = std::vector<string>;
+using WORDS = std::vector<string>;
 
 constexpr u64 MEBIBYTE = 1024 * 1024;
 
@@ -125,7 +125,7 @@ struct CHILD_SETUP {
     bool fNoFileWrites; // every write to a file fails
 };
 
-pid_t ChildStart(const Words &words, const string &szOut, const string &szErr,
+pid_t ChildStart(const WORDS &words, const string &szOut, const string &szErr,
                  const CHILD_SETUP &setup)
 {
     std::vector<char *> arguments;
@@ -155,7 +155,7 @@ pid_t ChildStart(const Words &words, const string &szOut, const string &szErr,
     _exit(127);
 }
 
-RESULT ToolRun(const string &szFolder, const Words &words, const CHILD_SETUP &setup = {})
+RESULT ToolRun(const string &szFolder, const WORDS &words, const CHILD_SETUP &setup = {})
 {
     const string szOut = setup.szOut.empty() ? szFolder + "/out" : setup.szOut;
     const string szErr = szFolder + "/err";
@@ -192,13 +192,13 @@ struct SfdiskTest : testing::Test {
         ASSERT_EQ(truncate(szImage.c_str(), static_cast<off_t>(cb)), 0) << strerror(errno);
     }
 
-    RESULT Run(Words words, const CHILD_SETUP &setup = {}) const
+    RESULT Run(WORDS words, const CHILD_SETUP &setup = {}) const
     {
         words.insert(words.begin(), TESTED_SFDISK);
         return ToolRun(szFolder, words, setup);
     }
 
-    void RunWell(const Words &words) const
+    void RunWell(const WORDS &words) const
     {
         const RESULT result = Run(words);
         EXPECT_EQ(result.status, 0) << testing::PrintToString(words);
@@ -207,7 +207,7 @@ struct SfdiskTest : testing::Test {
     }
 
     // Refused: that one line, nothing else said, not a byte changed.
-    void RunBadly(const Words &words, const string &szLine) const
+    void RunBadly(const WORDS &words, const string &szLine) const
     {
         const string before = FileRead(szImage);
         const RESULT result = Run(words);
@@ -222,7 +222,7 @@ struct SfdiskTest : testing::Test {
         RunWell({"-M1", szImage});
     }
 
-    Words CreateWords(int number, u64 skip, const string &szSize, const string &szType) const
+    WORDS CreateWords(int number, u64 skip, const string &szSize, const string &szType) const
     {
         return {"-N" + std::to_string(number),
                 "-uS",
@@ -287,7 +287,7 @@ struct SfdiskTest : testing::Test {
 // ---- the command line
 
 struct MALFORMED {
-    Words words; // DISK stands for the image
+    WORDS words; // DISK stands for the image
     string szLine;
 };
 
@@ -360,7 +360,7 @@ TEST_F(SfdiskTest, MalformedWordsAreRefusedWithOneLine)
     ImageMake(MEBIBYTE);
     Sign();
     for (const MALFORMED &row : MALFORMED_WORDS) {
-        Words words;
+        WORDS words;
         for (const string &szWord : row.words) {
             words.push_back(DiskFill(szWord, szImage));
         }
@@ -612,7 +612,7 @@ TEST_F(SfdiskTest, EveryLayoutOfTheApplianceIsMadeToTheSector)
         Sign();
         Create(1, layout.start, layout.systemSize, layout.szTypes[0]);
         Create(2, 0, layout.swapSize, layout.szTypes[1]);
-        Words data = CreateWords(3, layout.dataGap, "-1", layout.szTypes[2]);
+        WORDS data = CreateWords(3, layout.dataGap, "-1", layout.szTypes[2]);
         data.insert(data.begin() + 1, "");
         RunWell(data);
 
@@ -942,7 +942,7 @@ TEST_F(SfdiskTest, ALockedDiskIsWaitedFor)
     ASSERT_EQ(flock(fd, LOCK_SH), 0);
     EXPECT_EQ(List(1), "") << "two readers do not keep each other away";
 
-    Words words = CreateWords(1, 2048, "100", "fd");
+    WORDS words = CreateWords(1, 2048, "100", "fd");
     words.insert(words.begin(), TESTED_SFDISK);
     const pid_t pid = ChildStart(words, szFolder + "/out", szFolder + "/err", {});
     ASSERT_GT(pid, 0);
@@ -970,7 +970,7 @@ TEST_F(SfdiskTest, ADiskThatStaysLockedIsRefused)
 TEST_F(SfdiskTest, PartitionersOfOneDiskTakeTurns)
 {
     Sign();
-    Words words = CreateWords(1, 2048, "100", "fd");
+    WORDS words = CreateWords(1, 2048, "100", "fd");
     words.insert(words.begin(), TESTED_SFDISK);
     std::vector<pid_t> pids;
     for (int i = 0; i < 8; i++) {
@@ -990,19 +990,19 @@ TEST_F(SfdiskTest, PartitionersOfOneDiskTakeTurns)
 // Killed at any moment, run again from the start: the same table as without the kill.
 TEST_F(SfdiskTest, ARunAfterAKillCompletes)
 {
-    const std::vector<Words> steps = {{"--fast-delete", "-1", szImage},
+    const std::vector<WORDS> steps = {{"--fast-delete", "-1", szImage},
                                       {"-M1", szImage},
                                       CreateWords(1, 2048, "100", "fd"),
                                       CreateWords(2, 0, "200", "fd")};
     for (int i = 0; i < 60; i++) {
-        Words words = steps[static_cast<size_t>(i) % steps.size()];
+        WORDS words = steps[static_cast<size_t>(i) % steps.size()];
         words.insert(words.begin(), TESTED_SFDISK);
         const pid_t pid = ChildStart(words, szFolder + "/out", szFolder + "/err", {});
         ASSERT_GT(pid, 0);
         usleep(static_cast<useconds_t>(100 * i));
         kill(pid, SIGKILL);
         ASSERT_EQ(waitpid(pid, nullptr, 0), pid);
-        for (const Words &step : steps) {
+        for (const WORDS &step : steps) {
             RunWell(step);
         }
         ExpectEntry(szImage, 1, 0xfd, 2048, 100);
