@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: MIT
 //
 // The streams of children when a call fails on the way to the program that they become.
+#include "last_error.h"
 #include "nurocore/error.h"
 #include "nurocore/pipe.h"
 #include "nurocore/process.h"
@@ -17,7 +18,6 @@
 namespace
 {
 
-constexpr u32 OLD_CODE = 0xFFFFFF00; // stands in the record before a call
 constexpr char CHILD[] = "0.1";
 constexpr int STATUS_NOT_EXECUTED = 127;
 
@@ -104,7 +104,7 @@ TEST(ChildWait, OfARunTellsWhyThereIsNoStatus)
         machine.fMayLeaveChildren = true;
         machine.faults = {{.szFunction = "waitpid", .error = row.error, .szProcess = "0"}};
         MachineCall(machine, [&row] {
-            NLIBCErrSet(OLD_CODE, "before", 1);
+            RecordReset();
             EXPECT_EQ(NLIBCExecl("/bin/umount", NULL), row.result);
             EXPECT_EQ(NLIBCErrGet(), row.code);
         });
@@ -124,7 +124,7 @@ TEST(ChildWait, OfADaemonTellsWhyThereIsNoStatus)
         machine.fMayLeaveChildren = true;
         machine.faults = {{.szFunction = "waitpid", .error = row.error, .szProcess = "0"}};
         MachineCall(machine, [&row] {
-            NLIBCErrSet(OLD_CODE, "before", 1);
+            RecordReset();
             const int result = NLIBCFork(FORK_DAEMONIZE);
             if (result == 0) {
                 _exit(0);

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: MIT
 #include "nurocore/conf.h"
 
+#include "last_error.h"
 #include "nurocore/error.h"
 #include "nurocore/file.h"
 #include "nurocore/types.h"
@@ -15,7 +16,6 @@
 namespace
 {
 
-constexpr u32 OLD_CODE = 0xFFFFFF00; // stands in the record before every call
 constexpr char MAX_DISKS_FAILED[] =
     "<11>conf.cpp:# Failed to NLIBCFileGetKeyValue(/etc.defaults/nuroinfo.conf,maxdisks)\n";
 
@@ -42,11 +42,6 @@ void ConfRewrite(const std::string &conf)
 bool IsMarked(const char *szPath)
 {
     return access(szPath, F_OK) == 0;
-}
-
-void RecordReset()
-{
-    NLIBCErrSet(OLD_CODE, "before", 1);
 }
 
 struct YES_CASE {

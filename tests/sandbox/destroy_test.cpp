@@ -39,7 +39,7 @@ std::string Transcript(std::vector<std::string> first, const std::vector<std::st
 {
     first.insert(first.begin(), PVS);
     first.insert(first.end(), then.begin(), then.end());
-    return TextOf(first);
+    return Lines(first);
 }
 
 void PvsExpect(MACHINE &machine, const std::string &szRows)

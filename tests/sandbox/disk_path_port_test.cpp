@@ -2,6 +2,7 @@
 #include "hwcontrol/disk_name.h"
 #include "hwcontrol/disk_path.h"
 
+#include "last_error.h"
 #include "nurocore/error.h"
 #include "sandbox.h"
 
@@ -16,7 +17,6 @@
 namespace
 {
 
-constexpr u32 OLD_CODE = 0xFFFFFF00; // stands in the record before every call
 constexpr u32 OLD_MASK = 0xA5A5A5A5;
 
 // A disk of every port: sda to sdd internal, sde USB, sdf cache, and behind the eSATA ports g and h
@@ -38,11 +38,6 @@ int DescriptorsCount()
         nOpen += fcntl(fd, F_GETFD) != -1;
     }
     return nOpen;
-}
-
-void RecordReset()
-{
-    NLIBCErrSet(OLD_CODE, "before", 1);
 }
 
 struct PARSE_CASE {

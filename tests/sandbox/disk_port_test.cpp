@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: MIT
 #include "hwcontrol/disk_port.h"
 
+#include "last_error.h"
 #include "nurocore/conf.h"
 #include "nurocore/error.h"
 #include "nurocore/types.h"
@@ -18,7 +19,6 @@
 namespace
 {
 
-constexpr u32 OLD_CODE = 0xFFFFFF00; // stands in the record before every call
 constexpr char USB_MISSING[] =
     "<11>disk_port.cpp:# Get usbportcfg key from /etc.defaults/nuroinfo.conf Error\n";
 constexpr char TOO_LONG[] = "<11>disk_name.cpp:# buffer size of szDiskPath should be longer than "
@@ -63,11 +63,6 @@ int DescriptorNext()
     const int fd = dup(STDERR_FILENO);
     (void)close(fd);
     return fd;
-}
-
-void RecordReset()
-{
-    NLIBCErrSet(OLD_CODE, "before", 1);
 }
 
 struct NAMED_TYPE {

@@ -214,7 +214,7 @@ std::string Transcript(std::vector<std::string> between)
 {
     between.insert(between.begin(), PVS);
     between.insert(between.end(), REMOVAL_COMMANDS.begin(), REMOVAL_COMMANDS.end());
-    return TextOf(between);
+    return Lines(between);
 }
 
 RUN_RESULT Remove(const MACHINE &machine, int expected = 0)
@@ -283,9 +283,9 @@ TEST(LVMRmLVPath, EmptyFieldsAreTakenAsTheyAre)
     const RUN_RESULT result = Remove(machine);
     EXPECT_EQ(LogText(result), "");
     EXPECT_EQ(TranscriptText(result),
-              TextOf({PVS, "/bin/umount -R -A -k /volume1", "sleep 1", "/sbin/lvremove -f /dev//s1",
-                      "/sbin/lvremove -f /dev//", "/sbin/vgremove -f /dev/",
-                      "/sbin/pvremove -f /dev/md2"}));
+              Lines({PVS, "/bin/umount -R -A -k /volume1", "sleep 1", "/sbin/lvremove -f /dev//s1",
+                     "/sbin/lvremove -f /dev//", "/sbin/vgremove -f /dev/",
+                     "/sbin/pvremove -f /dev/md2"}));
 }
 
 TEST(LVMRmLVPath, ALongerNumberIsTakenForTheDevice)
@@ -330,7 +330,7 @@ TEST(LVMRmLVPath, AResultOfMinusOneIsNotTold)
     const RUN_RESULT result = MachineCall(machine, [] { EXPECT_EQ(LVMRmLVPath("/dev/md2"), 0); });
     EXPECT_EQ(LogText(result), "");
     EXPECT_EQ(TranscriptText(result),
-              TextOf({PVS, "fault pipe2 2", "fault pipe2 3", "fault pipe2 4"}));
+              Lines({PVS, "fault pipe2 2", "fault pipe2 3", "fault pipe2 4"}));
 }
 
 TEST(LVMRmLVPath, WithoutAMountTableNothingIsRemoved)

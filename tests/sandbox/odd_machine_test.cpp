@@ -4,6 +4,7 @@
 #include "hwcontrol/disk_name.h"
 #include "hwcontrol/disk_path.h"
 #include "hwcontrol/disk_port.h"
+#include "last_error.h"
 #include "nurocore/error.h"
 #include "nurostoragecore/partition_version.h"
 #include "nurostoragecore/raid_disk.h"
@@ -25,7 +26,6 @@
 namespace
 {
 
-constexpr u32 OLD_CODE = 0xFFFFFF00; // stands in the record before a call
 constexpr int UNTOUCHED = 4711;
 
 TEST(OddMachine, AMemberWithoutANameIsNoDisk)
@@ -55,7 +55,7 @@ TEST(OddMachine, UnitsNeedAPlaceToBeListedIn)
         char szUnits[8] = "x";
         EXPECT_EQ(ExternalDiskPortEnumEunit(0, nullptr, 8), -1);
         EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
-        NLIBCErrSet(OLD_CODE, "before", 1);
+        RecordReset();
         EXPECT_EQ(ExternalDiskPortEnumEunit(0, szUnits, 0), -1);
         EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
         EXPECT_STREQ(szUnits, "x");
@@ -212,7 +212,7 @@ TEST(OddMachine, BothStatesOfASystemDiskNeedAPlace)
     RAID_INFO *const pair[2] = {&root, &swap};
     u32 state = UNTOUCHED;
     for (const bool fRoot : {true, false}) {
-        NLIBCErrSet(OLD_CODE, "before", 1);
+        RecordReset();
         EXPECT_EQ(RAIDSystemDiskStatusDetailGet(pair, "/dev/sda", fRoot ? &state : nullptr,
                                                 fRoot ? nullptr : &state),
                   -1);

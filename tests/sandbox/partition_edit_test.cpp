@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: MIT
 #include "nurostoragecore/partition_edit.h"
 
+#include "last_error.h"
 #include "nurocore/error.h"
 #include "storage_machine.h"
 
@@ -14,7 +15,6 @@
 namespace
 {
 
-constexpr u32 OLD_CODE = 0xFFFFFF00; // stands in the record before a call
 constexpr u64 UNTOUCHED = 4711;
 constexpr u64 ALL_ONES = 0xFFFFFFFFFFFFFFFFULL;
 constexpr char ERROR_LOG[] = "/var/log/space_operation_error.log";
@@ -40,7 +40,7 @@ RUN_RESULT Create(const MACHINE &machine, const char *szDisk, int kind, std::opt
 {
     return MachineCall(machine, [=] {
         const u32 wanted = version.value_or(0);
-        NLIBCErrSet(OLD_CODE, "before", 1);
+        RecordReset();
         EXPECT_EQ(PartitionCreate(szDisk, kind, version ? &wanted : nullptr), resultExpected);
         EXPECT_EQ(NLIBCErrGet(), OLD_CODE); // it has no code of its own
     });
@@ -353,7 +353,7 @@ TEST(PartitionClean, GoesOnWhateverFails)
 TEST(PartitionClean, RefusesNull)
 {
     const RUN_RESULT result = MachineCall(MachineMake(), [] {
-        NLIBCErrSet(OLD_CODE, "before", 1);
+        RecordReset();
         EXPECT_EQ(PartitionClean(nullptr, 3), -1);
         EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
     });
@@ -376,7 +376,7 @@ TEST(PartitionTable, GetsAnMsDosSignature)
                                "/dev/sdc, err=256\n");
 
     const RUN_RESULT null = MachineCall(MachineMake(), [] {
-        NLIBCErrSet(OLD_CODE, "before", 1);
+        RecordReset();
         EXPECT_EQ(PartitionTableAdd(nullptr), -1);
         EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
     });
@@ -422,7 +422,7 @@ TEST(PartitionZero, FailsSilentlyWithTheCommand)
 TEST(PartitionZero, RefusesNullAndNumbersThatAreNotPositive)
 {
     const RUN_RESULT result = MachineCall(MachineMake(), [] {
-        NLIBCErrSet(OLD_CODE, "before", 1);
+        RecordReset();
         EXPECT_EQ(PartitionZeroSuperblock(nullptr, 1), -1);
         EXPECT_EQ(PartitionZeroSuperblock("/dev/sda", 0), -1);
         EXPECT_EQ(PartitionZeroSuperblock("/dev/sda", -1), -1);

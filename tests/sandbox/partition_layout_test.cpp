@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: MIT
 #include "nurostoragecore/partition_layout.h"
 
+#include "last_error.h"
 #include "nurocore/error.h"
 #include "storage_machine.h"
 
@@ -13,7 +14,6 @@
 namespace
 {
 
-constexpr u32 OLD_CODE = 0xFFFFFF00; // stands in the record before a call
 constexpr u64 UNTOUCHED = 4711;
 constexpr u64 NOT_FIXED = 0xFFFFFFFFFFFFFFFFULL;
 
@@ -285,7 +285,7 @@ void ExpectPlace(const char *szDisk, int partNum, u64 startExpected, u64 sizeExp
 {
     u64 start = UNTOUCHED;
     u64 size = UNTOUCHED;
-    NLIBCErrSet(OLD_CODE, "before", 1);
+    RecordReset();
     EXPECT_EQ(PartitionStartSizeGet(szDisk, partNum, &start, &size), 1) << szDisk;
     EXPECT_EQ(start, startExpected) << szDisk;
     EXPECT_EQ(size, sizeExpected) << szDisk;
@@ -296,7 +296,7 @@ void ExpectNoPlace(const char *szDisk, int partNum, int result, u32 code)
 {
     u64 start = UNTOUCHED;
     u64 size = UNTOUCHED;
-    NLIBCErrSet(OLD_CODE, "before", 1);
+    RecordReset();
     EXPECT_EQ(PartitionStartSizeGet(szDisk, partNum, &start, &size), result) << szDisk << partNum;
     EXPECT_EQ(NLIBCErrGet(), code) << szDisk << partNum;
 }
@@ -365,10 +365,10 @@ TEST(PartitionStartSize, RefusesNull)
     MachineCall(MachineMake(), [] {
         u64 sectors = UNTOUCHED;
         ExpectNoPlace(nullptr, 1, -1, ERR_BAD_PARAMETER);
-        NLIBCErrSet(OLD_CODE, "before", 1);
+        RecordReset();
         EXPECT_EQ(PartitionStartSizeGet("sda", 1, nullptr, &sectors), -1);
         EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
-        NLIBCErrSet(OLD_CODE, "before", 1);
+        RecordReset();
         EXPECT_EQ(PartitionStartSizeGet("sda", 1, &sectors, nullptr), -1);
         EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
         EXPECT_EQ(sectors, UNTOUCHED);
@@ -488,13 +488,13 @@ TEST(PartitionCheck, AsksForTheBuiltInStorageFirst)
     MachineDiskAdd(machine, "sdb");
     MachineFile(machine, "/sys/block/sdb/sdb1/size", "1\n");
     MachineCall(machine, [] {
-        NLIBCErrSet(OLD_CODE, "before", 1);
+        RecordReset();
         EXPECT_EQ(PartitionCheckLayout("sda", 1, nullptr), 0);
         EXPECT_EQ(NLIBCErrGet(), ERR_KEY_NOT_FOUND);
-        NLIBCErrSet(OLD_CODE, "before", 1);
+        RecordReset();
         EXPECT_EQ(PartitionCheckLayout("sdb", 1, nullptr), 0);
         EXPECT_EQ(NLIBCErrGet(), ERR_OPEN_FAILED);
-        NLIBCErrSet(OLD_CODE, "before", 1);
+        RecordReset();
         EXPECT_EQ(PartitionCheckLayout(nullptr, 1, nullptr), 0);
         EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
     });

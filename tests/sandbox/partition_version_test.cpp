@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: MIT
 #include "nurostoragecore/partition_version.h"
 
+#include "last_error.h"
 #include "nurocore/error.h"
 #include "nurostoragecore/partition_layout.h"
 #include "storage_machine.h"
@@ -13,8 +14,6 @@
 
 namespace
 {
-
-constexpr u32 OLD_CODE = 0xFFFFFF00; // stands in the record before a call
 
 std::string NotThere(const std::string &szDisk, int partNum)
 {
@@ -50,7 +49,7 @@ RUN_RESULT ExpectFirst(const MACHINE &machine, u32 versionExpected)
 TEST(PartitionVersion, RefusesNull)
 {
     const RUN_RESULT result = MachineCall(MachineMake(), [] {
-        NLIBCErrSet(OLD_CODE, "before", 1);
+        RecordReset();
         EXPECT_EQ(PartitionLayoutGetMax(nullptr, 0), -1);
         EXPECT_EQ(PartitionLayoutGetMax(nullptr, 1), -1);
         EXPECT_EQ(PartitionLayoutGet(nullptr), -1);
@@ -251,7 +250,7 @@ TEST(PartitionVersion, AsksForRaidBeforeTheDisks)
         EXPECT_EQ(PartitionLayoutGet(&version), 0);
         EXPECT_EQ(version, 8U);
         EXPECT_EQ(NLIBCErrGet(), ERR_KEY_NOT_FOUND);
-        NLIBCErrSet(OLD_CODE, "before", 1);
+        RecordReset();
         EXPECT_EQ(IsSupportRaid(), 0);
         EXPECT_EQ(NLIBCErrGet(), OLD_CODE); // it was asked above
     });
@@ -376,7 +375,7 @@ TEST(PartitionVersion, FailsWithoutMemoryForTheList)
             machine.faults = {{.szFunction = szFunction, .nCall = nCall}};
             const RUN_RESULT result = MachineCall(machine, [] {
                 u32 version = 0;
-                NLIBCErrSet(OLD_CODE, "before", 1);
+                RecordReset();
                 const int answer = PartitionLayoutGetMax(&version, 1);
                 printf("%d %X", answer, NLIBCErrGet());
             });

@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: MIT
+#include "last_error.h"
 #include "nurocore/error.h"
 #include "nurocore/pipe.h"
 #include "nurocore/process.h"
@@ -22,18 +23,11 @@
 namespace
 {
 
-constexpr u32 OLD_CODE = 0xFFFFFF00; // stands in the record before every call
-
 MACHINE MachineWithFault(const MACHINE_FAULT &fault)
 {
     MACHINE machine = MachineMake();
     machine.faults = {fault};
     return machine;
-}
-
-void RecordReset()
-{
-    NLIBCErrSet(OLD_CODE, "before", 1);
 }
 
 int DescriptorsCount()

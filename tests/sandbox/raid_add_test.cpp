@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: MIT
 #include "nurostoragecore/raid_add.h"
 
+#include "last_error.h"
 #include "nurocore/error.h"
 #include "nurostoragecore/raid_info.h"
 #include "storage_machine.h"
@@ -13,8 +14,6 @@
 namespace
 {
 
-constexpr u32 OLD_CODE = 0xFFFFFF00; // stands in the record before a call
-
 MACHINE MachineWithArray(int level)
 {
     MACHINE machine = MachineMake();
@@ -25,7 +24,7 @@ MACHINE MachineWithArray(int level)
 RUN_RESULT Add(const MACHINE &machine, int resultExpected, u32 codeExpected = OLD_CODE)
 {
     return MachineCall(machine, [resultExpected, codeExpected] {
-        NLIBCErrSet(OLD_CODE, "before", 1);
+        RecordReset();
         EXPECT_EQ(RAIDAdd("/dev/md2", "/dev/sdc3"), resultExpected);
         EXPECT_EQ(NLIBCErrGet(), codeExpected);
     });
@@ -129,7 +128,7 @@ TEST(RaidAdd, StopsWithoutAnArray)
 TEST(RaidAdd, RefusesNull)
 {
     const RUN_RESULT result = MachineCall(MachineWithArray(1), [] {
-        NLIBCErrSet(OLD_CODE, "before", 1);
+        RecordReset();
         EXPECT_EQ(RAIDAdd(nullptr, "/dev/sdc3"), -1);
         EXPECT_EQ(RAIDAdd("/dev/md2", nullptr), -1);
         EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
@@ -166,7 +165,7 @@ TEST(RaidParity, IsCountedByLevel)
 TEST(RaidParity, OfAnUnknownLevelIsRefused)
 {
     const RUN_RESULT result = MachineCall(MachineMake(), [] {
-        NLIBCErrSet(OLD_CODE, "before", 1);
+        RecordReset();
         EXPECT_EQ(RAIDParityDiskCount(0, 4), -1);
         EXPECT_EQ(RAIDParityDiskCount(3, 4), -1);
         EXPECT_EQ(RAIDParityDiskCount(64, 4), -1);

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: MIT
 #include "nurostoragecore/raid_membership.h"
 
+#include "last_error.h"
 #include "nurocore/error.h"
 #include "nurocore/types.h"
 #include "storage_machine.h"
@@ -14,7 +15,6 @@
 namespace
 {
 
-constexpr u32 OLD_CODE = 0xFFFFFF00; // stands in the record before a call
 constexpr int UNTOUCHED = 4711;
 
 // ---- the array of a superblock -----------------------------------------------------------------
@@ -79,7 +79,7 @@ TEST(SuperblockMd, FailsForASuperblockThatNamesNoArray)
     MachineTool(machine, "/sbin/mdadm -E /dev/sda3", {.szOut = "        Version : 1.2\n"});
     const RUN_RESULT result = MachineCall(machine, [] {
         int nMd = UNTOUCHED;
-        NLIBCErrSet(OLD_CODE, "before", 1);
+        RecordReset();
         errno = EXDEV; // nothing that is called on the way sets it
         EXPECT_EQ(RAIDDiskSuperblockMdGet("/dev/sda3", &nMd), -1);
         EXPECT_EQ(nMd, UNTOUCHED);
@@ -93,7 +93,7 @@ TEST(SuperblockMd, RefusesNull)
 {
     const RUN_RESULT result = MachineCall(MachineMake(), [] {
         int nMd = UNTOUCHED;
-        NLIBCErrSet(OLD_CODE, "before", 1);
+        RecordReset();
         EXPECT_EQ(RAIDDiskSuperblockMdGet(nullptr, &nMd), -1);
         EXPECT_EQ(RAIDDiskSuperblockMdGet("/dev/sda3", nullptr), -1);
         EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
@@ -222,7 +222,7 @@ TEST(DiskUsed, RefusesNull)
 {
     const RUN_RESULT result = MachineCall(MachineMake(), [] {
         int nMd = UNTOUCHED;
-        NLIBCErrSet(OLD_CODE, "before", 1);
+        RecordReset();
         EXPECT_EQ(RAIDDiskIsUsedByRAID(nullptr, &nMd), -1);
         EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
         EXPECT_EQ(nMd, UNTOUCHED);
@@ -234,7 +234,7 @@ TEST(DiskUsed, RefusesNull)
 
 void ExpectDetected(const char *szMd, int resultExpected, u32 codeExpected)
 {
-    NLIBCErrSet(OLD_CODE, "before", 1);
+    RecordReset();
     EXPECT_EQ(RAIDIsDetected(szMd), resultExpected);
     EXPECT_EQ(NLIBCErrGet(), codeExpected);
 }

@@ -396,14 +396,13 @@ TEST(RAIDCleanSuperblock, WipesInTheOrderOfTheMap)
         EXPECT_EQ(RAIDCleanSuperblock(&info, UUID_MD2, nullptr), 0);
         EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
     });
-    EXPECT_EQ(TranscriptText(result),
-              TextOf({"/sbin/mdadm -E /dev/sda3", "/sbin/mdadm -E /dev/sdb3",
-                      "/sbin/mdadm -E /dev/sdo3", "/sbin/mdadm -E /dev/sdp3",
-                      "/sbin/mdadm -E /dev/sdq3", "/sbin/mdadm --zero-superblock /dev/sdp3",
-                      "/sbin/mdadm --zero-superblock /dev/sdq3",
-                      "/sbin/mdadm --zero-superblock /dev/sda3",
-                      "/sbin/mdadm --zero-superblock /dev/sdb3",
-                      "/sbin/mdadm --zero-superblock /dev/sdo3"}));
+    EXPECT_EQ(
+        TranscriptText(result),
+        Lines({"/sbin/mdadm -E /dev/sda3", "/sbin/mdadm -E /dev/sdb3", "/sbin/mdadm -E /dev/sdo3",
+               "/sbin/mdadm -E /dev/sdp3", "/sbin/mdadm -E /dev/sdq3",
+               "/sbin/mdadm --zero-superblock /dev/sdp3", "/sbin/mdadm --zero-superblock /dev/sdq3",
+               "/sbin/mdadm --zero-superblock /dev/sda3", "/sbin/mdadm --zero-superblock /dev/sdb3",
+               "/sbin/mdadm --zero-superblock /dev/sdo3"}));
     EXPECT_EQ(LogText(result), WipedTold("sdp3") + WipedTold("sdq3") + WipedTold("sda3") +
                                    WipedTold("sdb3") + WipedTold("sdo3"));
 }
@@ -584,11 +583,10 @@ TEST(RAIDRemove, StopsThenCleans)
         EXPECT_EQ(RAIDRemoveByInfo(&info), 0);
         EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
     });
-    EXPECT_EQ(
-        TranscriptText(result),
-        TextOf({"/sbin/mdadm -E /dev/sdb3", "/sbin/mdadm -S /dev/md2", "/sbin/mdadm -E /dev/sda3",
-                "/sbin/mdadm -E /dev/sdb3", "/sbin/mdadm --zero-superblock /dev/sda3",
-                "/sbin/mdadm --zero-superblock /dev/sdb3"}));
+    EXPECT_EQ(TranscriptText(result), Lines({"/sbin/mdadm -E /dev/sdb3", "/sbin/mdadm -S /dev/md2",
+                                             "/sbin/mdadm -E /dev/sda3", "/sbin/mdadm -E /dev/sdb3",
+                                             "/sbin/mdadm --zero-superblock /dev/sda3",
+                                             "/sbin/mdadm --zero-superblock /dev/sdb3"}));
     EXPECT_EQ(LogText(result), CLEAN_TOLD + WipedTold("sda3") + WipedTold("sdb3"));
 }
 
@@ -604,8 +602,8 @@ TEST(RAIDRemove, TakesTheUuidOfTheRecord)
         EXPECT_EQ(RAIDRemove(&info, nullptr), 0);
     });
     EXPECT_EQ(TranscriptText(result),
-              TextOf({"/sbin/mdadm -S /dev/md2", "/sbin/mdadm -E /dev/sda3",
-                      "/sbin/mdadm -E /dev/sdb3", "/sbin/mdadm --zero-superblock /dev/sdb3"}));
+              Lines({"/sbin/mdadm -S /dev/md2", "/sbin/mdadm -E /dev/sda3",
+                     "/sbin/mdadm -E /dev/sdb3", "/sbin/mdadm --zero-superblock /dev/sdb3"}));
     EXPECT_EQ(LogText(result), CLEAN_TOLD + WipedTold("sdb3"));
 }
 
@@ -669,11 +667,10 @@ TEST(RAIDRemove, AStopThatFailsTwiceIsTriedAgain)
         const RAID_INFO info = RecordOf("/dev/md2", UUID_MD2);
         EXPECT_EQ(RAIDRemoveByInfo(&info), 0);
     });
-    EXPECT_EQ(
-        TranscriptText(result),
-        TextOf({STOP_MD2, "sleep 1", STOP_MD2, "sleep 1", STOP_MD2, "/sbin/mdadm -E /dev/sda3",
-                "/sbin/mdadm -E /dev/sdb3", "/sbin/mdadm --zero-superblock /dev/sda3",
-                "/sbin/mdadm --zero-superblock /dev/sdb3"}));
+    EXPECT_EQ(TranscriptText(result),
+              Lines({STOP_MD2, "sleep 1", STOP_MD2, "sleep 1", STOP_MD2, "/sbin/mdadm -E /dev/sda3",
+                     "/sbin/mdadm -E /dev/sdb3", "/sbin/mdadm --zero-superblock /dev/sda3",
+                     "/sbin/mdadm --zero-superblock /dev/sdb3"}));
     EXPECT_EQ(LogText(result), std::string(STOP_TOLD) + STOP_TOLD + CLEAN_TOLD + WipedTold("sda3") +
                                    WipedTold("sdb3"));
     const std::string szError =
@@ -692,8 +689,8 @@ TEST(RAIDRemove, AStopThatNeverSucceedsTouchesNoSuperblock)
         EXPECT_EQ(RAIDRemoveByInfo(&info), -1);
         EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
     });
-    EXPECT_EQ(TranscriptText(result), TextOf({"/sbin/mdadm -E /dev/sdb3", STOP_MD2, "sleep 1",
-                                              STOP_MD2, "sleep 1", STOP_MD2, "sleep 1"}));
+    EXPECT_EQ(TranscriptText(result), Lines({"/sbin/mdadm -E /dev/sdb3", STOP_MD2, "sleep 1",
+                                             STOP_MD2, "sleep 1", STOP_MD2, "sleep 1"}));
     EXPECT_EQ(LogText(result), std::string(STOP_TOLD) + STOP_TOLD + STOP_TOLD + LIMIT_TOLD);
     EXPECT_EQ(MachineFileRead("/var/log/space_operation_error.log"), std::nullopt);
 }
@@ -707,7 +704,7 @@ TEST(RAIDRemove, WithoutAUuidItOnlyStops)
         const RAID_INFO info = RecordOf("/dev/md2");
         EXPECT_EQ(RAIDRemoveByInfo(&info), 0);
     });
-    EXPECT_EQ(TranscriptText(result), TextOf({"/sbin/mdadm -E /dev/sdb3", STOP_MD2}));
+    EXPECT_EQ(TranscriptText(result), Lines({"/sbin/mdadm -E /dev/sdb3", STOP_MD2}));
     EXPECT_EQ(LogText(result), "<11>raid_remove.cpp:# Disk [/dev/sdb3] in RAID [/dev/md2] has no "
                                "RAID superblock, ret=0\n");
 }
@@ -721,7 +718,7 @@ TEST(RAIDRemove, AnArrayThatDoesNotRunIsStoppedAllTheSame)
         const RAID_INFO info = RecordOf("/dev/md2");
         EXPECT_EQ(RAIDRemoveByInfo(&info), 0);
     });
-    EXPECT_EQ(TranscriptText(result), TextOf({STOP_MD2}));
+    EXPECT_EQ(TranscriptText(result), Lines({STOP_MD2}));
     EXPECT_EQ(LogText(result),
               "<15>raid_info.cpp:# Failed to open /dev/md2, errno=No such file or directory\n"
               "<11>raid_remove.cpp:# Failed to get RAID info [/dev/md2], ret = -1\n");

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: MIT
 #include "nurostoragecore/raid_system.h"
 
+#include "last_error.h"
 #include "nurocore/error.h"
 #include "storage_machine.h"
 
@@ -13,7 +14,6 @@
 namespace
 {
 
-constexpr u32 OLD_CODE = 0xFFFFFF00; // stands in the record before a call
 constexpr u32 UNTOUCHED = 4711;
 constexpr u32 NORMAL = 1;
 constexpr u32 FAILED = 2;
@@ -80,10 +80,10 @@ TEST(SystemDiskDetail, RefusesNull)
             const char *szDisk;
         } const cases[] = {{nullptr, "sda"}, {rootless, "sda"}, {swapless, "sda"}, {pair, nullptr}};
         for (const auto &row : cases) {
-            NLIBCErrSet(OLD_CODE, "before", 1);
+            RecordReset();
             EXPECT_EQ(RAIDSystemDiskStatusDetailGet(row.ppPair, row.szDisk, &state, &state), -1);
             EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
-            NLIBCErrSet(OLD_CODE, "before", 1);
+            RecordReset();
             EXPECT_EQ(RAIDSystemDiskStatusGet(row.ppPair, row.szDisk, &state), -1);
             EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
         }
@@ -113,7 +113,7 @@ TEST(SystemDiskDetail, FailsWhenTheDiskCannotBeSearched)
         RAID_INFO *pair[2] = {InfoMake({{"/dev/sda1", NORMAL}}), InfoMake({})};
         const std::string szDisk = "/dev/" + std::string(128, 'x');
         u32 status = UNTOUCHED;
-        NLIBCErrSet(OLD_CODE, "before", 1);
+        RecordReset();
         EXPECT_EQ(RAIDSystemDiskStatusGet(pair, szDisk.c_str(), &status), -1);
         EXPECT_EQ(status, UNTOUCHED);
         EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
@@ -216,10 +216,10 @@ TEST(SystemDiskStatus, AsksForTheSwapOfEveryMember)
         const RUN_RESULT result = MachineCall(MachineWithConf("maxdisks=4\n"), [root] {
             RAID_INFO *pair[2] = {InfoMake(Members("/dev/sda1", root)),
                                   InfoMake({{"/dev/sda2", NORMAL}})};
-            NLIBCErrSet(OLD_CODE, "before", 1);
+            RecordReset();
             EXPECT_EQ(RAIDSystemDiskStatusGet(pair, "/dev/sda", nullptr), 1);
             EXPECT_EQ(NLIBCErrGet(), ERR_KEY_NOT_FOUND) << root;
-            NLIBCErrSet(OLD_CODE, "before", 1);
+            RecordReset();
             EXPECT_EQ(RAIDSystemDiskStatusGet(pair, "/dev/sdb", nullptr), 0);
             EXPECT_EQ(NLIBCErrGet(), OLD_CODE) << root;
             RAIDInfoPairFree(pair);

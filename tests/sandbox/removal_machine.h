@@ -3,6 +3,7 @@
 
 // What the cases of taking an array down share: disks, reports of superblocks, the commands.
 
+#include "last_error.h"
 #include "sandbox.h"
 
 #include "nurocore/error.h"
@@ -14,13 +15,6 @@
 #include <sstream>
 #include <string>
 #include <vector>
-
-inline constexpr u32 OLD_CODE = 0xFFFFFF00; // stands in the record before a call
-
-inline void RecordReset()
-{
-    NLIBCErrSet(OLD_CODE, "before", 1);
-}
 
 inline constexpr char UUID_MD2[] = "5b1f2c3d:4e5f6071:8293a4b5:00000002";
 inline constexpr char UUID_MD3[] = "5b1f2c3d:4e5f6071:8293a4b5:00000003";
@@ -82,15 +76,6 @@ inline RAID_INFO RecordOf(const std::string &szPath, const std::string &szUuid =
     (void)snprintf(info.szPath, sizeof(info.szPath), "%s", szPath.c_str());
     (void)snprintf(info.szUuid, sizeof(info.szUuid), "%s", szUuid.c_str());
     return info;
-}
-
-inline std::string TextOf(const std::vector<std::string> &lines)
-{
-    std::string szText;
-    for (const std::string &szLine : lines) {
-        szText += szLine + "\n";
-    }
-    return szText;
 }
 
 inline constexpr size_t STAMP_SIZE = sizeof("Nov 05 01:02:03 ") - 1;

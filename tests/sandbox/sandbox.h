@@ -223,6 +223,9 @@ std::string LogText(const RUN_RESULT &result);
 // that is empty or holds blanks or quotes stands in double quotes.
 std::string TranscriptText(const RUN_RESULT &result);
 
+// What is expected of either, one line each.
+std::string Lines(const std::vector<std::string> &lines);
+
 // ---- running -----------------------------------------------------------------------------------
 
 // Lays the machine out and runs the program with these arguments. Every problem fails the test.

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: MIT
 #include "nurostoragecore/space.h"
 
+#include "last_error.h"
 #include "nurocore/error.h"
 #include "nurocore/types.h"
 #include "sandbox.h"
@@ -21,17 +22,11 @@
 namespace
 {
 
-constexpr u32 OLD_CODE = 0xFFFFFF00; // stands in the record before every call
 constexpr char LOG_PATH[] = "/var/log/space_operation_error.log";
 constexpr char OPEN_FAILED[] = "<11>space.cpp:# Fail to open /var/log/space_operation_error.log\n";
 constexpr char STAMP_FORMAT[] = "%b %d %H:%M:%S";
 constexpr size_t STAMP_LENGTH = 15;
 constexpr size_t LINE_LENGTH = 2047;
-
-void RecordReset()
-{
-    NLIBCErrSet(OLD_CODE, "before", 1);
-}
 
 // "Nov 05 07:08:09": what is read as a time and written again is the same text.
 bool IsStamp(const std::string &text)

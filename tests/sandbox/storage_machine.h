@@ -245,15 +245,6 @@ inline std::string CommandsBeside(const RUN_RESULT &result, const std::vector<st
     return TranscriptText(chosen);
 }
 
-inline std::string Lines(const std::vector<std::string> &lines)
-{
-    std::string szText;
-    for (const std::string &szLine : lines) {
-        szText += szLine + "\n";
-    }
-    return szText;
-}
-
 // The lines of one source file, in order, with process numbers masked.
 inline std::string LogOf(const RUN_RESULT &result, const std::string &szFile)
 {

@@ -3,6 +3,7 @@
 // What a library function answers when an allocation fails in the middle of it: the lists and the
 // readers that fill them.
 #include "hwcontrol/disk_port.h"
+#include "last_error.h"
 #include "nurocore/error.h"
 #include "nurocore/file.h"
 #include "nurocore/keyvalue.h"
@@ -25,7 +26,6 @@
 namespace
 {
 
-constexpr u32 OLD_CODE = 0xFFFFFF00; // stands in the record before a call
 constexpr int CALLS_MAX = 40;
 constexpr int LONG_LENGTH = 300; // two of them do not fit a new list
 
@@ -68,7 +68,7 @@ struct LIST_SCOPE {
             (void)NLIBCSzListPush(&p, szItem);
         }
         NLIBCSzListSort(p, fMode);
-        NLIBCErrSet(OLD_CODE, "before", 1);
+        RecordReset();
     }
     LIST_SCOPE(const LIST_SCOPE &) = delete;
     LIST_SCOPE &operator=(const LIST_SCOPE &) = delete;
@@ -172,7 +172,7 @@ TEST(WithoutMemory, ALineMatchesNoKey)
     MACHINE machine = MachineMake();
     machine.faults = {{.szFunction = "strndup", .error = ENOMEM}};
     const RUN_RESULT result = MachineCall(machine, [] {
-        NLIBCErrSet(OLD_CODE, "before", 1);
+        RecordReset();
         EXPECT_EQ(NLIBCFileLineKeyMatch("key=value\n", "key"), 0);
         EXPECT_EQ(NLIBCFileLineKeyMatch("key=value\n", "key"), 1);
         EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
@@ -223,7 +223,7 @@ TEST(WithoutMemory, NoToolIsPiped)
     MachineTool(machine, "/sbin/pvs", {.nTimes = ANY_TIMES});
     machine.faults = {{.szFunction = "calloc", .error = ENOMEM, .fGoOn = true}};
     const RUN_RESULT result = MachineCall(machine, [] {
-        NLIBCErrSet(OLD_CODE, "before", 1);
+        RecordReset();
         EXPECT_EQ(NLIBCPopen("/sbin/pvs", "r", NULL), nullptr);
         EXPECT_EQ(NLIBCErrGet(), ERR_OUT_OF_MEMORY);
     });
@@ -246,7 +246,7 @@ TEST(WithoutMemory, APipeWithoutARecordStaysOpen)
         (void)close(fdFirst);
         (void)close(fdSecond);
         (void)close(fdThird);
-        NLIBCErrSet(OLD_CODE, "before", 1);
+        RecordReset();
         EXPECT_EQ(NLIBCPopenV(szTool, "r", argv), nullptr);
         EXPECT_EQ(NLIBCErrGet(), ERR_OUT_OF_MEMORY);
         EXPECT_EQ(fcntl(fdFirst, F_GETFD), FD_CLOEXEC);
@@ -259,15 +259,15 @@ TEST(WithoutMemory, APipeWithoutARecordStaysOpen)
 
 TEST(Lists, NoListIsNotTouched)
 {
-    NLIBCErrSet(OLD_CODE, "before", 1);
+    RecordReset();
     NLIBCSzListSort(nullptr, SZLIST_SORTED);
     EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
     NLIBCSzListCompact(nullptr);
     EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
-    NLIBCErrSet(OLD_CODE, "before", 1);
+    RecordReset();
     NLIBCSzListClear(nullptr);
     EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
-    NLIBCErrSet(OLD_CODE, "before", 1);
+    RecordReset();
     EXPECT_EQ(NLIBCSzListDump(nullptr), -1);
     EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
 }

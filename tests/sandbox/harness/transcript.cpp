@@ -252,6 +252,15 @@ void TranscriptTake(const MACHINE &machine, RUN_RESULT &result)
     RowProblemsAdd(machine, result);
 }
 
+std::string Lines(const std::vector<std::string> &lines)
+{
+    std::string szText;
+    for (const std::string &szLine : lines) {
+        szText += szLine + "\n";
+    }
+    return szText;
+}
+
 std::string LogText(const RUN_RESULT &result)
 {
     std::string szText;
