@@ -331,7 +331,8 @@ TEST(ConfSupportDualHead, IsAskedOnceInAProcess)
 TEST(ConfSupportDualHead, AnswersAllTheSameWhenNoMarkerCanBeLeft)
 {
     MACHINE machine = MachineWithConf("support_dual_head=yes\n");
-    MachineRemove(machine, "/tmp");
+    MachineLink(machine, MARKER, "/no/such/file");
+    MachineLink(machine, MARKER_NOT, "/no/such/file");
     const RUN_RESULT result = MachineCall(machine, [] {
         EXPECT_EQ(NLIBCConfSupportDualHead(), 1);
         EXPECT_EQ(NLIBCConfSupportDualHead(), 1);

@@ -167,6 +167,8 @@ char **NLIBCArgvAlloc(const char *szPath, va_list arguments)
     va_list counted;
     va_copy(counted, arguments);
     size_t nArgument = 0;
+    // The analyzer loses sight of what va_copy has set.
+    // NOLINTNEXTLINE(clang-analyzer-valist.Uninitialized)
     while (va_arg(counted, char *) != nullptr) {
         nArgument++;
     }
