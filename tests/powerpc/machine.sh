@@ -58,9 +58,9 @@ powerpc_programs() {
         szApplet=$szRoot/usr/${szApplet#usr/}
         [ -e "$szApplet" ] || ln -s /usr/bin/busybox "$szApplet"
     done < <(qemu-ppc-static "$szRoot/usr/bin/busybox" --list-full | grep -v '^linuxrc$')
-    # Everything is built into this kernel. Where the cases make a file system, any will do.
+    # Everything is built into this kernel, which knows one kind of file system.
     powerpc_script '' "$szRoot/usr/sbin/modprobe"
-    powerpc_script 'exec mkfs.ext2 "$@"' "$szRoot/usr/sbin/mkfs.ext4"
+    powerpc_script 'exec mke2fs -t ext2 "$@"' "$szRoot/usr/sbin/mkfs.ext4"
 }
 
 powerpc_base_build() {

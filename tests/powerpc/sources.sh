@@ -18,6 +18,7 @@ DEBIAN_SUITE=bookworm
 # Each source package, and the function that makes what is needed of it.
 declare -A SOURCE_BUILDS=(
     [busybox]=busybox_build
+    [e2fsprogs]=e2fsprogs_build
     [mdadm]=mdadm_build
     [strace]=strace_build
     [util-linux]=util_linux_build
@@ -26,6 +27,8 @@ declare -A SOURCE_BUILDS=(
 # What was made, and where it lies inside.
 GUEST_PROGRAMS=(
     busybox/busybox:/usr/bin/busybox
+    e2fsprogs/e2fsck/e2fsck:/usr/sbin/e2fsck
+    e2fsprogs/misc/mke2fs:/usr/sbin/mke2fs
     mdadm/mdadm:/usr/sbin/mdadm
     strace/src/strace:/usr/bin/strace
     util-linux/sfdisk:/usr/sbin/sfdisk.stock
@@ -85,6 +88,14 @@ busybox_build() {
     sed -i -e 's/^CONFIG_TC=y/# CONFIG_TC is not set/' \
         -e 's/^# CONFIG_STATIC is not set/CONFIG_STATIC=y/' "$szSource/.config"
     "${make[@]}" busybox
+}
+
+e2fsprogs_build() {
+    cd "$1" || return
+    ./configure "--host=$CROSS" --prefix=/usr --disable-nls --disable-fuse2fs --disable-debugfs \
+        --disable-defrag --disable-imager --disable-resizer --disable-uuidd \
+        --disable-e2initrd-helper CFLAGS=-O2 &&
+        make -j "$SOURCE_JOBS" libs && make -C e2fsck e2fsck && make -C misc mke2fs
 }
 
 mdadm_build() {
