@@ -6,6 +6,7 @@
 #include "nurocore/pipe.h"
 #include "nurocore/process.h"
 #include "sandbox.h"
+#include "streams.h"
 
 #include <cerrno>
 #include <csignal>
@@ -20,15 +21,6 @@ namespace
 
 constexpr char CHILD[] = "0.1";
 constexpr int STATUS_NOT_EXECUTED = 127;
-
-std::string StreamRead(FILE *pStream)
-{
-    std::string szText;
-    for (int ch = fgetc(pStream); ch != EOF; ch = fgetc(pStream)) {
-        szText += static_cast<char>(ch);
-    }
-    return szText;
-}
 
 // The tool itself cannot say anything to the terminal then.
 TEST(ChildStreams, AToolWhoseOutputCannotBePipedIsNotRun)
@@ -124,6 +116,8 @@ TEST(ChildWait, OfADaemonTellsWhyThereIsNoStatus)
         machine.fMayLeaveChildren = true;
         machine.faults = {{.szFunction = "waitpid", .error = row.error, .szProcess = "0"}};
         MachineCall(machine, [&row] {
+            int fds[2];
+            ASSERT_EQ(pipe(fds), 0);
             RecordReset();
             const int result = NLIBCFork(FORK_DAEMONIZE);
             if (result == 0) {
@@ -131,6 +125,11 @@ TEST(ChildWait, OfADaemonTellsWhyThereIsNoStatus)
             }
             EXPECT_EQ(result, row.result);
             EXPECT_EQ(NLIBCErrGet(), row.code);
+            // The record of the run is whole when the last of its processes has ended.
+            char ch = 0;
+            EXPECT_EQ(close(fds[1]), 0);
+            EXPECT_EQ(read(fds[0], &ch, 1), 0);
+            EXPECT_EQ(close(fds[0]), 0);
         });
     }
 }
