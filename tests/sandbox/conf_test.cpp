@@ -19,13 +19,6 @@ namespace
 constexpr char MAX_DISKS_FAILED[] =
     "<11>conf.cpp:# Failed to NLIBCFileGetKeyValue(/etc.defaults/nuroinfo.conf,maxdisks)\n";
 
-MACHINE MachineWithConf(const std::string &conf)
-{
-    MACHINE machine = MachineMake();
-    MachineConf(machine, conf);
-    return machine;
-}
-
 MACHINE MachineWithoutConf()
 {
     MACHINE machine = MachineMake();

@@ -5,10 +5,10 @@
 #include "last_error.h"
 #include "nurocore/error.h"
 #include "sandbox.h"
+#include "streams.h"
 
 #include <cerrno>
 #include <climits>
-#include <fcntl.h>
 #include <gtest/gtest.h>
 #include <string>
 #include <syslog.h>
@@ -29,15 +29,6 @@ MACHINE MachineWithPorts()
     MachineFile(machine, "/sys/class/scsi_host/host0/nuro_pm_info",
                 "nuro_device_list=/dev/sdg,/dev/sdha,/dev/sdhb\n");
     return machine;
-}
-
-int DescriptorsCount()
-{
-    int nOpen = 0;
-    for (int fd = 0; fd < 64; fd++) {
-        nOpen += fcntl(fd, F_GETFD) != -1;
-    }
-    return nOpen;
 }
 
 struct PARSE_CASE {

@@ -37,13 +37,6 @@ std::string Letters(size_t n)
     return name;
 }
 
-MACHINE MachineWithConf(const std::string &conf)
-{
-    MACHINE machine = MachineMake();
-    MachineConf(machine, conf);
-    return machine;
-}
-
 // The disks that the expansion unit behind a SCSI host reports.
 void UnitAdd(MACHINE &machine, const std::string &host, const std::string &devices)
 {

@@ -6,13 +6,13 @@
 #include "nurocore/szlist.h"
 #include "nurocore/types.h"
 #include "sandbox.h"
+#include "streams.h"
 
 #include <cerrno>
 #include <climits>
 #include <csignal>
 #include <cstdio>
 #include <cstdlib>
-#include <fcntl.h>
 #include <gtest/gtest.h>
 #include <string>
 #include <unistd.h>
@@ -28,24 +28,6 @@ MACHINE MachineWithFault(const MACHINE_FAULT &fault)
     MACHINE machine = MachineMake();
     machine.faults = {fault};
     return machine;
-}
-
-int DescriptorsCount()
-{
-    int nOpen = 0;
-    for (int fd = 0; fd < 64; fd++) {
-        nOpen += fcntl(fd, F_GETFD) != -1;
-    }
-    return nOpen;
-}
-
-std::string StreamRead(FILE *pStream)
-{
-    std::string text;
-    for (int ch = fgetc(pStream); ch != EOF; ch = fgetc(pStream)) {
-        text += static_cast<char>(ch);
-    }
-    return text;
 }
 
 // ---- fork --------------------------------------------------------------------------------------

@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: MIT
-#include "sandbox.h"
-
-#include "nurocore/error.h"
 #include "nurostoragecore/raid_disk.h"
+
+#include "last_error.h"
+#include "sandbox.h"
 
 #include <gtest/gtest.h>
 
@@ -13,19 +13,12 @@
 namespace
 {
 
-constexpr u32 CODE_BEFORE = 0x4200; // no code of the house: shows that nobody wrote the record
 constexpr const char *MEMBER = "/sys/block/md2/md/dev-sda3";
 
 // The order of the fields.
 static_assert(offsetof(RAID_DISK, szPath) == 0 && sizeof(RAID_DISK::szPath) == 128);
 static_assert(offsetof(RAID_DISK, state) == 128 && offsetof(RAID_DISK, slot) == 132);
 static_assert(offsetof(RAID_DISK, slot) < offsetof(RAID_DISK, pNext));
-
-void CodeReset()
-{
-    NLIBCErrSet(CODE_BEFORE, "before", 1);
-    errno = 0;
-}
 
 MACHINE MembersMake(const std::vector<MACHINE_MEMBER> &members)
 {
@@ -48,11 +41,11 @@ void WithMember(const std::string &szState, const std::string &szSlot,
 {
     SCOPED_TRACE("state \"" + szState + "\", slot \"" + szSlot + "\"");
     const RUN_RESULT result = MachineCall(MembersMake({{"sda3", szState, szSlot}}), [&] {
-        CodeReset();
+        RecordReset();
         RAID_DISK *pDisk = nullptr;
         ASSERT_EQ(RAIDDiskCreate(MEMBER, &pDisk), 0);
         ASSERT_NE(pDisk, nullptr);
-        EXPECT_EQ(NLIBCErrGet(), CODE_BEFORE);
+        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
         body(*pDisk);
         RAIDDiskListFree(pDisk);
     });
@@ -63,7 +56,7 @@ void ExpectMemberFails(const MACHINE &machine, const char *szDir, u32 code,
                        const std::string &szLog)
 {
     const RUN_RESULT result = MachineCall(machine, [&] {
-        CodeReset();
+        RecordReset();
         RAID_DISK *pDisk = nullptr;
         EXPECT_EQ(RAIDDiskCreate(szDir, &pDisk), -1);
         EXPECT_EQ(pDisk, nullptr);
@@ -229,16 +222,16 @@ TEST(RaidDiskFailure, NullIsABadParameter)
     const RUN_RESULT result = MachineCall(MembersMake({{"sda3"}}), [] {
         RAID_DISK *pDisk = nullptr;
         u32 state = 0;
-        CodeReset();
+        RecordReset();
         EXPECT_EQ(RAIDDiskCreate(nullptr, &pDisk), -1);
         EXPECT_EQ(NLIBCErrGet(), 0x0D00U);
-        CodeReset();
+        RecordReset();
         EXPECT_EQ(RAIDDiskCreate(MEMBER, nullptr), -1);
         EXPECT_EQ(NLIBCErrGet(), 0x0D00U);
-        CodeReset();
+        RecordReset();
         EXPECT_EQ(RAIDDiskStatusGet(nullptr, &state), -1);
         EXPECT_EQ(NLIBCErrGet(), 0x0D00U);
-        CodeReset();
+        RecordReset();
         EXPECT_EQ(RAIDDiskStatusGet(MEMBER, nullptr), -1);
         EXPECT_EQ(NLIBCErrGet(), 0x0D00U);
     });
@@ -297,11 +290,11 @@ TEST(RaidDiskFailure, ASpareWhoseSlotDoesNotOpen)
 // The only failure that leaves the code as it was.
 TEST(RaidDiskFailure, ASlotThatDoesNotOpen)
 {
-    ExpectMemberFails(MembersMake({{"sda3", "in_sync\n", NO_FILE}}), MEMBER, CODE_BEFORE,
+    ExpectMemberFails(MembersMake({{"sda3", "in_sync\n", NO_FILE}}), MEMBER, OLD_CODE,
                       "<11>raid_disk.cpp:# failed to fopen /sys/block/md2/md/dev-sda3/slot, "
                       "errno=No such file or directory\n"
                       "<15>raid_disk.cpp:# Failed to get slot of /sys/block/md2/md/dev-sda3, "
-                      "errno=0X4200\n");
+                      "errno=0XFFFFFF00\n");
 }
 
 TEST(RaidDiskFailure, AnEmptySlot)
@@ -336,14 +329,14 @@ TEST(RaidDiskAttr, TheFirstLineUpTo31Characters)
     MachineFile(machine, "/sys/long", "0123456789012345678901234567890123456789\n");
     const RUN_RESULT result = MachineCall(machine, [] {
         char szBuf[RAID_ATTR_SIZE] = "";
-        CodeReset();
+        RecordReset();
         EXPECT_EQ(RAIDDiskAttrRead("/sys/short", szBuf), 0);
         EXPECT_STREQ(szBuf, "one\n");
         EXPECT_EQ(RAIDDiskAttrRead("/sys/bare", szBuf), 0);
         EXPECT_STREQ(szBuf, "one");
         EXPECT_EQ(RAIDDiskAttrRead("/sys/long", szBuf), 0);
         EXPECT_STREQ(szBuf, "0123456789012345678901234567890");
-        EXPECT_EQ(NLIBCErrGet(), CODE_BEFORE);
+        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
     });
     EXPECT_EQ(LogText(result), "");
 }
@@ -354,16 +347,16 @@ TEST(RaidDiskAttr, Fails)
     MachineFile(machine, "/sys/empty", "");
     const RUN_RESULT result = MachineCall(machine, [] {
         char szBuf[RAID_ATTR_SIZE] = "";
-        CodeReset();
+        RecordReset();
         EXPECT_EQ(RAIDDiskAttrRead(nullptr, szBuf), -1);
         EXPECT_EQ(NLIBCErrGet(), 0x0D00U);
-        CodeReset();
+        RecordReset();
         EXPECT_EQ(RAIDDiskAttrRead("/sys/empty", nullptr), -1);
         EXPECT_EQ(NLIBCErrGet(), 0x0D00U);
-        CodeReset();
+        RecordReset();
         EXPECT_EQ(RAIDDiskAttrRead("/sys/missing", szBuf), -1);
         EXPECT_EQ(NLIBCErrGet(), 0x0900U);
-        CodeReset();
+        RecordReset();
         EXPECT_EQ(RAIDDiskAttrRead("/sys/empty", szBuf), -1);
         EXPECT_EQ(NLIBCErrGet(), 0x0A00U);
     });
@@ -384,12 +377,12 @@ TEST(RaidDiskList, TheNameThatSortsLastComesFirst)
     MachineFile(machine, "/sys/block/md2/md/device", "");
     MachineMdAdd(machine, {.nMd = 22, .members = {{"sdc3"}}});
     const RUN_RESULT result = MachineCall(machine, [] {
-        CodeReset();
+        RecordReset();
         RAID_DISK *pDisks = nullptr;
         ASSERT_EQ(RAIDDiskListGet("/dev/md2", &pDisks), 0);
         EXPECT_EQ(NamesOf(pDisks), "/dev/sdb3 /dev/sda3 ");
         EXPECT_EQ(pDisks->slot, 1);
-        EXPECT_EQ(NLIBCErrGet(), CODE_BEFORE);
+        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
         RAIDDiskListFree(pDisks);
     });
     EXPECT_EQ(LogText(result), "");
@@ -400,12 +393,12 @@ TEST(RaidDiskList, WithoutMembersTheListIsLeftAlone)
     const RUN_RESULT result = MachineCall(MembersMake({}), [] {
         RAID_DISK disk = MemberMake("/dev/sdz9");
         RAID_DISK *pDisks = &disk;
-        CodeReset();
+        RecordReset();
         EXPECT_EQ(RAIDDiskListGet("/dev/md2", &pDisks), 0);
         EXPECT_EQ(pDisks, &disk);
         EXPECT_EQ(RAIDDiskListGet("/dev/md77", &pDisks), 0);
         EXPECT_EQ(pDisks, &disk);
-        EXPECT_EQ(NLIBCErrGet(), CODE_BEFORE);
+        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
     });
     EXPECT_EQ(LogText(result), "");
 }
@@ -449,10 +442,10 @@ TEST(RaidDiskList, NullIsABadParameter)
 {
     const RUN_RESULT result = MachineCall(MembersMake({{"sda3"}}), [] {
         RAID_DISK *pDisks = nullptr;
-        CodeReset();
+        RecordReset();
         EXPECT_EQ(RAIDDiskListGet(nullptr, &pDisks), -1);
         EXPECT_EQ(NLIBCErrGet(), 0x0D00U);
-        CodeReset();
+        RecordReset();
         EXPECT_EQ(RAIDDiskListGet("/dev/md2", nullptr), -1);
         EXPECT_EQ(NLIBCErrGet(), 0x0D00U);
     });
@@ -464,7 +457,7 @@ TEST(RaidDiskList, AnotherPathIsRefused)
     for (const char *const szPath : {"/dev/sda", "/dev/md", "md2", ""}) {
         const RUN_RESULT result = MachineCall(MembersMake({{"sda3"}}), [&] {
             RAID_DISK *pDisks = nullptr;
-            CodeReset();
+            RecordReset();
             EXPECT_EQ(RAIDDiskListGet(szPath, &pDisks), -1);
             EXPECT_EQ(pDisks, nullptr);
             EXPECT_EQ(NLIBCErrGet(), 0xBE00U);
@@ -498,11 +491,11 @@ TEST(RaidDiskPush, PutsTheRecordInFront)
         RAID_DISK first = MemberMake("/dev/sda1");
         RAID_DISK second = MemberMake("/dev/sdb1");
         RAID_DISK *pDisks = nullptr;
-        CodeReset();
+        RecordReset();
         RAIDDiskListPush(&pDisks, &first);
         RAIDDiskListPush(&pDisks, &second);
         EXPECT_EQ(NamesOf(pDisks), "/dev/sdb1 /dev/sda1 ");
-        EXPECT_EQ(NLIBCErrGet(), CODE_BEFORE);
+        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
     });
 }
 
@@ -511,11 +504,11 @@ TEST(RaidDiskPush, BadArgumentsChangeNothing)
     const RUN_RESULT result = MachineCall(MachineMake(), [] {
         RAID_DISK disk = MemberMake("/dev/sda1");
         RAID_DISK *pDisks = &disk;
-        CodeReset();
+        RecordReset();
         RAIDDiskListPush(&pDisks, nullptr);
         EXPECT_EQ(NLIBCErrGet(), 0x0200U);
         EXPECT_EQ(NamesOf(pDisks), "/dev/sda1 ");
-        CodeReset();
+        RecordReset();
         RAIDDiskListPush(nullptr, &disk);
         EXPECT_EQ(NLIBCErrGet(), 0x0200U);
         EXPECT_EQ(disk.pNext, nullptr);
@@ -540,7 +533,7 @@ TEST(RaidDiskSearch, FindsTheDiskWhateverThePartition)
             {"/dev/sd", nullptr},      {"/dev/mmcblk1", nullptr}, {"", nullptr},
             {"/dev/sdaa", nullptr},
         };
-        CodeReset();
+        RecordReset();
         for (const auto &search : searches) {
             SCOPED_TRACE(search.szName);
             RAID_DISK *pFound = nullptr;
@@ -550,7 +543,7 @@ TEST(RaidDiskSearch, FindsTheDiskWhateverThePartition)
             EXPECT_EQ(RAIDDiskListSearch(&head, search.szName, nullptr),
                       search.pFound != nullptr ? 1 : 0);
         }
-        EXPECT_EQ(NLIBCErrGet(), CODE_BEFORE);
+        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
     });
 }
 
@@ -559,9 +552,9 @@ TEST(RaidDiskSearch, AnEmptyListHoldsNothingAndANullNameIsRefused)
     const RUN_RESULT result = MachineCall(MachineMake(), [] {
         RAID_DISK disk = MemberMake("/dev/sda3");
         RAID_DISK *pFound = nullptr;
-        CodeReset();
+        RecordReset();
         EXPECT_EQ(RAIDDiskListSearch(nullptr, "/dev/sda", &pFound), 0);
-        EXPECT_EQ(NLIBCErrGet(), CODE_BEFORE);
+        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
         EXPECT_EQ(RAIDDiskListSearch(&disk, nullptr, &pFound), -1);
         EXPECT_EQ(NLIBCErrGet(), 0x0D00U);
         EXPECT_EQ(pFound, nullptr);
@@ -604,9 +597,9 @@ TEST(RaidDiskSearch, BothNamesAreCutForEachMember)
 TEST(RaidDiskFree, NothingCanBeFreed)
 {
     MachineCall(MachineMake(), [] {
-        CodeReset();
+        RecordReset();
         RAIDDiskListFree(nullptr);
-        EXPECT_EQ(NLIBCErrGet(), CODE_BEFORE);
+        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
     });
 }
 
@@ -656,10 +649,10 @@ TEST(SyncAction, TheTextIsAPrefixOfItsWord)
         MachineMdAdd(machine, {.nMd = 2, .szSyncAction = one.szText});
         const RUN_RESULT result = MachineCall(machine, [&] {
             int action = LEFT_ALONE;
-            CodeReset();
+            RecordReset();
             EXPECT_EQ(RAIDSyncActionGet(2, &action), one.result);
             EXPECT_EQ(action, one.action);
-            EXPECT_EQ(NLIBCErrGet(), CODE_BEFORE);
+            EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
         });
         EXPECT_EQ(LogText(result), "");
     }
@@ -671,12 +664,12 @@ TEST(SyncAction, Fails)
     MachineMdAdd(machine, {.nMd = 2, .szSyncAction = ""});
     const RUN_RESULT result = MachineCall(machine, [] {
         int action = 99;
-        CodeReset();
+        RecordReset();
         EXPECT_EQ(RAIDSyncActionGet(-1, &action), -1);
         EXPECT_EQ(RAIDSyncActionGet(3, &action), -1);
         EXPECT_EQ(RAIDSyncActionGet(2, &action), -1);
         EXPECT_EQ(action, 99);
-        EXPECT_EQ(NLIBCErrGet(), CODE_BEFORE);
+        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
         EXPECT_EQ(RAIDSyncActionGet(2, nullptr), -1);
         EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
     });

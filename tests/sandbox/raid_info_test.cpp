@@ -1,8 +1,9 @@
 // SPDX-License-Identifier: MIT
-#include "sandbox.h"
-
-#include "nurocore/error.h"
 #include "nurostoragecore/raid_info.h"
+
+#include "last_error.h"
+#include "sandbox.h"
+#include "streams.h"
 
 #include <gtest/gtest.h>
 
@@ -17,7 +18,6 @@
 namespace
 {
 
-constexpr u32 CODE_BEFORE = 0x4200; // no code of the house: shows that nobody wrote the record
 constexpr u64 GIB = 1ULL << 30;
 
 // The order of the fields.
@@ -47,21 +47,6 @@ MACHINE ArrayMake(const MACHINE_MD &md)
     return machine;
 }
 
-void CodeReset()
-{
-    NLIBCErrSet(CODE_BEFORE, "before", 1);
-    errno = 0;
-}
-
-int DescriptorsCount()
-{
-    int nOpen = 0;
-    for (int fd = 0; fd < 64; fd++) {
-        nOpen += fcntl(fd, F_GETFD) != -1;
-    }
-    return nOpen;
-}
-
 // The query fails with this code and these lines, hands nothing out and leaves nothing open.
 void ExpectQueryFails(const MACHINE &machine, const char *szPath, u32 code,
                       const std::string &szLog)
@@ -71,7 +56,7 @@ void ExpectQueryFails(const MACHINE &machine, const char *szPath, u32 code,
         RAID_INFO *pInfo = &before;
         openlog(nullptr, LOG_NDELAY, LOG_USER); // the log's own descriptor is none of the query's
         const int nOpen = DescriptorsCount();
-        CodeReset();
+        RecordReset();
         EXPECT_EQ(RAIDInfoGet(szPath, &pInfo), -1);
         EXPECT_EQ(DescriptorsCount(), nOpen);
         EXPECT_EQ(pInfo, &before);
@@ -90,13 +75,13 @@ void WithInfo(const MACHINE_MD &md, const std::function<void(const RAID_INFO &)>
 {
     const std::string szPath = "/dev/md" + std::to_string(md.nMd);
     MachineCall(ArrayMake(md), [&] {
-        CodeReset();
+        RecordReset();
         RAID_INFO *pInfo = nullptr;
         const int nOpen = DescriptorsCount();
         ASSERT_EQ(RAIDInfoGet(szPath.c_str(), &pInfo), 1);
         ASSERT_NE(pInfo, nullptr);
         EXPECT_EQ(DescriptorsCount(), nOpen);
-        EXPECT_EQ(NLIBCErrGet(), CODE_BEFORE);
+        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
         body(*pInfo);
         RAIDInfoFree(pInfo);
     });
@@ -108,7 +93,7 @@ RUN_RESULT WithArray(const MACHINE_MD &md, const std::function<void(int fd)> &bo
     return MachineCall(ArrayMake(md), [&] {
         const int fd = open(("/dev/md" + std::to_string(md.nMd)).c_str(), O_RDONLY);
         ASSERT_GE(fd, 0);
-        CodeReset();
+        RecordReset();
         body(fd);
         close(fd);
     });
@@ -250,9 +235,9 @@ TEST(RaidInfo, TheNodeIsOpenedForReading)
 TEST(RaidInfo, FreeingNothingIsAllowed)
 {
     MachineCall(MachineMake(), [] {
-        CodeReset();
+        RecordReset();
         RAIDInfoFree(nullptr);
-        EXPECT_EQ(NLIBCErrGet(), CODE_BEFORE);
+        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
     });
 }
 
@@ -350,7 +335,7 @@ TEST(ComponentSize, TheFileIsANumberOfKib)
         SCOPED_TRACE(one.szText);
         const RUN_RESULT result = WithArray({.nMd = 2, .szComponentSize = one.szText}, [&](int fd) {
             EXPECT_EQ(RAIDComponentSizeGet(fd), one.nSector);
-            EXPECT_EQ(NLIBCErrGet(), CODE_BEFORE);
+            EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
         });
         EXPECT_EQ(LogText(result), "");
     }
@@ -504,9 +489,9 @@ TEST(ComponentSize, WithoutAListThereIsNoSuchDriver)
     MACHINE machine = PartitionableMake("");
     MachineRemove(machine, "/proc/devices");
     const RUN_RESULT result = MachineCall(machine, [] {
-        CodeReset();
+        RecordReset();
         EXPECT_EQ(ComponentSizeOfMd9(), PLAIN);
-        EXPECT_EQ(NLIBCErrGet(), CODE_BEFORE);
+        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
     });
     EXPECT_EQ(LogText(result), "");
 }
@@ -537,11 +522,11 @@ TEST(RaidInfoFailure, NullIsABadParameter)
 {
     const RUN_RESULT result = MachineCall(ArrayMake({.nMd = 2}), [] {
         RAID_INFO *pInfo = nullptr;
-        CodeReset();
+        RecordReset();
         EXPECT_EQ(RAIDInfoGet(nullptr, &pInfo), -1);
         EXPECT_EQ(NLIBCErrGet(), 0x0D00U);
         EXPECT_EQ(pInfo, nullptr);
-        CodeReset();
+        RecordReset();
         EXPECT_EQ(RAIDInfoGet("/dev/md2", nullptr), -1);
         EXPECT_EQ(NLIBCErrGet(), 0x0D00U);
     });
@@ -673,16 +658,16 @@ TEST(RaidRequest, NullIsABadParameter)
         RAID_REBUILD_STATUS rebuild = {};
         EXPECT_EQ(RAIDIoctlInfo(fd, nullptr), -1);
         EXPECT_EQ(NLIBCErrGet(), 0x0D00U);
-        CodeReset();
+        RecordReset();
         EXPECT_EQ(RAIDIoctlSize(fd, nullptr), -1);
         EXPECT_EQ(NLIBCErrGet(), 0x0D00U);
-        CodeReset();
+        RecordReset();
         EXPECT_EQ(RAIDIoctlStatus(fd, nullptr), -1);
         EXPECT_EQ(NLIBCErrGet(), 0x0D00U);
-        CodeReset();
+        RecordReset();
         EXPECT_EQ(RAIDRebuildStatusGet(fd, nullptr), -1);
         EXPECT_EQ(NLIBCErrGet(), 0x0D00U);
-        CodeReset();
+        RecordReset();
         EXPECT_EQ(RAIDRebuildStatusGet(-1, &rebuild), -1);
         EXPECT_EQ(NLIBCErrGet(), 0x0D00U);
     });
@@ -701,7 +686,7 @@ TEST(RaidRequest, TheArrayInformationIsTheDriversRecord)
         EXPECT_EQ(array.size, 77);
         EXPECT_EQ(array.raid_disks, 5);
         EXPECT_EQ(array.spare_disks, 1);
-        EXPECT_EQ(NLIBCErrGet(), CODE_BEFORE);
+        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
     });
 }
 

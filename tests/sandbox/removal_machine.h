@@ -6,7 +6,6 @@
 #include "last_error.h"
 #include "sandbox.h"
 
-#include "nurocore/error.h"
 #include "nurostoragecore/raid_info.h"
 
 #include <cstddef>

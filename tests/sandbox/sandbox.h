@@ -157,8 +157,9 @@ void MachineLink(MACHINE &machine, const std::string &szPath, const std::string 
 // Takes a file or folder, with all below it, out of the machine.
 void MachineRemove(MACHINE &machine, const std::string &szPath);
 
-// /etc.defaults/nuroinfo.conf.
+// /etc.defaults/nuroinfo.conf, and a machine that has nothing else.
 void MachineConf(MACHINE &machine, const std::string &szText);
+MACHINE MachineWithConf(const std::string &szText);
 
 // A disk: /sys/block/NAME, /dev/NAME, its line in /proc/partitions.
 void MachineDiskAdd(MACHINE &machine, const std::string &szDisk, std::uint64_t nSector = 12582912);

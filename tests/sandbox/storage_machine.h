@@ -50,13 +50,6 @@ inline constexpr char CONF_TWO_UNITS[] = "supportraid=\"yes\"\n"
                                          "esataportcfg=\"0x60\"\n"
                                          "internalportcfg=\"0xf\"\n";
 
-inline MACHINE MachineWithConf(const std::string &szConf)
-{
-    MACHINE machine = MachineMake();
-    MachineConf(machine, szConf);
-    return machine;
-}
-
 inline void ExpansionUnitAdd(MACHINE &machine, const std::string &szHost,
                              const std::string &szDevices)
 {

@@ -95,6 +95,13 @@ void MachineConf(MACHINE &machine, const std::string &szText)
     MachineFile(machine, CONF_PATH, szText);
 }
 
+MACHINE MachineWithConf(const std::string &szText)
+{
+    MACHINE machine = MachineMake();
+    MachineConf(machine, szText);
+    return machine;
+}
+
 void MachineDiskAdd(MACHINE &machine, const std::string &szDisk, std::uint64_t nSector)
 {
     MachineFile(machine, "/sys/block/" + szDisk + "/size", std::to_string(nSector) + "\n");
