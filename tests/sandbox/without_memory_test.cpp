@@ -257,19 +257,4 @@ TEST(WithoutMemory, APipeWithoutARecordStaysOpen)
     EXPECT_EQ(TranscriptText(result), "fault calloc 1\n");
 }
 
-TEST(Lists, NoListIsNotTouched)
-{
-    RecordReset();
-    NLIBCSzListSort(nullptr, SZLIST_SORTED);
-    EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
-    NLIBCSzListCompact(nullptr);
-    EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
-    RecordReset();
-    NLIBCSzListClear(nullptr);
-    EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
-    RecordReset();
-    EXPECT_EQ(NLIBCSzListDump(nullptr), -1);
-    EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
-}
-
 } // namespace

@@ -1,19 +1,17 @@
 // SPDX-License-Identifier: MIT
 #include "hwcontrol/disk_name.h"
 
-#include "nurocore/error.h"
+#include "test_error.h"
 
 #include <array>
 #include <climits>
 #include <cstring>
-#include <gtest/gtest.h>
 #include <string>
 
 namespace
 {
 
 constexpr char UNTOUCHED = '~';
-constexpr u32 OLD_CODE = 0xFFFFFF00; // stands in the record before every call
 
 // A buffer of which the callee is told the first cb bytes only.
 struct GUARDED_BUFFER {
@@ -43,11 +41,6 @@ std::string Letters(size_t n)
     std::string name = "sd";
     name.append(n - name.size(), 'x');
     return name;
-}
-
-void RecordReset()
-{
-    NLIBCErrSet(OLD_CODE, "before", 1);
 }
 
 struct INDEX_CASE {
@@ -121,9 +114,9 @@ TEST(DiskIndexGet, NumbersEveryNameOfUpToThreeLettersInTurn)
 
 TEST(DiskIndexGet, NullIsNoDiskAndSetsNoCode)
 {
-    RecordReset();
+    ErrorMark();
     EXPECT_EQ(DiskIndexGet(nullptr), -1);
-    EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
+    EXPECT_EQ(NLIBCErrGet(), ERROR_MARK);
 }
 
 struct NUMBER_CASE {
@@ -210,12 +203,12 @@ TEST(DiskPartitionNumGet, SplitsNameIntoDiskAndNumber)
     for (const NUMBER_CASE &row : NUMBER_CASES) {
         SCOPED_TRACE(testing::Message() << '"' << row.szName << "\" into " << row.cbDisk);
         GUARDED_BUFFER disk(row.cbDisk);
-        RecordReset();
+        ErrorMark();
         EXPECT_EQ(DiskPartitionNumGet(row.szName, disk.text.data(), static_cast<int>(disk.cb)),
                   row.number);
         EXPECT_EQ(TextOf(disk), row.szDisk);
         EXPECT_TRUE(IsRestKept(disk));
-        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
+        EXPECT_EQ(NLIBCErrGet(), ERROR_MARK);
     }
 }
 
@@ -246,7 +239,7 @@ TEST(DiskPartitionNumGet, RefusesBadArguments)
                 {"sda1", szDisk, -1},
                 {"sda1", szDisk, INT_MIN}};
     for (const auto &row : rows) {
-        RecordReset();
+        ErrorMark();
         EXPECT_EQ(DiskPartitionNumGet(row.szName, row.szDisk, row.cbDisk), -1);
         EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
         EXPECT_STREQ(NLIBCErrGetFile(), "disk_name.cpp");
@@ -298,11 +291,11 @@ TEST(DiskPartitionNumRemove, CutsTheNumber)
     for (const REMOVE_CASE &row : REMOVE_CASES) {
         SCOPED_TRACE(row.szPart);
         GUARDED_BUFFER disk(32);
-        RecordReset();
+        ErrorMark();
         EXPECT_EQ(DiskPartitionNumRemove(row.szPart, disk.text.data(), 32), 0);
         EXPECT_EQ(TextOf(disk), row.szDisk);
         EXPECT_TRUE(IsRestKept(disk));
-        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
+        EXPECT_EQ(NLIBCErrGet(), ERROR_MARK);
     }
 }
 
@@ -339,14 +332,14 @@ TEST(DiskPartitionNumRemove, TakesUpTo31CharactersIntoTheUsualBuffer)
 TEST(DiskPartitionNumRemove, RefusesBadArgumentsWithoutACode)
 {
     GUARDED_BUFFER disk(0);
-    RecordReset();
+    ErrorMark();
     EXPECT_EQ(DiskPartitionNumRemove(nullptr, disk.text.data(), 32), -1);
     EXPECT_EQ(DiskPartitionNumRemove("sda1", nullptr, 32), -1);
     EXPECT_EQ(DiskPartitionNumRemove("sda1", disk.text.data(), 0), -1);
     EXPECT_EQ(DiskPartitionNumRemove("sda1", disk.text.data(), -1), -1);
     EXPECT_EQ(DiskPartitionNumRemove("sda1", disk.text.data(), 4), -1);
     EXPECT_TRUE(IsRestKept(disk));
-    EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
+    EXPECT_EQ(NLIBCErrGet(), ERROR_MARK);
 }
 
 struct PARTITION_CASE {
@@ -383,12 +376,12 @@ TEST(DiskDevicePartitionNameGet, PutsTheNumberBehindTheName)
     for (const PARTITION_CASE &row : PARTITION_CASES) {
         SCOPED_TRACE(row.szDisk);
         GUARDED_BUFFER name(32);
-        RecordReset();
+        ErrorMark();
         EXPECT_EQ(DiskDevicePartitionNameGet(row.szDisk, row.partNum, name.text.data(), name.cb),
                   0);
         EXPECT_EQ(TextOf(name), row.szName);
         EXPECT_TRUE(IsRestKept(name));
-        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
+        EXPECT_EQ(NLIBCErrGet(), ERROR_MARK);
     }
 }
 
@@ -397,12 +390,12 @@ TEST(DiskDevicePartitionPathGet, PutsDevInFront)
     for (const PARTITION_CASE &row : PARTITION_CASES) {
         SCOPED_TRACE(row.szDisk);
         GUARDED_BUFFER path(64);
-        RecordReset();
+        ErrorMark();
         EXPECT_EQ(DiskDevicePartitionPathGet(row.szDisk, row.partNum, path.text.data(), path.cb),
                   0);
         EXPECT_EQ(TextOf(path), std::string("/dev/") + row.szName);
         EXPECT_TRUE(IsRestKept(path));
-        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
+        EXPECT_EQ(NLIBCErrGet(), ERROR_MARK);
     }
 }
 
@@ -474,18 +467,18 @@ TEST(DiskDevicePartitionNameGet, RefusesWhatHasNoPartitions)
         {"nuroboot", 1, szOut, 32},  {"/dev/nuroboot", 1, szOut, 32},
         {"nurobootx", 1, szOut, 32}, {"/dev/nuroboot1", 1, szOut, 32},
     };
-    RecordReset();
+    ErrorMark();
     for (const auto &row : rows) {
         EXPECT_EQ(DiskDevicePartitionNameGet(row.szDisk, row.partNum, row.szOut, row.cbOut), -1);
         EXPECT_EQ(DiskDevicePartitionPathGet(row.szDisk, row.partNum, row.szOut, row.cbOut), -1);
     }
     EXPECT_TRUE(IsRestKept(out));
-    EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
+    EXPECT_EQ(NLIBCErrGet(), ERROR_MARK);
 }
 
 TEST(DiskIsExist, NullIsABadParameter)
 {
-    RecordReset();
+    ErrorMark();
     EXPECT_EQ(DiskIsExist(nullptr), -1);
     EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
     EXPECT_STREQ(NLIBCErrGetFile(), "disk_name.cpp");
@@ -493,11 +486,11 @@ TEST(DiskIsExist, NullIsABadParameter)
 
 TEST(DiskIsExist, WhatIsNoBlockDeviceDoesNotExist)
 {
-    RecordReset();
+    ErrorMark();
     EXPECT_EQ(DiskIsExist("/dev/no-such-disk"), 0);
     EXPECT_EQ(DiskIsExist("/"), 0);
     EXPECT_EQ(DiskIsExist("/dev/null"), 0);
-    EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
+    EXPECT_EQ(NLIBCErrGet(), ERROR_MARK);
 }
 
 } // namespace

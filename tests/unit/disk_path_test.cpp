@@ -1,10 +1,9 @@
 // SPDX-License-Identifier: MIT
 #include "hwcontrol/disk_path.h"
 
-#include "nurocore/error.h"
+#include "test_error.h"
 
 #include <cstddef>
-#include <gtest/gtest.h>
 
 // Cards and the boot device are told by their names alone; what the model's port masks decide
 // needs a machine and is tested in the sandbox.
@@ -12,13 +11,7 @@
 namespace
 {
 
-constexpr u32 OLD_CODE = 0xFFFFFF00; // stands in the record before every call
 constexpr u32 OLD_MASK = 0xA5A5A5A5;
-
-void RecordReset()
-{
-    NLIBCErrSet(OLD_CODE, "before", 1);
-}
 
 TEST(DiskPathInfo, HasFourFieldsInOrder)
 {
@@ -57,7 +50,7 @@ constexpr CONTAINER_CASE CONTAINER_CASES[] = {
 
 TEST(DiskContainerFromPortType, MapsThePortTypes)
 {
-    RecordReset();
+    ErrorMark();
     for (const CONTAINER_CASE &row : CONTAINER_CASES) {
         u32 mask = OLD_MASK;
         EXPECT_EQ(DiskContainerFromPortType(static_cast<DISK_PORT_TYPE>(row.type), &mask),
@@ -65,17 +58,17 @@ TEST(DiskContainerFromPortType, MapsThePortTypes)
             << row.type;
         EXPECT_EQ(mask, row.mask) << row.type;
     }
-    EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
+    EXPECT_EQ(NLIBCErrGet(), ERROR_MARK);
 }
 
 TEST(DiskContainerGet, RefusesNullWithoutACode)
 {
     u32 mask = OLD_MASK;
-    RecordReset();
+    ErrorMark();
     EXPECT_EQ(DiskContainerGet(nullptr, &mask), -1);
     EXPECT_EQ(DiskContainerGet("mmcblk0", nullptr), -1);
     EXPECT_EQ(mask, OLD_MASK);
-    EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
+    EXPECT_EQ(NLIBCErrGet(), ERROR_MARK);
 }
 
 TEST(DiskContainerGet, HasNoneForCardsAndTheBootDevice)
@@ -90,11 +83,11 @@ TEST(DiskContainerGet, HasNoneForCardsAndTheBootDevice)
 TEST(DiskPathParse, RefusesNull)
 {
     DISK_PATH_INFO info = {};
-    RecordReset();
+    ErrorMark();
     EXPECT_EQ(DiskPathParse(nullptr, &info), -1);
     EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
     EXPECT_STREQ(NLIBCErrGetFile(), "disk_path.cpp");
-    RecordReset();
+    ErrorMark();
     EXPECT_EQ(DiskPathParse("mmcblk0", nullptr), -1);
     EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
 }
@@ -119,13 +112,13 @@ TEST(DiskPathParse, CountsACardAsUsbAndTheBootDeviceAsInternal)
     for (const PARSE_CASE &row : PARSE_CASES) {
         SCOPED_TRACE(row.szPath);
         DISK_PATH_INFO info = {99, 99, 99, 99};
-        RecordReset();
+        ErrorMark();
         EXPECT_EQ(DiskPathParse(row.szPath, &info), 0);
         EXPECT_EQ(info.diskIndex, row.info.diskIndex);
         EXPECT_EQ(info.container, row.info.container);
         EXPECT_EQ(info.unitIndex, row.info.unitIndex);
         EXPECT_EQ(info.partitionNum, row.info.partitionNum);
-        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
+        EXPECT_EQ(NLIBCErrGet(), ERROR_MARK);
     }
 }
 

@@ -585,6 +585,13 @@ TEST(SzListCompact, DropsTheEmptySlots)
     EXPECT_EQ(ItemsOf(list.p), (ITEMS{"a", "b"}));
 }
 
+TEST(SzListCompact, RefusesNull)
+{
+    ErrorMark();
+    NLIBCSzListCompact(nullptr);
+    EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
+}
+
 TEST(SzListClear, KeepsTheBlockAndTheMode)
 {
     TEST_LIST list({"a", "b"}, SZLIST_CASE_SORTED);
@@ -597,6 +604,13 @@ TEST(SzListClear, KeepsTheBlockAndTheMode)
     EXPECT_EQ(list.p->EndofFree, 1024);
     EXPECT_EQ(list.p->fMode, SZLIST_CASE_SORTED);
     EXPECT_EQ(Defect(list.p), "");
+}
+
+TEST(SzListClear, RefusesNull)
+{
+    ErrorMark();
+    NLIBCSzListClear(nullptr);
+    EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
 }
 
 TEST(SzListDump, PrintsAddressesAndCounts)
@@ -623,6 +637,11 @@ TEST(SzListDump, PrintsAddressesAndCounts)
     int result = 0;
     EXPECT_EQ(StdoutOf([&] { result = NLIBCSzListDump(list.p); }), expected + szLast);
     EXPECT_EQ(result, cchLast);
+}
+
+TEST(SzListDump, RefusesNull)
+{
+    EXPECT_FAILS(NLIBCSzListDump(nullptr), -1, ERR_BAD_PARAMETER);
 }
 
 } // namespace
