@@ -15,7 +15,7 @@ namespace
 {
 
 constexpr u64 UNTOUCHED = 4711;
-constexpr u64 NOT_FIXED = 0xFFFFFFFFFFFFFFFFULL;
+constexpr u64 OPEN = 0xFFFFFFFFFFFFFFFFULL; // the data partition takes what the disk has left
 
 struct EXPECTED_ROW {
     u32 version;
@@ -23,139 +23,25 @@ struct EXPECTED_ROW {
     u32 buildin;
     u64 start[3];
     u64 size[3];
-    u64 systemSize;
-    u64 swapSize;
     u64 dataGap;
     u32 type[3];
 };
 
 constexpr EXPECTED_ROW ROWS[] = {
-    {1,
-     0,
-     0,
-     {63, 273105, NOT_FIXED},
-     {273042, 787185, NOT_FIXED},
-     273042,
-     787185,
-     273042,
-     {0x83, 0x82, 0x83}},
-    {2,
-     0,
-     0,
-     {63, 4980150, NOT_FIXED},
-     {4980087, 1044225, NOT_FIXED},
-     4980087,
-     1044225,
-     257040,
-     {0x83, 0x82, 0x83}},
-    {3,
-     0,
-     0,
-     {63, 530145, NOT_FIXED},
-     {530082, 787185, NOT_FIXED},
-     530082,
-     787185,
-     16002,
-     {0x83, 0x82, 0x83}},
-    {5,
-     0,
-     0,
-     {63, 722925, NOT_FIXED},
-     {722862, 594405, NOT_FIXED},
-     722862,
-     594405,
-     16002,
-     {0x83, 0x82, 0x83}},
-    {6,
-     0,
-     0,
-     {63, 4980150, NOT_FIXED},
-     {4980087, 4192965, NOT_FIXED},
-     4980087,
-     4192965,
-     257040,
-     {0x83, 0x82, 0x83}},
-    {7,
-     0,
-     0,
-     {256, 4980736, NOT_FIXED},
-     {4980480, 4194304, NOT_FIXED},
-     4980480,
-     4194304,
-     262144,
-     {0x83, 0x82, 0x83}},
-    {8,
-     0,
-     0,
-     {2048, 4982528, NOT_FIXED},
-     {4980480, 4194304, NOT_FIXED},
-     4980480,
-     4194304,
-     260352,
-     {0x83, 0x82, 0x83}},
-    {1,
-     1,
-     0,
-     {63, 1574370, NOT_FIXED},
-     {1574307, 787185, NOT_FIXED},
-     1574307,
-     787185,
-     273105,
-     {0xfd, 0xfd, 0xfd}},
-    {2,
-     1,
-     0,
-     {63, 4980150, NOT_FIXED},
-     {4980087, 1044225, NOT_FIXED},
-     4980087,
-     1044225,
-     257040,
-     {0xfd, 0xfd, 0xfd}},
-    {6,
-     1,
-     0,
-     {63, 4980150, NOT_FIXED},
-     {4980087, 4192965, NOT_FIXED},
-     4980087,
-     4192965,
-     257040,
-     {0xfd, 0xfd, 0xfd}},
-    {7,
-     1,
-     0,
-     {256, 4980736, NOT_FIXED},
-     {4980480, 4194304, NOT_FIXED},
-     4980480,
-     4194304,
-     262144,
-     {0xfd, 0xfd, 0xfd}},
-    {8,
-     1,
-     0,
-     {2048, 4982528, NOT_FIXED},
-     {4980480, 4194304, NOT_FIXED},
-     4980480,
-     4194304,
-     260352,
-     {0xfd, 0xfd, 0xfd}},
-    {7,
-     0,
-     1,
-     {256, 2097408, 7202977},
-     {2097152, 5105569, 524288},
-     2097152,
-     5105569,
-     524288,
-     {0x83, 0x83, 0x83}},
-    {8,
-     0,
-     1,
-     {256, 2097408, 7202977},
-     {2097152, 5105569, 524288},
-     2097152,
-     5105569,
-     524288,
-     {0x83, 0x83, 0x83}},
+    {1, 0, 0, {63, 273105, OPEN}, {273042, 787185, OPEN}, 273042, {0x83, 0x82, 0x83}},
+    {2, 0, 0, {63, 4980150, OPEN}, {4980087, 1044225, OPEN}, 257040, {0x83, 0x82, 0x83}},
+    {3, 0, 0, {63, 530145, OPEN}, {530082, 787185, OPEN}, 16002, {0x83, 0x82, 0x83}},
+    {5, 0, 0, {63, 722925, OPEN}, {722862, 594405, OPEN}, 16002, {0x83, 0x82, 0x83}},
+    {6, 0, 0, {63, 4980150, OPEN}, {4980087, 4192965, OPEN}, 257040, {0x83, 0x82, 0x83}},
+    {7, 0, 0, {256, 4980736, OPEN}, {4980480, 4194304, OPEN}, 262144, {0x83, 0x82, 0x83}},
+    {8, 0, 0, {2048, 4982528, OPEN}, {4980480, 4194304, OPEN}, 260352, {0x83, 0x82, 0x83}},
+    {1, 1, 0, {63, 1574370, OPEN}, {1574307, 787185, OPEN}, 273105, {0xfd, 0xfd, 0xfd}},
+    {2, 1, 0, {63, 4980150, OPEN}, {4980087, 1044225, OPEN}, 257040, {0xfd, 0xfd, 0xfd}},
+    {6, 1, 0, {63, 4980150, OPEN}, {4980087, 4192965, OPEN}, 257040, {0xfd, 0xfd, 0xfd}},
+    {7, 1, 0, {256, 4980736, OPEN}, {4980480, 4194304, OPEN}, 262144, {0xfd, 0xfd, 0xfd}},
+    {8, 1, 0, {2048, 4982528, OPEN}, {4980480, 4194304, OPEN}, 260352, {0xfd, 0xfd, 0xfd}},
+    {7, 0, 1, {256, 2097408, 7202977}, {2097152, 5105569, 524288}, 524288, {0x83, 0x83, 0x83}},
+    {8, 0, 1, {256, 2097408, 7202977}, {2097152, 5105569, 524288}, 524288, {0x83, 0x83, 0x83}},
 };
 
 // What a disk with the places of the row is taken for: of two rows alike the first.
@@ -189,8 +75,8 @@ TEST(PartitionLayoutTable, HoldsTheFourteenRowsInTheirOrder)
         EXPECT_EQ(pRow->version, expected.version);
         EXPECT_EQ(pRow->raid, expected.raid);
         EXPECT_EQ(pRow->buildinStorage, expected.buildin);
-        EXPECT_EQ(pRow->systemSize, expected.systemSize);
-        EXPECT_EQ(pRow->swapSize, expected.swapSize);
+        EXPECT_EQ(pRow->systemSize, expected.size[0]);
+        EXPECT_EQ(pRow->swapSize, expected.size[1]);
         EXPECT_EQ(pRow->dataGap, expected.dataGap);
         for (int i = 0; i < 3; i++) {
             SCOPED_TRACE(i);
@@ -214,8 +100,6 @@ TEST(PartitionLayoutTable, HasPartitionTwoRightBehindPartitionOne)
         const PARTITION_LAYOUT *const pRow = PartitionLayoutAt(row);
         ASSERT_NE(pRow, nullptr);
         EXPECT_EQ(pRow->partitions[0].start + pRow->partitions[0].size, pRow->partitions[1].start);
-        EXPECT_EQ(pRow->partitions[0].size, pRow->systemSize);
-        EXPECT_EQ(pRow->partitions[1].size, pRow->swapSize);
     }
 }
 
