@@ -78,6 +78,7 @@ TEST(CommandLine, DestroyWithAWrongCountPrintsTheUsageAlone)
 {
     ExpectRefused({"destroy"}, USAGE);
     ExpectRefused({"destroy", "2", "extra"}, USAGE);
+    ExpectRefused({"destroy", "2", ""}, USAGE);
     ExpectRefused({"destroy", "2", "3", "4"}, USAGE);
 }
 
@@ -107,6 +108,7 @@ constexpr RAID_ID_CASE RAID_IDS[] = {
     {"x2", "/dev/md0"},
     {" 2", "/dev/md2"},
     {"\t\n 12", "/dev/md12"},
+    {" \t+4", "/dev/md4"},
     {"+3", "/dev/md3"},
     {"- 3", "/dev/md0"},
     {"--3", "/dev/md0"},
