@@ -124,19 +124,8 @@ TEST(OddMachine, PortTypesBeyondTheLastHaveNoContainer)
     EXPECT_EQ(DiskContainerFromPortType(INTERNAL_DEVICE, nullptr), -1);
 }
 
-TEST(OddMachine, WithoutScsiHostsThereIsNoUnit)
-{
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    MachineRemove(machine, "/sys/class/scsi_host");
-    MachineCall(machine, [] {
-        char szUnits[64] = "x";
-        EXPECT_EQ(ExternalDiskPortEnumEunit(0, szUnits, sizeof(szUnits)), -1);
-        EXPECT_STREQ(szUnits, "");
-    });
-}
-
-// A failed reading is no end of the file list: none of the reasons that have words of their own.
-TEST(OddMachine, AnotherFailureOfTheDiskListHasNoWords)
+// As where there are none; nothing is said about it.
+TEST(OddMachine, HostsThatCannotBeListedHaveNoUnit)
 {
     MACHINE machine = MachineWithConf(CONF_RAID);
     machine.faults = {{.szFunction = "scandir", .error = EACCES}};
