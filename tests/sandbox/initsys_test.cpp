@@ -42,27 +42,36 @@ void KnownDiskRenew(MACHINE &machine, const std::string &szDisk, const DISK_PLAC
     RenewExpect(machine, szDisk, szRange, made);
 }
 
-// The two arrays as the tool's own tools see them.
-std::vector<std::string> ArrayCommands(const std::vector<std::string> &disks,
-                                       const std::string &szOptions, const std::string &szMissing)
+// The two arrays as the tool's own tools see them: a disk on its own is forced, the slots that are
+// left are missing.
+std::vector<std::string> ArrayCommands(const std::vector<std::string> &disks, size_t nSlot = 4)
 {
     std::vector<std::string> commands;
     for (const int nMd : {0, 1}) {
-        std::string szCommand =
-            "/sbin/mdadm -C /dev/md" + std::to_string(nMd) + " -e 0.9 -amd -R -l1 " + szOptions;
+        std::string szCommand = "/sbin/mdadm -C /dev/md" + std::to_string(nMd) +
+                                " -e 0.9 -amd -R -l1 " + (disks.size() == 1 ? "-f " : "") + "-n" +
+                                std::to_string(nSlot);
         for (const std::string &szDisk : disks) {
             szCommand += " /dev/" + szDisk + std::to_string(nMd + 1);
         }
-        commands.push_back(szCommand + szMissing);
+        for (size_t i = disks.size(); i < nSlot; i++) {
+            szCommand += " missing";
+        }
+        commands.push_back(szCommand);
     }
     return commands;
 }
 
-void ArraysExpect(MACHINE &machine, const std::vector<std::string> &commands)
+void CommandsExpect(MACHINE &machine, const std::vector<std::string> &commands)
 {
     for (const std::string &szCommand : commands) {
         MachineTool(machine, szCommand);
     }
+}
+
+void ArraysExpect(MACHINE &machine, const std::vector<std::string> &disks, size_t nSlot = 4)
+{
+    CommandsExpect(machine, ArrayCommands(disks, nSlot));
 }
 
 // Each array is waited for before it is made.
@@ -99,8 +108,8 @@ TEST(Initsys, MakesFourBlankDisksTheSystem)
     for (const std::string &szDisk : ABCD) {
         BlankDiskWipe(machine, szDisk);
     }
-    const std::vector<std::string> arrays = ArrayCommands(ABCD, "-n4", "");
-    ArraysExpect(machine, arrays);
+    const std::vector<std::string> arrays = ArrayCommands(ABCD);
+    CommandsExpect(machine, arrays);
     ShellWatch(machine);
 
     const RUN_RESULT result = MachineRun(machine, {"initsys"});
@@ -125,7 +134,7 @@ TEST(Initsys, FillsTheSlotsWithMissing)
     MACHINE machine = MachineWithConf(CONF_RAID);
     BlankDiskWipe(machine, "sda");
     BlankDiskWipe(machine, "sdb");
-    ArraysExpect(machine, ArrayCommands({"sda", "sdb"}, "-n4", " missing missing"));
+    ArraysExpect(machine, {"sda", "sdb"});
     ShellWatch(machine);
     const RUN_RESULT result = MachineRun(machine, {"initsys"});
     EXPECT_EQ(result.status, 0);
@@ -140,7 +149,7 @@ TEST(Initsys, ForcesArraysOfOneDisk)
 {
     MACHINE machine = MachineWithConf(CONF_RAID);
     BlankDiskWipe(machine, "sdc");
-    ArraysExpect(machine, ArrayCommands({"sdc"}, "-f -n4", " missing missing missing"));
+    ArraysExpect(machine, {"sdc"});
     ShellWatch(machine);
     const RUN_RESULT result = MachineRun(machine, {"initsys"});
     EXPECT_EQ(result.status, 0);
@@ -157,7 +166,7 @@ TEST(Initsys, LeavesOtherPortsAlone)
     for (const char *const szOther : {"sde", "sdg", "sdh", "mmcblk0", "nuroboot"}) {
         MachineDiskAdd(machine, szOther); // USB, eSATA, none, card, boot
     }
-    ArraysExpect(machine, ArrayCommands({"sda"}, "-f -n4", " missing missing missing"));
+    ArraysExpect(machine, {"sda"});
     EXPECT_EQ(MachineRun(machine, {"initsys"}).status, 0);
 }
 
@@ -165,7 +174,7 @@ TEST(Initsys, IgnoresFurtherArguments)
 {
     MACHINE machine = MachineWithConf(CONF_RAID);
     BlankDiskWipe(machine, "sda");
-    ArraysExpect(machine, ArrayCommands({"sda"}, "-f -n4", " missing missing missing"));
+    ArraysExpect(machine, {"sda"});
     const RUN_RESULT result = MachineRun(machine, {"initsys", "anything", "else"});
     EXPECT_EQ(result.status, 0);
     EXPECT_EQ(result.szOut, "");
@@ -196,8 +205,8 @@ TEST(InitsysSlots, AreWonByTheFirstDisks)
     }
     MachineTool(machine, "/sbin/mdadm --zero-superblock /dev/sdc1");
     MachineTool(machine, "/sbin/mdadm --zero-superblock /dev/sdc2");
-    const std::vector<std::string> arrays = ArrayCommands({"sda", "sdb"}, "-n2", "");
-    ArraysExpect(machine, arrays);
+    const std::vector<std::string> arrays = ArrayCommands({"sda", "sdb"}, 2);
+    CommandsExpect(machine, arrays);
     const RUN_RESULT result = MachineRun(machine, {"initsys"});
     EXPECT_EQ(result.status, 0);
     EXPECT_EQ(CommandsOn(result, "sdc"), DecideAndRenewText("sdc", RANGE_ALL) +
@@ -215,7 +224,7 @@ TEST(InitsysSlots, AreOneForOneForcedDisk)
     // Whether the wipe works is no matter.
     MachineTool(machine, "/sbin/mdadm --zero-superblock /dev/sdb1", {.status = 1});
     MachineTool(machine, "/sbin/mdadm --zero-superblock /dev/sdb2", {.status = 1});
-    ArraysExpect(machine, ArrayCommands({"sda"}, "-f -n1", ""));
+    ArraysExpect(machine, {"sda"}, 1);
     EXPECT_EQ(MachineRun(machine, {"initsys"}).status, 0);
 }
 
@@ -246,7 +255,7 @@ TEST(InitsysSlots, PreferTheirOwnKey)
     MACHINE machine = MachineWithConf(ConfWithSlots("\"3\""));
     BlankDiskWipe(machine, "sda");
     BlankDiskWipe(machine, "sdb");
-    ArraysExpect(machine, ArrayCommands({"sda", "sdb"}, "-n3", " missing"));
+    ArraysExpect(machine, {"sda", "sdb"}, 3);
     EXPECT_EQ(MachineRun(machine, {"initsys"}).status, 0);
 }
 
@@ -261,7 +270,7 @@ TEST(InitsysSlots, AreCutWhereTheTextOfMissingEnds)
     }
     szMissing += " missin";
     ASSERT_EQ(szMissing.size(), 255U);
-    ArraysExpect(machine, ArrayCommands({"sda"}, "-f -n40", szMissing));
+    MachineTool(machine, "/sbin/mdadm -C ...", {.nTimes = 2});
     ShellWatch(machine);
     EXPECT_EQ(MachineRun(machine, {"initsys"}).status, 0);
     EXPECT_EQ(ShellText(), "/sbin/mdadm -C /dev/md0 -e 0.9 -amd -R -l1 -f -n40 /dev/sda1  " +
@@ -314,7 +323,7 @@ TEST(InitsysDecides, ToKeepTheDataOfADiskOfTheWantedLayout)
     MACHINE machine = MachineWithConf(CONF_RAID);
     KnownDiskRenew(machine, "sda", PLACES_8, RANGE_SYSTEM);
     SuperblockExpect(machine, "sda3", 2); // for the wanted layout; the disk itself is not asked
-    ArraysExpect(machine, ArrayCommands({"sda"}, "-f -n4", " missing missing missing"));
+    ArraysExpect(machine, {"sda"});
     const RUN_RESULT result = MachineRun(machine, {"initsys"});
     EXPECT_EQ(result.status, 0);
     EXPECT_EQ(CommandsOn(result, "sda"),
@@ -330,7 +339,7 @@ TEST(InitsysDecides, ToUpgradeSevenToEightWithItsData)
     KnownDiskRenew(machine, "sda", PLACES_7, RANGE_SYSTEM);
     NoSuperblockExpect(machine, "sda3");
     NoSuperblockExpect(machine, "sda5");
-    ArraysExpect(machine, ArrayCommands({"sda"}, "-f -n4", " missing missing missing"));
+    ArraysExpect(machine, {"sda"});
     const RUN_RESULT result = MachineRun(machine, {"initsys"});
     EXPECT_EQ(result.status, 0);
     EXPECT_EQ(CommandsOn(result, "sda"), "/sbin/mdadm -E /dev/sda3\n/sbin/mdadm -E /dev/sda5\n" +
@@ -351,7 +360,7 @@ TEST(InitsysDecides, ToStayWithTheLayoutOfTheData)
         SuperblockExpect(machine, "sda3", 2);
         BlankDiskAdd(machine, "sdb");
         RenewExpect(machine, "sdb", RANGE_ALL, row.made);
-        ArraysExpect(machine, ArrayCommands({"sda", "sdb"}, "-n4", " missing missing"));
+        ArraysExpect(machine, {"sda", "sdb"});
         EXPECT_EQ(MachineRun(machine, {"initsys"}).status, 0);
     }
 }
@@ -362,7 +371,7 @@ TEST(InitsysDecides, ToWipeAnOlderLayoutWithoutArray)
     KnownDiskRenew(machine, "sda", PLACES_6, RANGE_ALL);
     NoSuperblockExpect(machine, "sda3", 2); // for the wanted layout, and to decide
     NoSuperblockExpect(machine, "sda5", 2);
-    ArraysExpect(machine, ArrayCommands({"sda"}, "-f -n4", " missing missing missing"));
+    ArraysExpect(machine, {"sda"});
     const RUN_RESULT result = MachineRun(machine, {"initsys"});
     EXPECT_EQ(result.status, 0);
     const std::string szAsked = "/sbin/mdadm -E /dev/sda3\n/sbin/mdadm -E /dev/sda5\n";
@@ -377,7 +386,7 @@ TEST(InitsysDecides, ToSkipAnOlderLayoutWithArray)
     SuperblockExpect(machine, "sda3", 2);
     DecidedDiskAdd(machine, "sdb", PLACES_6);
     SuperblockExpect(machine, "sdb3", 2, 2);
-    ArraysExpect(machine, ArrayCommands({"sda"}, "-f -n4", " missing missing missing"));
+    ArraysExpect(machine, {"sda"});
     const RUN_RESULT result = MachineRun(machine, {"initsys"});
     EXPECT_EQ(result.status, 0);
     EXPECT_EQ(CommandsOn(result, "sdb"),
@@ -393,7 +402,7 @@ TEST(InitsysDecides, ToWipeAnOlderLayoutWhoseSuperblockNamesNoArray)
     KnownDiskRenew(machine, "sda", PLACES_6, RANGE_ALL);
     MachineTool(machine, "/sbin/mdadm -E /dev/sda3", {.szOut = "Version : 1.2\n", .nTimes = 2});
     NoSuperblockExpect(machine, "sda5", 2);
-    ArraysExpect(machine, ArrayCommands({"sda"}, "-f -n4", " missing missing missing"));
+    ArraysExpect(machine, {"sda"});
     EXPECT_EQ(MachineRun(machine, {"initsys"}).status, 0);
 }
 
@@ -406,7 +415,7 @@ TEST(InitsysDecides, ToWipeEightWhereSevenIsWanted)
     KnownDiskRenew(machine, "sdb", PLACES_8, RANGE_ALL, MADE_7);
     NoSuperblockExpect(machine, "sdb3");
     NoSuperblockExpect(machine, "sdb5");
-    ArraysExpect(machine, ArrayCommands({"sda", "sdb"}, "-n4", " missing missing"));
+    ArraysExpect(machine, {"sda", "sdb"});
     EXPECT_EQ(MachineRun(machine, {"initsys"}).status, 0);
 }
 
@@ -415,7 +424,7 @@ TEST(InitsysDecides, ToWipeLayoutOneEvenWhereItIsWanted)
     MACHINE machine = MachineWithConf(CONF_RAID);
     KnownDiskRenew(machine, "sda", PLACES_1, RANGE_ALL, MADE_1);
     SystemArrayAdd(machine, {{"sda1"}});
-    ArraysExpect(machine, ArrayCommands({"sda"}, "-f -n4", " missing missing missing"));
+    ArraysExpect(machine, {"sda"});
     const RUN_RESULT result = MachineRun(machine, {"initsys"});
     EXPECT_EQ(result.status, 0);
     EXPECT_EQ(CommandsOn(result, "sda"), DecideAndRenewText("sda", RANGE_ALL, MADE_1));
@@ -437,7 +446,7 @@ TEST(InitsysDecides, ToRenewUnrecognisedTablesWhenThereIsNoKnownOne)
     MachineTool(machine, ListingCommand("sdc", 2), {.szOut = Listing("sdc", 2, 2048, 4980480)});
     RenewExpect(machine, "sdc", RANGE_SYSTEM);
     BlankDiskWipe(machine, "sdd");
-    ArraysExpect(machine, ArrayCommands(ABCD, "-n4", ""));
+    ArraysExpect(machine, ABCD);
     const RUN_RESULT result = MachineRun(machine, {"initsys"});
     EXPECT_EQ(result.status, 0);
     for (const char *const szDisk : {"sda", "sdb", "sdc"}) {
@@ -453,7 +462,7 @@ TEST(InitsysDecides, ToLeaveUnrecognisedTablesBesideAKnownOne)
     NoSuperblockExpect(machine, "sdb3");
     NoSuperblockExpect(machine, "sdb5");
     BlankDiskWipe(machine, "sdc");
-    ArraysExpect(machine, ArrayCommands({"sdb", "sdc"}, "-n4", " missing missing"));
+    ArraysExpect(machine, {"sdb", "sdc"});
     const RUN_RESULT result = MachineRun(machine, {"initsys"});
     EXPECT_EQ(result.status, 0);
     EXPECT_EQ(CommandsOn(result, "sda"), DecideText("sda"));
@@ -472,7 +481,7 @@ TEST(InitsysDecides, ToWipeEveryDiskWhereTheMarkerStands)
     for (const char *const szDisk : {"sda", "sdb", "sdc"}) {
         RenewExpect(machine, szDisk, RANGE_ALL);
     }
-    ArraysExpect(machine, ArrayCommands({"sda", "sdb", "sdc"}, "-n4", " missing"));
+    ArraysExpect(machine, {"sda", "sdb", "sdc"});
     const RUN_RESULT result = MachineRun(machine, {"initsys"});
     EXPECT_EQ(result.status, 0);
     EXPECT_EQ(CommandsOn(result, "sdc"), Lines(RenewCommands("sdc", RANGE_ALL)));
@@ -487,7 +496,7 @@ TEST(InitsysModel, WithoutRaidGivesTheTypesOfPlainPartitions)
     KnownDiskRenew(machine, "sda", PLACES_8, RANGE_SYSTEM, MADE_NO_RAID);
     BlankDiskAdd(machine, "sdb");
     RenewExpect(machine, "sdb", RANGE_ALL, MADE_NO_RAID);
-    ArraysExpect(machine, ArrayCommands({"sda", "sdb"}, "-n4", " missing missing"));
+    ArraysExpect(machine, {"sda", "sdb"});
     EXPECT_EQ(MachineRun(machine, {"initsys"}).status, 0);
 }
 
@@ -501,7 +510,7 @@ TEST(InitsysModel, WithoutRaidDoesNotRecogniseItsOwnOldLayout)
                     .szSwapSize = "-z787185",
                     .szType = "-t83",
                     .szSwapType = "-t82"});
-    ArraysExpect(machine, ArrayCommands({"sda"}, "-f -n4", " missing missing missing"));
+    ArraysExpect(machine, {"sda"});
     EXPECT_EQ(MachineRun(machine, {"initsys"}).status, 0);
 }
 
@@ -511,7 +520,7 @@ TEST(InitsysModel, WithBuiltInStorageHasItsOwnGeometry)
     KnownDiskRenew(machine, "sda", PLACES_BUILDIN, RANGE_SYSTEM, MADE_BUILDIN);
     BlankDiskAdd(machine, "sdb");
     RenewExpect(machine, "sdb", RANGE_ALL, MADE_BUILDIN);
-    ArraysExpect(machine, ArrayCommands({"sda", "sdb"}, "-n4", " missing missing"));
+    ArraysExpect(machine, {"sda", "sdb"});
     EXPECT_EQ(MachineRun(machine, {"initsys"}).status, 0);
 }
 
@@ -555,8 +564,8 @@ TEST(InitsysModel, WithTwoHeadsTakesTheExpansionUnits)
     MachineDiskAdd(machine, "sdgc"); // no unit tells of it
     ExpansionUnitAdd(machine, "host6", "/dev/sdga,/dev/sdgb");
     const std::vector<std::string> disks = {"sdga", "sdgb"};
-    const std::vector<std::string> arrays = ArrayCommands(disks, "-n4", " missing missing");
-    ArraysExpect(machine, arrays);
+    const std::vector<std::string> arrays = ArrayCommands(disks);
+    CommandsExpect(machine, arrays);
     const RUN_RESULT result = MachineRun(machine, {"initsys"});
     EXPECT_EQ(result.status, 0);
     EXPECT_EQ(CommandsBeside(result, disks), WithPauses(arrays));
@@ -595,7 +604,7 @@ TEST(InitsysFails, ForADiskThatCannotBePartitionedAlone)
     MachineTool(machine, "/sbin/sfdisk -N1 -uS -q -f -j2048 -z4980480 -tfd -F /dev/sdb",
                 {.szErr = "too small\n", .status = 1});
     BlankDiskWipe(machine, "sdc");
-    ArraysExpect(machine, ArrayCommands({"sda", "sdc"}, "-n4", " missing missing"));
+    ArraysExpect(machine, {"sda", "sdc"});
     const RUN_RESULT result = MachineRun(machine, {"initsys"});
     EXPECT_EQ(result.status, 0);
     EXPECT_EQ(LogErrors(result),
@@ -644,9 +653,8 @@ TEST(InitsysFails, NotWhenTheArraysDo)
     MACHINE machine = MachineWithConf(CONF_RAID);
     BlankDiskWipe(machine, "sda");
     BlankDiskWipe(machine, "sdb");
-    const std::vector<std::string> arrays =
-        ArrayCommands({"sda", "sdb"}, "-n4", " missing missing");
-    ArraysExpect(machine, arrays);
+    const std::vector<std::string> arrays = ArrayCommands({"sda", "sdb"});
+    CommandsExpect(machine, arrays);
     for (TOOL_ROW &row : machine.rows) {
         if (row.argv[1] == "-C") {
             row.answer = {.szOut = "noise\n", .szErr = "noise\n", .status = 2};
@@ -797,7 +805,7 @@ TEST(InitsysFails, ForTheDiskWhoseDecisionCannotBeWaitedFor)
     MACHINE machine = MachineWithConf(CONF_RAID);
     BlankDiskAdd(machine, "sda");
     BlankDiskWipe(machine, "sdb");
-    ArraysExpect(machine, ArrayCommands({"sdb"}, "-f -n4", " missing missing missing"));
+    ArraysExpect(machine, {"sdb"});
     machine.faults = {{.szFunction = "waitpid", .nCall = 1, .error = ECHILD}};
     machine.fMayLeaveChildren = true;
     const RUN_RESULT result = MachineRun(machine, {"initsys"});
@@ -816,7 +824,7 @@ TEST(InitsysFails, ForTheDiskWhosePartitioningCannotBeWaitedFor)
     for (const std::string &szCommand : RenewCommands("sdb", RANGE_ALL)) {
         MachineTool(machine, szCommand, {.nTimes = ANY_TIMES}); // it may come to its end or not
     }
-    ArraysExpect(machine, ArrayCommands({"sda"}, "-f -n4", " missing missing missing"));
+    ArraysExpect(machine, {"sda"});
     machine.faults = {{.szFunction = "waitpid", .nCall = 4, .error = ECHILD}}; // two have decided
     machine.fMayLeaveChildren = true;
     const RUN_RESULT result = MachineRun(machine, {"initsys"});
@@ -868,7 +876,7 @@ TEST(InitsysChildren, WorkSideBySide)
     for (TOOL_ROW &row : machine.rows) {
         row.answer.msDelay = HasWord(row, "-N1") ? 2000 : 0;
     }
-    ArraysExpect(machine, ArrayCommands(ABCD, "-n4", ""));
+    ArraysExpect(machine, ABCD);
     machine.msBound = 30000;
     const RUN_RESULT result = MachineRun(machine, {"initsys"});
     EXPECT_EQ(result.status, 0);
@@ -885,7 +893,7 @@ TEST(InitsysChildren, AreWaitedForInTheOrderOfTheDisks)
     MachineDiskAdd(machine, "sdb");
     MachineTool(machine, ListingCommand("sdb", 1), {.signalCaller = SIGKILL});
     BlankDiskWipe(machine, "sdc");
-    ArraysExpect(machine, ArrayCommands({"sdc"}, "-f -n4", " missing missing missing"));
+    ArraysExpect(machine, {"sdc"});
     machine.fMayLeaveChildren = true; // the killing partitioner itself
     const RUN_RESULT result = MachineRun(machine, {"initsys"});
     EXPECT_EQ(result.status, 0);
@@ -902,7 +910,7 @@ TEST(InitsysChildren, CostTheirOwnDiskWhenKilled)
     BlankDiskAdd(machine, "sdb");
     MachineTool(machine, "/sbin/sfdisk --fast-delete -1 /dev/sdb", {.signalCaller = SIGTERM});
     BlankDiskWipe(machine, "sdc");
-    ArraysExpect(machine, ArrayCommands({"sda", "sdc"}, "-n4", " missing missing"));
+    ArraysExpect(machine, {"sda", "sdc"});
     machine.fMayLeaveChildren = true;
     const RUN_RESULT result = MachineRun(machine, {"initsys"});
     EXPECT_EQ(result.status, 0);
@@ -920,7 +928,7 @@ TEST(InitsysChildren, HaveNothingToReadOrToSay)
     for (TOOL_ROW &row : machine.rows) {
         row.answer.szErr = "noise\n";
     }
-    ArraysExpect(machine, ArrayCommands({"sda"}, "-f -n4", " missing missing missing"));
+    ArraysExpect(machine, {"sda"});
     const RUN_RESULT result = MachineRun(machine, {"initsys"});
     EXPECT_EQ(result.status, 0);
     EXPECT_EQ(result.szOut, "");
@@ -941,9 +949,8 @@ TEST(InitsysDuplicate, HandsThePartitionsOverBeforeTheArrays)
     BlankDiskWipe(machine, "sdb");
     const std::string szDuplicate = "/bin/nurodd /dev/sda1 /dev/sdb1 /dev/sda2 /dev/sdb2";
     MachineTool(machine, szDuplicate, {.szOut = "noise\n", .szErr = "noise\n"});
-    const std::vector<std::string> arrays =
-        ArrayCommands({"sda", "sdb"}, "-n4", " missing missing");
-    ArraysExpect(machine, arrays);
+    const std::vector<std::string> arrays = ArrayCommands({"sda", "sdb"});
+    CommandsExpect(machine, arrays);
     ShellWatch(machine);
     const RUN_RESULT result = MachineRun(machine, {"initsys-dd", "anything"});
     EXPECT_EQ(result.status, 0);
@@ -965,7 +972,7 @@ TEST(InitsysDuplicate, GetsTheMembersAlone)
     MachineTool(machine, "/sbin/mdadm --zero-superblock /dev/sdb1");
     MachineTool(machine, "/sbin/mdadm --zero-superblock /dev/sdb2");
     MachineTool(machine, "/bin/nurodd /dev/sda1 /dev/sda2");
-    ArraysExpect(machine, ArrayCommands({"sda"}, "-f -n1", ""));
+    ArraysExpect(machine, {"sda"}, 1);
     EXPECT_EQ(MachineRun(machine, {"initsys-dd"}).status, 0);
 }
 
@@ -975,7 +982,7 @@ TEST(InitsysDuplicate, ThatFailsChangesNothing)
         MACHINE machine = MachineWithConf(CONF_RAID);
         BlankDiskWipe(machine, "sda");
         MachineTool(machine, "/bin/nurodd /dev/sda1 /dev/sda2", {.status = status});
-        ArraysExpect(machine, ArrayCommands({"sda"}, "-f -n4", " missing missing missing"));
+        ArraysExpect(machine, {"sda"});
         const RUN_RESULT result = MachineRun(machine, {"initsys-dd"});
         EXPECT_EQ(result.status, 0);
         EXPECT_EQ(result.szOut, "system init with nurodd failed\n");
@@ -988,7 +995,7 @@ TEST(InitsysDuplicate, ThatIsMissingIsAFailedOne)
         MACHINE machine = MachineWithConf(CONF_RAID);
         BlankDiskWipe(machine, "sda");
         machine.tools["/bin/nurodd"] = kind;
-        ArraysExpect(machine, ArrayCommands({"sda"}, "-f -n4", " missing missing missing"));
+        ArraysExpect(machine, {"sda"});
         const RUN_RESULT result = MachineRun(machine, {"initsys-dd"});
         EXPECT_EQ(result.status, 0);
         EXPECT_EQ(result.szOut, "system init with nurodd failed\n");
@@ -1001,7 +1008,7 @@ TEST(InitsysDuplicate, WithoutAShellIsAnotherMessage)
     MACHINE machine = MachineWithConf(CONF_RAID);
     BlankDiskWipe(machine, "sda");
     machine.faults = {{.szFunction = "system", .nCall = 1, .error = EAGAIN}};
-    ArraysExpect(machine, ArrayCommands({"sda"}, "-f -n4", " missing missing missing"));
+    ArraysExpect(machine, {"sda"});
     const RUN_RESULT result = MachineRun(machine, {"initsys-dd"});
     EXPECT_EQ(result.status, 0);
     EXPECT_EQ(result.szOut, "can not fork to nurodd\n"); // one line only
