@@ -51,8 +51,8 @@ def blocks():
             before = line if line.strip() and not line.startswith("    ") else before if line.strip() else ""
 
 
-STARTS = ("./", "cmake ", "ctest ", "packaging/", "tests/", "appliance/", "docs/pictures/", "build/", "DESTDIR=",
-          "LD_PRELOAD=", "ln ", "git ", PROMPT)
+STARTS = ("./", "cmake ", "ctest ", "packaging/", "tests/", "appliance/", "bench/", "docs/pictures/", "build/",
+          "DESTDIR=", "LD_PRELOAD=", "ln ", "git ", PROMPT)
 
 
 def commands():
@@ -60,7 +60,8 @@ def commands():
     found = []
     for page, line in blocks():
         command = re.split(r"\s{2,}", line)[0]
-        if command.startswith(STARTS) and not re.match(r"(tests|appliance|docs|packaging|build)/( |$|\S*/$)", command):
+        is_folder = re.match(r"(tests|appliance|bench|docs|packaging|build)/( |$|\S*/$)", command)
+        if command.startswith(STARTS) and not is_folder:
             found.append((page, command))
     return found
 
@@ -90,6 +91,20 @@ def by_preset(command):
 def by_test_program(command):
     program, *arguments = command.replace("build/release", BUILD).replace("'", "").split()
     assert "[  PASSED  ]" in run(program, *arguments)
+
+
+def by_bench(command):
+    """The smallest part of it: the figures take a minute each."""
+    least = {"growth": ("--gtest_filter=*EnumerationOfDisks", "[  PASSED  ] 1 test."),
+             "containers": ("--benchmark_filter=push/list/10$", "push/list/10 ")}
+    argument, line = least[os.path.basename(command)]
+    assert line in run(command.replace("build/release", BUILD), argument), command
+
+
+def by_gates(command):
+    """The gates are counts of the same run."""
+    assert f'"$BENCH_DIR/{os.path.basename(command)}" --counts' in read("bench/gates"), command
+    run("bash", "-n", command)
 
 
 def by_install(command):
@@ -143,7 +158,8 @@ def by_being_there(command):
 
 RULES = (
     (r"\./check\b", by_check), (r"\./demo$", by_demo), (r"(cmake|ctest) ", by_preset),
-    (r"build/release/tests/", by_test_program), (r"DESTDIR=", by_install), (r"LD_PRELOAD=", by_installed),
+    (r"build/release/tests/", by_test_program), (r"build/release/bench/", by_bench), (r"bench/", by_gates),
+    (r"DESTDIR=", by_install), (r"LD_PRELOAD=", by_installed),
     (r"appliance/(run|shell)\b|tests/appliance/run-all", by_options), (re.escape(PROMPT), by_story),
     (r"packaging/make-", by_install_test), (r"docs/pictures/make", by_pictures),
     (r"tests/tree/before-commit|ln -s .*tests/tree/before-commit", by_being_there),
