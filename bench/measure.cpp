@@ -8,7 +8,7 @@
 // The appliance's md driver has two requests that a stock one lacks. Here they are answered from
 // outside, as by a driver whose arrays are in good health: the program runs as it is installed,
 // with nothing preloaded that would be counted as part of it. The command's output goes where
-// measure's error output goes, and its exit status must be 0.
+// measure's error output goes, and its exit status must be STATUS.
 //
 // Linked statically: a program that starts another one lends it its own peak memory.
 #include <algorithm>

@@ -20,7 +20,7 @@ VERDICT Judge(const SITUATION &situation, const RUN_RESULT &clean, const RUN_RES
 // Whether any call was made to fail.
 bool WasInjected(const RUN_RESULT &result);
 
-// "fault fgets 3 0.1 /proc/mounts", one line each.
+// "failed: fgets 3 0.1 /proc/mounts", one line each, and how many more there are.
 std::string FaultText(const RUN_RESULT &result);
 
 size_t AllowanceCount();

@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: MIT
 //
 // The first byte is the size of the buffer that a disk's name is to go to, the rest a name or a
-// path. What is said in terms of scanf is compared with scanf.
+// path. What is expected of it is read with scanf.
 #include "hwcontrol/disk_name.h"
 
 #include "fuzz.h"

@@ -341,7 +341,7 @@ TEST(Harness, CommandsTellTheirSurroundings)
     EXPECT_FALSE(result.events[1].fNullError);
 }
 
-// The rings to come run tens of thousands of machines. Processor time, because the machine may be
+// Other rings run tens of thousands of machines. Processor time, because the machine may be
 // shared; a wide bound, because a build with sanitizers passes too.
 TEST(Harness, ARunIsCheap)
 {

@@ -19,7 +19,7 @@ constexpr u64 UNTOUCHED = 4711;
 constexpr u64 ALL_ONES = 0xFFFFFFFFFFFFFFFFULL;
 constexpr char ERROR_LOG[] = "/var/log/space_operation_error.log";
 
-// The answer of one command among others that succeed.
+// Each of these is run once and succeeds.
 MACHINE MachineOfCommands(const std::string &szConf, const std::vector<std::string> &commands)
 {
     MACHINE machine = MachineWithConf(szConf);
@@ -29,7 +29,7 @@ MACHINE MachineOfCommands(const std::string &szConf, const std::vector<std::stri
     return machine;
 }
 
-// What the listed row answers instead of success.
+// What the last of them answers instead.
 void LastFails(MACHINE &machine, const TOOL_ANSWER &answer)
 {
     machine.rows.back().answer = answer;

@@ -66,7 +66,7 @@ bool FieldIs(const FIELD &field, const char *sz)
     return field.cb == strlen(sz) && memcmp(field.pch, sz, field.cb) == 0;
 }
 
-READER FileMap(const char *szPath)
+READER FileRead(const char *szPath)
 {
     const int fd = open(szPath, O_RDONLY | O_CLOEXEC);
     struct stat info = {};
@@ -126,7 +126,7 @@ bool RowFind(int nArgument, char *const argv[], READER &row)
         return false;
     }
     unsigned int *pUsed = static_cast<unsigned int *>(p);
-    READER rows = FileMap(WIRE_ROWS);
+    READER rows = FileRead(WIRE_ROWS);
     FIELD field = {};
     for (; FieldRead(rows, field); pUsed++) {
         row = {field.pch, field.pch + field.cb};

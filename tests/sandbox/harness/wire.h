@@ -2,8 +2,8 @@
 #pragma once
 
 // What the harness, the stand-in tools and the interposing library tell one another, and where.
-// They may be built for different processors, so everything is text: a field is "LENGTH:BYTES",
-// a record is a field that holds the fields of the record.
+// They may be built for different processors, so everything but the stand-ins' own counts is text:
+// a field is "LENGTH:BYTES", a record is a field that holds the fields of the record.
 
 #define WIRE_FOLDER "/.sandbox"
 #define WIRE_ROWS WIRE_FOLDER "/rows"             // the answers of the stand-ins
