@@ -1,10 +1,11 @@
 // SPDX-License-Identifier: MIT
 #include "oracle_machine.h"
 
+#include "oracle_dice.h"
+
 #include <algorithm>
 #include <cctype>
 #include <cstdlib>
-#include <random>
 
 namespace
 {
@@ -13,10 +14,6 @@ using std::string;
 using std::to_string;
 using std::vector;
 using u64 = std::uint64_t;
-
-struct DICE {
-    std::mt19937_64 engine;
-};
 
 // The ports a disk can hang on, as the masks of the configuration file know them.
 enum ROLE { ROLE_INTERNAL, ROLE_USB, ROLE_ESATA, ROLE_UNIT, ROLE_CACHE, ROLE_NONE };
@@ -38,29 +35,13 @@ struct PLACE {
     ROLE role;
 };
 
-struct PLAN {
+struct SKETCH {
     bool fDualHead = false;
     bool fRaid = false;
     bool fBuiltin = false;
     bool fCrowded = false; // more disks than the buffers of the command lines were made for
     vector<PLACE> places{};
 };
-
-u64 Below(DICE &dice, u64 limit)
-{
-    return dice.engine() % limit;
-}
-
-bool Chance(DICE &dice, u64 percent)
-{
-    return Below(dice, 100) < percent;
-}
-
-template <typename T>
-const T &Pick(DICE &dice, const vector<T> &items)
-{
-    return items[Below(dice, items.size())];
-}
 
 // ------------------------------------------------------------------------------------ ports
 
@@ -85,22 +66,22 @@ string NameMake(DICE &dice, ROLE role)
     return Chance(dice, 8) ? Pick(dice, odd) : "sd" + szLetter;
 }
 
-void PlacesMake(DICE &dice, PLAN &plan)
+void PlacesMake(DICE &dice, SKETCH &sketch)
 {
-    if (plan.fCrowded) {
+    if (sketch.fCrowded) {
         for (char letter = 'a'; letter <= 'z'; letter++) {
-            plan.places.push_back({string("sd") + letter, ROLE_INTERNAL});
+            sketch.places.push_back({string("sd") + letter, ROLE_INTERNAL});
         }
         return;
     }
     const u64 wanted = Chance(dice, 5) ? 0 : 1 + Below(dice, 8);
-    while (plan.places.size() < wanted) {
-        const ROLE role = RoleMake(dice, plan.fDualHead);
+    while (sketch.places.size() < wanted) {
+        const ROLE role = RoleMake(dice, sketch.fDualHead);
         const string szName = NameMake(dice, role);
-        const bool fNew = std::none_of(plan.places.begin(), plan.places.end(),
+        const bool fNew = std::none_of(sketch.places.begin(), sketch.places.end(),
                                        [&](const PLACE &place) { return place.szName == szName; });
         if (fNew) {
-            plan.places.push_back({szName, role});
+            sketch.places.push_back({szName, role});
         }
     }
 }
@@ -119,23 +100,23 @@ u64 RoleBit(const PLACE &place)
     return index == 31 ? u64{1} << 40 : index < 64 ? u64{1} << index : 0;
 }
 
-u64 MaskOf(const PLAN &plan, const vector<ROLE> &roles)
+u64 MaskOf(const SKETCH &sketch, const vector<ROLE> &roles)
 {
     u64 mask = 0;
-    for (const PLACE &place : plan.places) {
+    for (const PLACE &place : sketch.places) {
         mask |= std::count(roles.begin(), roles.end(), place.role) != 0 ? RoleBit(place) : 0;
     }
     return mask;
 }
 
-void HostsMake(DICE &dice, const PLAN &plan, ORACLE_MACHINE &machine)
+void HostsMake(DICE &dice, const SKETCH &sketch, ORACLE_MACHINE &machine)
 {
     machine.fScsiHostFolder = !Chance(dice, 3);
     machine.hosts["host0"] = Chance(dice, 50) ? std::nullopt : std::optional<string>("other=1\n");
     machine.hosts["proc"] = "nuro_device_list=/dev/sda,/dev/sdb\n";
     const vector<string> hosts = {"host1", "host10", "host2"};
     std::map<string, string> lists;
-    for (const PLACE &place : plan.places) {
+    for (const PLACE &place : sketch.places) {
         if (place.role == ROLE_UNIT && !Chance(dice, 4)) {
             string &list = lists[Pick(dice, hosts)];
             list += (list.empty() ? "/dev/" : ",/dev/") + place.szName;
@@ -223,24 +204,24 @@ string SplitLine(DICE &dice)
                            : NumberLine(dice, "raidgroup_split_units", 50);
 }
 
-void ConfMake(DICE &dice, const PLAN &plan, ORACLE_MACHINE &machine)
+void ConfMake(DICE &dice, const SKETCH &sketch, ORACLE_MACHINE &machine)
 {
     if (Chance(dice, 2)) {
         return;
     }
     vector<string> lines = {
-        AnswerLine(dice, "supportraid", plan.fRaid),
-        AnswerLine(dice, "support_buildin_storage", plan.fBuiltin),
-        AnswerLine(dice, "support_dual_head", plan.fDualHead),
-        plan.fCrowded ? "max_sys_raid_disks=30\n" : NumberLine(dice, "max_sys_raid_disks", 40),
+        AnswerLine(dice, "supportraid", sketch.fRaid),
+        AnswerLine(dice, "support_buildin_storage", sketch.fBuiltin),
+        AnswerLine(dice, "support_dual_head", sketch.fDualHead),
+        sketch.fCrowded ? "max_sys_raid_disks=30\n" : NumberLine(dice, "max_sys_raid_disks", 40),
         NumberLine(dice, "maxdisks", 6),
         SplitLine(dice),
     };
     const std::pair<const char *, u64> masks[] = {
-        {"usbportcfg", MaskOf(plan, {ROLE_USB})},
-        {"esataportcfg", MaskOf(plan, {ROLE_ESATA, ROLE_UNIT})},
-        {"internalportcfg", MaskOf(plan, {ROLE_INTERNAL})},
-        {"cacheportcfg", MaskOf(plan, {ROLE_CACHE})},
+        {"usbportcfg", MaskOf(sketch, {ROLE_USB})},
+        {"esataportcfg", MaskOf(sketch, {ROLE_ESATA, ROLE_UNIT})},
+        {"internalportcfg", MaskOf(sketch, {ROLE_INTERNAL})},
+        {"cacheportcfg", MaskOf(sketch, {ROLE_CACHE})},
     };
     for (const auto &[szKey, mask] : masks) {
         const u64 extra = Chance(dice, 5) ? u64{1} << Below(dice, 64) : 0;
@@ -250,7 +231,7 @@ void ConfMake(DICE &dice, const PLAN &plan, ORACLE_MACHINE &machine)
             lines.push_back("usbportcfg=0x0\n");
         }
     }
-    std::shuffle(lines.begin(), lines.end(), dice.engine);
+    std::shuffle(lines.begin(), lines.end(), dice);
     string text;
     for (const string &szLine : lines) {
         text += NoiseLine(dice) + szLine;
@@ -382,11 +363,11 @@ ORACLE_PARTITION Partition(u64 start, u64 size)
     return {to_string(start) + "\n", to_string(size) + "\n"};
 }
 
-ORACLE_LAYOUT LayoutPick(DICE &dice, const PLAN &plan)
+ORACLE_LAYOUT LayoutPick(DICE &dice, const SKETCH &sketch)
 {
     vector<ORACLE_LAYOUT> fitting;
     for (const ORACLE_LAYOUT &row : OracleLayouts()) {
-        const bool fOwn = (row.raid == 1) == plan.fRaid && (row.builtin == 1) == plan.fBuiltin;
+        const bool fOwn = (row.raid == 1) == sketch.fRaid && (row.builtin == 1) == sketch.fBuiltin;
         // The oldest layout with RAID is the only one that a machine without it takes for known
         // when it decides about a disk, and for unknown when it looks for an array.
         const bool fOldest = row.version == 1 && row.raid == 1;
@@ -488,13 +469,13 @@ void ListingsMake(DICE &dice, const string &szDisk, CONTENT content, ORACLE_MACH
     }
 }
 
-void DisksMake(DICE &dice, const PLAN &plan, ORACLE_MACHINE &machine)
+void DisksMake(DICE &dice, const SKETCH &sketch, ORACLE_MACHINE &machine)
 {
-    const ORACLE_LAYOUT common = LayoutPick(dice, plan);
+    const ORACLE_LAYOUT common = LayoutPick(dice, sketch);
     const u64 percentArray = Pick(dice, vector<u64>{0, 50, 50, 90});
-    for (const PLACE &place : plan.places) {
+    for (const PLACE &place : sketch.places) {
         const CONTENT content = ContentMake(dice);
-        const ORACLE_LAYOUT row = Chance(dice, 50) ? common : LayoutPick(dice, plan);
+        const ORACLE_LAYOUT row = Chance(dice, 50) ? common : LayoutPick(dice, sketch);
         const string szPath = "/dev/" + place.szName;
         machine.disks[place.szName] = PartitionsMake(dice, row, content);
         ListingsMake(dice, place.szName, content, machine);
@@ -527,7 +508,7 @@ void SystemArrayMake(DICE &dice, ORACLE_MACHINE &machine)
         machine.md0Members.insert(machine.md0Members.begin(), "sdx1");
         machine.md0Members.resize(std::min<size_t>(machine.md0Members.size(), 3));
     }
-    std::shuffle(machine.md0Members.begin(), machine.md0Members.end(), dice.engine);
+    std::shuffle(machine.md0Members.begin(), machine.md0Members.end(), dice);
 }
 
 // -------------------------------------------------------------------------------- bad tools
@@ -571,7 +552,7 @@ void DiskFaultAdd(DICE &dice, const string &szName, ORACLE_MACHINE &machine)
 void FaultsMake(DICE &dice, ORACLE_MACHINE &machine)
 {
     const u64 percent = Pick(dice, vector<u64>{0, 0, 15, 40});
-    for (const auto &[szName, table] : ORACLE_MACHINE(machine).disks) {
+    for (const auto &[szName, table] : machine.disks) {
         if (Chance(dice, percent)) {
             DiskFaultAdd(dice, szName, machine);
         }
@@ -677,22 +658,22 @@ bool OracleNumberParse(const char *szText, std::uint64_t &number)
 
 ORACLE_CASE OracleCaseMake(std::uint64_t seed)
 {
-    DICE dice{std::mt19937_64(seed)};
+    DICE dice(seed);
     ORACLE_CASE made;
     made.seed = seed;
     made.words = WordsMake(dice);
-    PLAN plan;
-    plan.fDualHead = Chance(dice, 20);
-    plan.fRaid = Chance(dice, 70);
-    plan.fBuiltin = Chance(dice, plan.fRaid ? 6 : 30);
-    plan.fCrowded = Chance(dice, 1);
-    PlacesMake(dice, plan);
-    ConfMake(dice, plan, made.machine);
-    HostsMake(dice, plan, made.machine);
-    DisksMake(dice, plan, made.machine);
+    SKETCH sketch;
+    sketch.fDualHead = Chance(dice, 20);
+    sketch.fRaid = Chance(dice, 70);
+    sketch.fBuiltin = Chance(dice, sketch.fRaid ? 6 : 30);
+    sketch.fCrowded = Chance(dice, 1);
+    PlacesMake(dice, sketch);
+    ConfMake(dice, sketch, made.machine);
+    HostsMake(dice, sketch, made.machine);
+    DisksMake(dice, sketch, made.machine);
     SystemArrayMake(dice, made.machine);
     MarkersMake(dice, made.machine);
-    if (plan.fCrowded && Chance(dice, 70)) {
+    if (sketch.fCrowded && Chance(dice, 70)) {
         made.machine.markers.insert(ORACLE_MARKER_FORCE);
         made.words = {"initsys-dd"};
     }

@@ -1,9 +1,10 @@
 // SPDX-License-Identifier: MIT
 #include "oracle_plan.h"
 
+#include "oracle_dice.h"
+
 #include <algorithm>
 #include <array>
-#include <random>
 
 namespace
 {
@@ -12,7 +13,6 @@ using std::string;
 using std::to_string;
 using std::vector;
 using u64 = std::uint64_t;
-using DICE = std::mt19937_64;
 
 constexpr u64 DRAWS_PER_SEED = 1000000; // each seed draws from machines of its own
 constexpr char LETTER_LAST = 'j';       // the last disk that the appliance has
@@ -25,22 +25,6 @@ constexpr u64 DATA_SIZE = 65536;
 constexpr int TYPE_RAID = 0xfd;
 constexpr int TYPE_EXTENDED = 0x05;
 constexpr size_t SECTOR = 512;
-
-u64 Below(DICE &dice, u64 limit)
-{
-    return dice() % limit;
-}
-
-bool Chance(DICE &dice, u64 percent)
-{
-    return Below(dice, 100) < percent;
-}
-
-template <typename T>
-const T &Pick(DICE &dice, const vector<T> &items)
-{
-    return items[Below(dice, items.size())];
-}
 
 // ---------------------------------------------------------------------------- which can be real
 
