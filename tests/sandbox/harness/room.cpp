@@ -525,10 +525,14 @@ std::string DriverText(const MACHINE &machine)
 
 } // namespace
 
-const std::string &RoomEnter()
+void RoomEnter()
 {
     static const std::string szRefused = RoomMake();
-    return szRefused;
+    if (!szRefused.empty()) {
+        (void)fflush(stdout);
+        (void)fprintf(stderr, "sandbox: %s\n", szRefused.c_str());
+        exit(EXIT_FAILURE);
+    }
 }
 
 const std::string &RoomRoot()
