@@ -7,8 +7,8 @@
 
 #include <string>
 
-// Goes into the private namespaces at the first call. Where the kernel refuses, the program ends and
-// says why: no test would mean anything.
+// Goes into the private namespaces at the first call. Where the kernel refuses, the program ends
+// and says why: no test would mean anything.
 void RoomEnter();
 
 const std::string &RoomRoot();
