@@ -1086,3 +1086,12 @@ std::string OracleLineMask(const std::string &szLine)
     line = std::regex_replace(line, pid, "pid: * ");
     return std::regex_replace(line, reason, "$1*");
 }
+
+std::string OracleErrorLineMask(const std::string &szLine)
+{
+    static const std::regex stamp("^[A-Z][a-z]{2} [0-9]{2} [0-9]{2}:[0-9]{2}:[0-9]{2} ");
+    if (!std::regex_search(szLine, stamp)) {
+        return "no time stamp before: " + szLine;
+    }
+    return std::regex_replace(szLine, stamp, "", std::regex_constants::format_first_only);
+}

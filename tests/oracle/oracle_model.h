@@ -110,3 +110,6 @@ ORACLE_ANSWER OracleAnswer(const ORACLE_MACHINE &machine, const ORACLE_WORDS &wo
 // A syslog line without what no rule can know: source file, line, process number, the text of
 // errno. The model's own lines come out in that form.
 std::string OracleLineMask(const std::string &szLine);
+
+// A line of the error log without its time stamp.
+std::string OracleErrorLineMask(const std::string &szLine);

@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: MIT
+//
 // Random machines with real disks: prints what the appliance must set up, and compares what was
 // recorded there with the model.
 //
@@ -131,12 +132,8 @@ void LogTake(const string &szFolder, ORACLE_SEEN &seen)
 
 void ErrorLogTake(const string &szFolder, ORACLE_SEEN &seen)
 {
-    static const std::regex stamp("^[A-Z][a-z]{2} [0-9]{2} [0-9]{2}:[0-9]{2}:[0-9]{2} ");
     for (const string &szLine : Split(FileRead(szFolder + "/errors").value_or(""), '\n')) {
-        seen.errorLog.push_back(
-            std::regex_search(szLine, stamp)
-                ? std::regex_replace(szLine, stamp, "", std::regex_constants::format_first_only)
-                : "no time stamp before: " + szLine);
+        seen.errorLog.push_back(OracleErrorLineMask(szLine));
     }
 }
 

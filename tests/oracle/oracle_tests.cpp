@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: MIT
+//
 // Runs the finished program on random machines in the sandbox and asks the model what it must do.
 //
 //     oracle_tests [--machines N] [--seed S] [--jobs J] [--show]
@@ -15,7 +16,6 @@
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
-#include <regex>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -198,21 +198,13 @@ MACHINE MachineLayOut(const ORACLE_CASE &subject, const vector<ORACLE_ANSWER> &a
 // ---------------------------------------------------------------------------- what came of a run
 
 // A line of the operation error log without its time stamp.
-string ErrorLineTake(const string &szLine)
-{
-    static const std::regex stamp("^[A-Z][a-z]{2} [0-9]{2} [0-9]{2}:[0-9]{2}:[0-9]{2} ");
-    return std::regex_search(szLine, stamp)
-               ? std::regex_replace(szLine, stamp, "", std::regex_constants::format_first_only)
-               : "no time stamp before: " + szLine;
-}
-
 vector<string> ErrorLogTake()
 {
     vector<string> lines;
     const string szAll = MachineFileRead(ORACLE_ERROR_LOG_PATH).value_or("");
     for (size_t at = 0; at < szAll.size();) {
         const size_t end = std::min(szAll.find('\n', at), szAll.size());
-        lines.push_back(ErrorLineTake(szAll.substr(at, end - at)));
+        lines.push_back(OracleErrorLineMask(szAll.substr(at, end - at)));
         at = end + 1;
     }
     return lines;
