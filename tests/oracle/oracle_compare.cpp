@@ -69,6 +69,20 @@ ORACLE_ANSWER AnswerAsSeen(ORACLE_ANSWER answer, bool fShellText)
     return answer;
 }
 
+// A shell that is a stand-in only answers.
+string ErrorText(const ORACLE_ANSWER &answer, bool fShellText)
+{
+    string text;
+    for (const ORACLE_PHASE &phase : answer.phases) {
+        for (const ORACLE_STRAND &strand : phase) {
+            for (const ORACLE_ACTION &action : strand.actions) {
+                text += fShellText ? "" : action.szErr;
+            }
+        }
+    }
+    return text;
+}
+
 bool IsCommand(const ORACLE_ACTION &action)
 {
     return action.kind == ORACLE_KIND::COMMAND;
@@ -266,7 +280,7 @@ std::vector<std::string> OracleDifferences(const ORACLE_ANSWER &answer, const OR
     const ORACLE_ANSWER expected = AnswerAsSeen(answer, seen.fShellText);
     TEXTS differences;
     ListCompare("standard output", {expected.szOut}, {seen.szOut}, differences);
-    ListCompare("standard error", {""}, {seen.szErr}, differences);
+    ListCompare("standard error", {ErrorText(answer, seen.fShellText)}, {seen.szErr}, differences);
     ListCompare("exit status", {to_string(expected.nStatus)}, {to_string(seen.nStatus)},
                 differences);
     ListCompare("marker files", TEXTS(expected.markers.begin(), expected.markers.end()),

@@ -202,14 +202,23 @@ int RunChange(PROCESS &process, const ORACLE_WORDS &words)
     return reply.nExit * 256;
 }
 
-// Runs a text through the shell; the answer is the exit status.
+// Runs a text through the shell; the answer is the exit status. A text that is cut before its
+// redirection keeps nothing back, not what the shell says itself either.
 int RunShell(PROCESS &process, const string &szText)
 {
     const ORACLE_WORDS words = OracleShellWords(szText);
     const bool fMissing = process.pMachine->missing.count(words[0]) != 0;
-    const int status = fMissing ? STATUS_NO_PROGRAM : ReplyTake(process, words).nExit;
-    Act(process, {ORACLE_KIND::SHELL, words, szText, status, fMissing});
-    return status;
+    const bool fRedirected = szText.find("2>&1") != string::npos;
+    ORACLE_REPLY reply;
+    if (fMissing) {
+        reply.nExit = STATUS_NO_PROGRAM;
+        reply.szErr = "sh: 1: " + words[0] + ": not found\n";
+    } else {
+        reply = ReplyTake(process, words);
+    }
+    Act(process,
+        {ORACLE_KIND::SHELL, words, szText, reply.nExit, fMissing, fRedirected ? "" : reply.szErr});
+    return reply.nExit;
 }
 
 // ------------------------------------------------------------------------------- configuration

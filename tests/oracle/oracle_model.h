@@ -75,6 +75,7 @@ struct ORACLE_ACTION {
     std::string szText;    // SHELL: what the shell is given; LOG, ERROR_LOG: the line
     int nNumber = 0;       // LOG: priority; SLEEP: seconds; SHELL: exit status
     bool fMissing = false; // SHELL: the tool that the text names does not exist
+    std::string szErr{};   // SHELL: what reaches the tool's own standard error
 };
 
 // What one process does, in its order.
