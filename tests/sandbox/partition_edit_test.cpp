@@ -453,6 +453,7 @@ constexpr LISTED_CASE LISTED_CASES[] = {
     {"/dev/sda1\t2048\t4982527\t4980480\t83\tLinux\n", 4980480, 2048, 0x83},
     {"  /dev/sda1 \t 63   *  \t 4980087  82 \n", 4980087, 63, 0x82},
     {"/dev/sda1 2048 4982527 4980480 fd\n/dev/sda2 1 2 3 4\n", 4980480, 2048, 0xfd},
+    {"/dev/sda~1 2048 4982527 4980480 fd\n", 4980480, 2048, 0xfd}, // no name is asked for
     {"/dev/sda1 1 2 0 f\n", 0, 1, 0xf},
     {"/dev/sda1 1 2 -7 0xee\n", -7, 1, 0xee},
     {"/dev/sda1 18446744073709551615 2 9223372036854775807 ffffffff\n", INT64_MAX, ALL_ONES,

@@ -137,11 +137,13 @@ TEST(HashAlloc, TheAllocatorTakesBothNumbersAsTheyAre)
     EXPECT_EQ(hash.p->cbPool, 20);
     EXPECT_EQ(hash.p->cbFree, 20);
     EXPECT_EQ(Defect(hash.p), "");
+    EXPECT_EQ(TEST_HASH(NLIBCHashAllocator(7, 0)).p->cbFree, 0);
 }
 
 TEST(HashAlloc, WithoutMemoryThereIsNoTable)
 {
     EXPECT_FAILS(NLIBCHashAllocator(-1, 512), nullptr, ERR_OUT_OF_MEMORY);
+    EXPECT_FAILS(NLIBCHashAllocator(7, -1), nullptr, ERR_OUT_OF_MEMORY);
 }
 
 TEST(HashFree, IgnoresNull)
@@ -269,6 +271,17 @@ TEST(HashSet, The25thKeyOf31SlotsFinds119)
     for (int i = 0; i < 24; i++) {
         EXPECT_EQ(ValueOf(hash.p, NumberedKey(i)), "v") << i;
     }
+    EXPECT_EQ(Defect(hash.p), "");
+}
+
+// 4 slots with 3 keys: 1 / 4 is a quarter. With 4: none is free. 4 * 4 - 5 is 11.
+TEST(HashSet, AQuarterOfTheSlotsFreeIsEnough)
+{
+    TEST_HASH hash(NLIBCHashAllocator(4, 512));
+    FillWithPairsOfSixBytes(hash, 4);
+    EXPECT_EQ(hash.p->nSlot, 4);
+    EXPECT_GE(NLIBCHashSet(&hash.p, "k00", "longer"), 0);
+    EXPECT_EQ(hash.p->nSlot, 11);
     EXPECT_EQ(Defect(hash.p), "");
 }
 

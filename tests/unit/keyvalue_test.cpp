@@ -29,6 +29,7 @@ constexpr MATCH_CASE MATCH_CASES[] = {
     {"=maxdisks", "maxdisks", 1}, // the empty field before it is skipped
     {"==maxdisks=4", "maxdisks", 1},
     {"key=a=b", "key", 1},
+    {"!$%&()*+,-./:<>?@[]^_`{|}~=4", "!$%&()*+,-./:<>?@[]^_`{|}~", 1},
     // another key
     {"maxdisks=4", "maxdisk", 0},
     {"maxdisk=4", "maxdisks", 0},
@@ -82,6 +83,7 @@ constexpr VALUE_CASE FIRST_MATCH_CASES[] = {
     {" k = \"4\" \n", "4"},
     {"k=v\r\n", "v"},
     {"k=a=b\n", "a=b"},
+    {"k=!#$%&()*+,-./:;<>?@[]^_`{|}~\n", "!#$%&()*+,-./:;<>?@[]^_`{|}~"},
     {"k==v\n", "=v"},
     {"=k=v\n", "v"},
     {"k=\t two words \n", "two words"},
