@@ -100,20 +100,12 @@ void EveryRowMayRun(MACHINE &machine)
     }
 }
 
-bool IsEmulated()
-{
-    return getenv("ARRAYCTL_RUNNER") != nullptr;
-}
-
-// An emulator and a sanitizer need some for themselves.
-rlim_t DescriptorsNeeded()
-{
+// A sanitizer needs some for itself.
 #ifdef __SANITIZE_ADDRESS__
-    return 64;
+constexpr rlim_t DESCRIPTORS_NEEDED = 64;
 #else
-    return IsEmulated() ? 64 : 0;
+constexpr rlim_t DESCRIPTORS_NEEDED = 0;
 #endif
-}
 
 void LimitSet(__rlimit_resource resource, rlim_t value)
 {
@@ -213,14 +205,14 @@ void LimitedRunEnds(const MACHINE &whole, const std::vector<std::string> &argume
 
 TEST(HostileLimits, FewDescriptorsEndDestroyInOrder)
 {
-    for (rlim_t nDescriptors = DescriptorsNeeded(); nDescriptors <= 64; nDescriptors += 2) {
+    for (rlim_t nDescriptors = DESCRIPTORS_NEEDED; nDescriptors <= 64; nDescriptors += 2) {
         LimitedRunEnds(MirrorToDestroy(), {"destroy", "2"}, RLIMIT_NOFILE, nDescriptors);
     }
 }
 
 TEST(HostileLimits, FewDescriptorsEndInitsysInOrder)
 {
-    for (rlim_t nDescriptors = DescriptorsNeeded(); nDescriptors <= 64; nDescriptors += 4) {
+    for (rlim_t nDescriptors = DESCRIPTORS_NEEDED; nDescriptors <= 64; nDescriptors += 4) {
         LimitedRunEnds(DisksToInit(), {"initsys"}, RLIMIT_NOFILE, nDescriptors);
     }
 }
@@ -234,13 +226,13 @@ TEST(HostileLimits, WithOneDescriptorTooFewAnArrayIsNotFound)
     EXPECT_EQ(result.szOut, "RAID /dev/md2 is not found\n");
 }
 
-// A sanitizer needs terabytes of addresses, an emulator more than the program.
+// A sanitizer needs terabytes of addresses.
 #ifndef __SANITIZE_ADDRESS__
 TEST(HostileLimits, LittleMemoryEndsDestroyInOrder)
 {
     constexpr rlim_t MIB = 1024UL * 1024UL;
     std::vector<rlim_t> limits = {RLIM_INFINITY};
-    for (rlim_t cb = MIB; cb <= 64 * MIB && !IsEmulated(); cb += cb / 16) {
+    for (rlim_t cb = MIB; cb <= 64 * MIB; cb += cb / 16) {
         limits.push_back(cb);
     }
     for (const rlim_t cb : limits) {
@@ -253,7 +245,7 @@ TEST(HostileLimits, ASmallStackIsEnough)
 {
     constexpr rlim_t STACK_SIZE = 256UL * 1024UL;
     MACHINE machine = MirrorToDestroy();
-    machine.prepare = [] { LimitSet(RLIMIT_STACK, IsEmulated() ? STACK_SIZE * 32 : STACK_SIZE); };
+    machine.prepare = [] { LimitSet(RLIMIT_STACK, STACK_SIZE); };
     DestroyTells(machine);
 }
 
