@@ -22,12 +22,7 @@ std::string TrimmedInPlace(std::string text)
 void TokensTell(const std::string &line)
 {
     constexpr char DELIMITERS[] = " \t";
-    std::vector<std::string> expected;
-    for (size_t i = line.find_first_not_of(DELIMITERS); i != std::string::npos;
-         i = line.find_first_not_of(DELIMITERS, i)) {
-        expected.push_back(line.substr(i, line.find_first_of(DELIMITERS, i) - i));
-        i += expected.back().size();
-    }
+    const std::vector<std::string> expected = Words(line, DELIMITERS);
     PNLIBSZLIST pList = NLIBCSzListAlloc(128);
     const int nField = NLIBCStrTok(line.c_str(), DELIMITERS, &pList);
     Claim(nField == static_cast<int>(expected.size()), "as many fields");

@@ -8,6 +8,7 @@
 #include <cstdio>
 #include <string>
 #include <string_view>
+#include <vector>
 
 inline void Claim(bool fHolds, const char *szClaim)
 {
@@ -28,6 +29,18 @@ inline std::string_view TakeUntil(std::string_view &rest, char separator)
     const std::string_view taken = rest.substr(0, rest.find(separator));
     rest.remove_prefix(taken.size() < rest.size() ? taken.size() + 1 : taken.size());
     return taken;
+}
+
+// The words of a text between any of the separators.
+inline std::vector<std::string> Words(std::string_view text, std::string_view separators)
+{
+    std::vector<std::string> words;
+    for (size_t i = text.find_first_not_of(separators); i != std::string_view::npos;
+         i = text.find_first_not_of(separators, i)) {
+        words.emplace_back(text.substr(i, text.find_first_of(separators, i) - i));
+        i += words.back().size();
+    }
+    return words;
 }
 
 // What a function of the C library sees of a text: nothing behind a NUL.

@@ -21,13 +21,7 @@ std::vector<std::string> ModelFields(std::string_view listing)
         first = line;
         return false;
     });
-    std::vector<std::string> fields;
-    for (size_t i = first.find_first_not_of(" \t"); i != std::string::npos && fields.size() < 5;
-         i = first.find_first_not_of(" \t", i)) {
-        fields.push_back(first.substr(i, first.find_first_of(" \t", i) - i));
-        i += fields.back().size();
-    }
-    return fields;
+    return Words(first, " \t");
 }
 
 } // namespace

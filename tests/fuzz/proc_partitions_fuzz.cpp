@@ -18,12 +18,7 @@ PATHS ModelPaths(std::string_view file, std::string_view prefix)
 {
     PATHS paths;
     ForEachLine(file, 1024, [&](const std::string &line) {
-        PATHS fields;
-        for (size_t i = line.find_first_not_of(" \t"); i != std::string::npos;
-             i = line.find_first_not_of(" \t", i)) {
-            fields.push_back(line.substr(i, line.find_first_of(" \t", i) - i));
-            i += fields.back().size();
-        }
+        const std::vector<std::string> fields = Words(line, " \t");
         if (fields.size() == 4) {
             const std::string name = fields[3].substr(0, fields[3].size() - 1);
             if (name.starts_with(prefix)) {
