@@ -539,6 +539,8 @@ TEST(NewvolDualHead, IsToldByTheMarkersFirst)
     EXPECT_EQ(MachineRun(machineNot, {"newvol"}).status, 0);
 }
 
+// ---- in turn -----------------------------------------------------------------------------------
+
 // One disk after the other, in this process: nothing runs side by side.
 TEST(Newvol, HandlesOneDiskAfterTheOther)
 {
