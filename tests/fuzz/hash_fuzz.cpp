@@ -55,15 +55,25 @@ void KeysTell(const NLIBHASH *pHash, const PAIRS &pairs)
     NLIBCSzListFree(pKeys);
 }
 
-// The slot told is where a walk from the key's home comes by.
+// From its home a key goes past slots of others to the one that is told.
+void WalkTells(const NLIBHASH *pHash, const std::string &key, int index)
+{
+    const auto *const pSlots = reinterpret_cast<const NLIBHASH_SLOT *>(pHash + 1);
+    const int nHome = ModelIndex(key, pHash->nSlot);
+    Claim(NLIBCHashIndex(key.c_str(), pHash->nSlot) == nHome, "the home of a key");
+    for (int i = nHome; i != index; i = (i + 1) % pHash->nSlot) {
+        Claim(pSlots[i].pszKey != nullptr && pSlots[i].pszKey != key, "a slot of another key");
+    }
+    Claim(pSlots[index].pszKey == key, "the slot of the key");
+}
+
 void SetTells(PNLIBHASH *ppHash, const std::string &key, const std::string &value, PAIRS &pairs)
 {
     const i32 nSlotBefore = (*ppHash)->nSlot;
     const int index = NLIBCHashSet(ppHash, key.c_str(), value.c_str());
     Claim(index >= 0 && index < (*ppHash)->nSlot, "a slot of the table");
     Claim((*ppHash)->nSlot == nSlotBefore || (*ppHash)->nSlot == nSlotBefore * 4 - 5, "its growth");
-    Claim(NLIBCHashIndex(key.c_str(), (*ppHash)->nSlot) == ModelIndex(key, (*ppHash)->nSlot),
-          "the home of a key");
+    WalkTells(*ppHash, key, index);
     pairs[key] = value;
 }
 
