@@ -2,6 +2,7 @@
 #include "oracle_model.h"
 
 #include <algorithm>
+#include <array>
 #include <climits>
 #include <cstdlib>
 #include <regex>
@@ -1011,9 +1012,9 @@ int Dispatch(ORACLE_ANSWER &answer, PROCESS &parent, const ORACLE_WORDS &words)
 
 } // namespace
 
-const std::array<ORACLE_LAYOUT, 14> &OracleLayouts()
+std::span<const ORACLE_LAYOUT> OracleLayouts()
 {
-    static const std::array<ORACLE_LAYOUT, 14> layouts = {{
+    static constexpr ORACLE_LAYOUT LAYOUTS[] = {
         {1, 0, 0, 63, 273042, 273105, 787185, 273042},
         {2, 0, 0, 63, 4980087, 4980150, 1044225, 257040},
         {3, 0, 0, 63, 530082, 530145, 787185, 16002},
@@ -1028,8 +1029,8 @@ const std::array<ORACLE_LAYOUT, 14> &OracleLayouts()
         {8, 1, 0, 2048, 4980480, 4982528, 4194304, 260352},
         {7, 0, 1, 256, 2097152, 2097408, 5105569, 524288},
         {8, 0, 1, 256, 2097152, 2097408, 5105569, 524288},
-    }};
-    return layouts;
+    };
+    return LAYOUTS;
 }
 
 std::string OracleReplyKey(const ORACLE_WORDS &words)

@@ -5,11 +5,11 @@
 // and a command go in; every command run, every byte printed, every syslog line and the exit
 // status come out. Nothing here runs anything, and nothing here is shared with the tool.
 
-#include <array>
 #include <cstdint>
 #include <map>
 #include <optional>
 #include <set>
+#include <span>
 #include <string>
 #include <utility>
 #include <vector>
@@ -95,7 +95,7 @@ struct ORACLE_ANSWER {
 };
 
 // The geometries, in the order they are searched.
-const std::array<ORACLE_LAYOUT, 14> &OracleLayouts();
+std::span<const ORACLE_LAYOUT> OracleLayouts();
 
 // How a command is looked up in `replies`: its whole text, but without what follows from the run:
 // the first three words where an array is created, program, number and disk where a partition is,

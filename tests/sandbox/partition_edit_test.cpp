@@ -267,7 +267,7 @@ TEST(PartitionCreateVersion, WithoutARowEndsIt)
         {CONF_RAID, 4, "4"},
         {CONF_RAID, 3, "3"},
         {CONF_RAID, 5, "5"},
-        {CONF_RAID, 9, "9"},
+        {CONF_RAID, 99, "99"},
         {CONF_RAID, 0xFFFFFFFF, "-1"},
         {CONF_NO_RAID, 4, "4"},
         {CONF_BUILDIN, 6, "6"},

@@ -44,6 +44,8 @@ constexpr EXPECTED_ROW ROWS[] = {
     {8, 0, 1, {256, 2097408, 7202977}, {2097152, 5105569, 524288}, 524288, {0x83, 0x83, 0x83}},
 };
 
+constexpr int ROW_COUNT = static_cast<int>(std::size(ROWS));
+
 // What a disk with the places of the row is taken for: of two rows alike the first.
 u32 VersionRead(const EXPECTED_ROW &row)
 {
@@ -65,9 +67,9 @@ void PartitionRewrite(int partNum, u64 start, u64 size)
     TextRewrite(szFolder + "/size", std::to_string(size) + "\n");
 }
 
-TEST(PartitionLayoutTable, HoldsTheFourteenRowsInTheirOrder)
+TEST(PartitionLayoutTable, HoldsItsRowsInTheirOrder)
 {
-    for (int row = 0; row < 14; row++) {
+    for (int row = 0; row < ROW_COUNT; row++) {
         SCOPED_TRACE(row);
         const PARTITION_LAYOUT *const pRow = PartitionLayoutAt(row);
         const EXPECTED_ROW &expected = ROWS[row];
@@ -87,16 +89,16 @@ TEST(PartitionLayoutTable, HoldsTheFourteenRowsInTheirOrder)
     }
 }
 
-TEST(PartitionLayoutTable, HasNothingOutsideTheFourteenRows)
+TEST(PartitionLayoutTable, HasNothingOutsideItsRows)
 {
-    for (const int row : {-1, 14, 15, INT_MIN, INT_MAX}) {
+    for (const int row : {-1, ROW_COUNT, ROW_COUNT + 1, INT_MIN, INT_MAX}) {
         EXPECT_EQ(PartitionLayoutAt(row), nullptr) << row;
     }
 }
 
 TEST(PartitionLayoutTable, HasPartitionTwoRightBehindPartitionOne)
 {
-    for (int row = 0; row < 14; row++) {
+    for (int row = 0; row < ROW_COUNT; row++) {
         const PARTITION_LAYOUT *const pRow = PartitionLayoutAt(row);
         ASSERT_NE(pRow, nullptr);
         EXPECT_EQ(pRow->partitions[0].start + pRow->partitions[0].size, pRow->partitions[1].start);
