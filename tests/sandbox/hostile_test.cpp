@@ -165,6 +165,20 @@ TEST(HostileStreams, InitsysNeedsNone)
     InitsysTells(machine);
 }
 
+TEST(HostileStreams, AToolOfTheShellHasAllThree)
+{
+    MACHINE machine = DisksToInit();
+    machine.prepare = [] { (void)close_range(STDIN_FILENO, STDERR_FILENO, 0); };
+    int nCreated = 0;
+    for (const RUN_EVENT &event : MachineRun(machine, {"initsys"}).events) {
+        if (event.kind == EVENT_KIND::COMMAND && event.argv[1] == "-C") {
+            nCreated++;
+            EXPECT_TRUE(event.fNullInput && event.fNullOutput && event.fNullError);
+        }
+    }
+    EXPECT_EQ(nCreated, 2);
+}
+
 TEST(HostileStreams, AReaderThatIsGoneDoesNotChangeTheStatus)
 {
     MACHINE machine = MachineWithMirror();

@@ -133,6 +133,16 @@ TEST(FileGetKeyValue, TheFirstMatchDecides)
     }
 }
 
+TEST(FileGetKeyValue, AKeyMayHoldAnythingButItsSeparator)
+{
+    const TEST_FOLDER folder;
+    const std::string path = folder.Write("conf", "!$%&()*+,-./:<>?@[]^_`{|}~=v\n");
+    char szValue[16] = "";
+    EXPECT_QUIET(NLIBCFileGetKeyValue(path.c_str(), "!$%&()*+,-./:<>?@[]^_`{|}~", szValue, 16, 0),
+                 2);
+    EXPECT_STREQ(szValue, "v");
+}
+
 TEST(FileGetKeyValue, TheLastMatchWinsOnDemand)
 {
     const TEST_FOLDER folder;
