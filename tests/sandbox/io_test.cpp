@@ -51,4 +51,17 @@ TEST(Read, IsTriedThreeTimesWhileInterrupted)
     }
 }
 
+TEST(Read, TakesTheLowestDescriptorToo)
+{
+    MACHINE machine = MachineMake();
+    MachineFile(machine, "/tmp/text", "text");
+    MachineCall(machine, [] {
+        char szText[8] = "";
+        ASSERT_EQ(close(STDIN_FILENO), 0);
+        ASSERT_EQ(open("/tmp/text", O_RDONLY), STDIN_FILENO);
+        EXPECT_EQ(NLIBCRead(STDIN_FILENO, szText, sizeof(szText)), 4);
+        EXPECT_STREQ(szText, "text");
+    });
+}
+
 } // namespace

@@ -98,16 +98,16 @@ TEST(PartitionPathEnum, KeepsADeviceThatIsListedTwice)
 
 TEST(PartitionPathEnum, TakesTheNamesThatBeginWithThePrefix)
 {
-    const MACHINE machine = MachineWithNames({"sda", "sda1", "isda1", "sd", "s", "Sda", "md5"});
+    const MACHINE machine = MachineWithNames({"sda", "sda1", "isda1", "sd", "s", "Sda", "md~5"});
     constexpr PARTITION_ENUM_FILTER SD = {"sd", 0};
     EnumGives(machine, {&SD, 3, "/dev/sd\n/dev/sda\n/dev/sda1\n"});
     constexpr PARTITION_ENUM_FILTER ALL = {"", 0};
     EnumGives(machine, {&ALL, 8,
-                        "/dev/Sda\n/dev/isda1\n/dev/md5\n/dev/name\n/dev/s\n/dev/sd\n/dev/sda\n"
+                        "/dev/Sda\n/dev/isda1\n/dev/md~5\n/dev/name\n/dev/s\n/dev/sd\n/dev/sda\n"
                         "/dev/sda1\n"});
     constexpr PARTITION_ENUM_FILTER NO_PREFIX = {nullptr, 0};
     EnumGives(machine, {&NO_PREFIX, 8,
-                        "/dev/Sda\n/dev/isda1\n/dev/md5\n/dev/name\n/dev/s\n/dev/sd\n/dev/sda\n"
+                        "/dev/Sda\n/dev/isda1\n/dev/md~5\n/dev/name\n/dev/s\n/dev/sd\n/dev/sda\n"
                         "/dev/sda1\n"});
 }
 

@@ -422,6 +422,8 @@ TEST(ComponentSize, TheDriverStandsInTheBlockSection)
         {"tabs", "Block\tdevices:\n\t254\tmdp\n", PARTITIONABLE},
         {"a number on an earlier line", "Block devices:\n254\n\n\nmdp\n", PARTITIONABLE},
         {"the last number counts", "Block devices:\n253 254 mdp\n", PARTITIONABLE},
+        {"one that begins with a 9, too", "Block devices:\n254 9 mdp\n", PLAIN},
+        {"or with a 0", "Block devices:\n254 0 mdp\n", PLAIN},
         {"words between keep the number", "Block devices:\n254 sd mdp\n", PARTITIONABLE},
         {"a number from the other section", "254 mem\nBlock devices:\nmdp\n", PARTITIONABLE},
         {"a number with text behind it", "Block devices:\n254abc mdp\n", PARTITIONABLE},
@@ -672,6 +674,16 @@ TEST(RaidRequest, NullIsABadParameter)
         EXPECT_EQ(NLIBCErrGet(), 0x0D00U);
     });
     EXPECT_EQ(LogText(result), "");
+}
+
+TEST(RaidRequest, NoDescriptorIsTooLow)
+{
+    MachineCall(ArrayMake({.nMd = 2}), [] {
+        RAID_REBUILD_STATUS rebuild = {};
+        ASSERT_EQ(close(STDIN_FILENO), 0);
+        ASSERT_EQ(open("/dev/md2", O_RDONLY), STDIN_FILENO);
+        EXPECT_EQ(RAIDRebuildStatusGet(STDIN_FILENO, &rebuild), 0);
+    });
 }
 
 TEST(RaidRequest, TheArrayInformationIsTheDriversRecord)
