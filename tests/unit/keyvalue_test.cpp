@@ -32,6 +32,7 @@ constexpr MATCH_CASE MATCH_CASES[] = {
     {"!$%&()*+,-./:<>?@[]^_`{|}~=4", "!$%&()*+,-./:<>?@[]^_`{|}~", 1},
     // another key
     {"maxdisks=4", "maxdisk", 0},
+    {"~maxdisks=4", "maxdisks", 0},
     {"maxdisk=4", "maxdisks", 0},
     {"Maxdisks=4", "maxdisks", 0},
     {"other=maxdisks", "maxdisks", 0},
