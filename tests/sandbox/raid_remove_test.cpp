@@ -365,6 +365,19 @@ TEST(RAIDUUIDHashForRemoveGet, FailsWithoutTheKernelsList)
               "<11>raid_remove.cpp:# Fail to enum partition path\n");
 }
 
+TEST(RAIDUUIDHashForRemoveGet, AMachineWithoutPartitionsIsNoFailure)
+{
+    MACHINE machine = MachineMake();
+    MachineFile(machine, "/proc/partitions", "\n");
+    const RUN_RESULT result = MachineCall(machine, [] {
+        PNLIBHASH pMap = NLIBCHashAlloc(512);
+        EXPECT_EQ(RAIDUUIDHashForRemoveGet(&pMap), 0);
+        EXPECT_EQ(pMap->nEntry, 0);
+        NLIBCHashFree(pMap);
+    });
+    EXPECT_EQ(LogText(result), "");
+}
+
 TEST(RAIDUUIDHashForRemoveGet, FailsWithoutMemoryForItsList)
 {
     MACHINE machine = MachineWithMirror();

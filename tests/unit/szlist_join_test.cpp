@@ -200,6 +200,7 @@ const OR_CASE OR_CASES[] = {
     {"without case, new", {"B", "x"}, 0, {"b"}, 16, SZLIST_OR_NEW, {"b", "x"}, 0},
     {"A without items", {}, 0, {"b", "c"}, 1, IN_PLACE, {"b", "c"}, 0},
     {"B without items", {"a"}, 0, {}, 1, IN_PLACE, {"a"}, 0},
+    {"B without items, new", {"b", "a"}, 0, {}, 1, SZLIST_OR_NEW, {"b", "a"}, 0},
     // both unsorted
     {"unsorted, in place", {"b", "a"}, 0, {"c", "a"}, 0, IN_PLACE, {"b", "a", "c"}, 0},
     {"unsorted, in place by bytes", {"a"}, 0, {"A"}, 0, IN_PLACE, {"a", "A"}, 0},
