@@ -658,6 +658,17 @@ TEST(SyncAction, TheTextIsAPrefixOfItsWord)
     }
 }
 
+TEST(SyncAction, OfArrayZeroIsOneToo)
+{
+    MACHINE machine = MachineMake();
+    MachineMdAdd(machine, {.nMd = 0, .szSyncAction = "check\n"});
+    MachineCall(machine, [] {
+        int action = 99;
+        EXPECT_EQ(RAIDSyncActionGet(0, &action), 0);
+        EXPECT_EQ(action, 4);
+    });
+}
+
 TEST(SyncAction, Fails)
 {
     MACHINE machine = MachineMake();
