@@ -85,7 +85,7 @@ TEST(SzListJoin, LeavesTheBufferToAnEmptyList)
     const TEST_LIST list;
     JOIN_BUFFER buffer(3);
     EXPECT_QUIET(NLIBCSzListJoin(list.p, ",", &buffer.psz, &buffer.cb), 0);
-    EXPECT_EQ(memcmp(buffer.psz, "XXX", 3), 0);
+    EXPECT_EQ(std::string(buffer.psz, 3), std::string(3, 'X'));
     EXPECT_EQ(buffer.cb, 3);
 }
 
