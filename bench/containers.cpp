@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: MIT
 //
-// The house's containers beside those of the C++ library: time, and the heap that a filled one
+// The project's containers beside those of the C++ library: time, and the heap that a filled one
 // holds.
 //
 //   containers             Google Benchmark; takes its options (--benchmark_filter=push ...)

@@ -122,8 +122,8 @@ each() {
     $1 empty /appliance/bench/empty
     $1 usage /sbin/arrayctl help
     $1 usage_lazy /appliance/bench/arrayctl_lazy help
-    $1 floor /appliance/bench/floor 2
-    $1 floor_bound /appliance/bench/floor_bound 2
+    $1 minimal /appliance/bench/minimal 2
+    $1 minimal_bound /appliance/bench/minimal_bound 2
     $1 status /sbin/arrayctl status 2
     $1 status_lazy /appliance/bench/arrayctl_lazy status 2
     $1 detail /usr/sbin/mdadm --detail /dev/md2
@@ -149,12 +149,12 @@ mirror_again() {
 growth() {
     for size in 2 4; do
         count "status-$size" /sbin/arrayctl status "$size"
-        count "floor-$size" /appliance/bench/floor "$size"
+        count "minimal-$size" /appliance/bench/minimal "$size"
     done
     for size in 32 16 8; do
         [ "$size" = 32 ] || mirror_again "$size"
         count "status-$size" /sbin/arrayctl status 32
-        count "floor-$size" /appliance/bench/floor 32
+        count "minimal-$size" /appliance/bench/minimal 32
     done
 }
 

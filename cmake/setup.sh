@@ -10,14 +10,14 @@ PACKAGES=(
     clang-14 clang-tidy-14       # the second compiler, the linter
     clang-format-14              # the layout of the source
     cppcheck shellcheck codespell
-    googletest libgtest-dev      # unit, sandbox and fault rings
+    googletest libgtest-dev      # unit, sandbox and fault suites
     pkg-config libfdisk-dev      # the stand-in partitioner
     fdisk util-linux             # reading back what the partitioner wrote
     python3                      # include-direction check, small reports
     binutils strace              # readelf and system-call counts
     libbenchmark-dev             # the containers beside the standard ones
-    libclang-rt-14-dev           # the fuzz ring
-    valgrind                     # the valgrind ring, instruction counts
+    libclang-rt-14-dev           # the fuzz suite
+    valgrind                     # the valgrind suite, instruction counts
     qemu-system-x86 qemu-utils   # the virtual appliance
     busybox-static kmod cpio gzip xz-utils
     g++-powerpc-linux-gnu        # the appliance's own processor: the compiler,

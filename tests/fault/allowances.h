@@ -5,7 +5,7 @@
 //
 // The tool works on with what it can learn: a question without an answer has a fixed answer, and a
 // step that fails has a fixed consequence. Scripts count on both, so they are kept; what they lead
-// to is listed here, the unpleasant cases first. A difference that no row allows fails the ring.
+// to is listed here, the unpleasant cases first. A difference that no row allows fails the suite.
 
 enum class DIFFERENCE {
     OTHER_DISK,    // a change of a disk or array that the undisturbed run leaves alone

@@ -2,7 +2,7 @@
 //
 // Makes every call into the C library that can fail, fail in turn: once only, and from the n-th on.
 //
-//     fault_tests [--all] [--every N] [--thin N] [--jobs J] [--only TEXT] [--floor FILE] [--show]
+//     fault_tests [--all] [--every N] [--thin N] [--jobs J] [--only TEXT] [--minimum FILE] [--show]
 //
 // Without --all, each call of each process of each situation fails once, with one of its error
 // numbers, and of the rest a part is run: one in N. --thin takes one in N of all that would be run,
@@ -41,7 +41,7 @@ struct OPTIONS {
     size_t thin = 1;
     size_t jobs = JOBS_DEFAULT;
     string szOnly = {};
-    string szFloor = {};
+    string szMinimum = {};
 };
 
 // ---- what can fail how -------------------------------------------------------------------------
@@ -318,7 +318,8 @@ void WorkerRead(const std::vector<SITUATION> &situations, FILE *pIn, TOTALS &tot
     (void)fclose(pIn);
 }
 
-// ---- the floor ---------------------------------------------------------------------------------
+// ---- the minimum
+// ---------------------------------------------------------------------------------
 
 struct COUNTS {
     size_t passed = 0;
@@ -334,26 +335,26 @@ void CountCheck(COUNTS &counts, bool fPassed, const string &szWhat)
 }
 
 // Lines "COMMAND NUMBER": no fewer injections than were once reached.
-void FloorCheck(const OPTIONS &options, const TOTALS &totals, COUNTS &counts)
+void MinimumCheck(const OPTIONS &options, const TOTALS &totals, COUNTS &counts)
 {
-    FILE *const pFloor = fopen(options.szFloor.c_str(), "r");
-    if (pFloor == nullptr) {
-        CountCheck(counts, false, "cannot read " + options.szFloor);
+    FILE *const pMinimum = fopen(options.szMinimum.c_str(), "r");
+    if (pMinimum == nullptr) {
+        CountCheck(counts, false, "cannot read " + options.szMinimum);
         return;
     }
     char szCommand[64] = "";
-    size_t floor = 0;
-    while (fscanf(pFloor, "%63s %zu", szCommand, &floor) == 2) {
+    size_t minimum = 0;
+    while (fscanf(pMinimum, "%63s %zu", szCommand, &minimum) == 2) {
         const auto found = totals.byCommand.find(szCommand);
         const size_t reached = found == totals.byCommand.end() ? 0 : found->second;
-        CountCheck(counts, reached >= floor,
+        CountCheck(counts, reached >= minimum,
                    string(szCommand) + " has " + to_string(reached) + " injections, it had " +
-                       to_string(floor));
+                       to_string(minimum));
     }
-    (void)fclose(pFloor);
+    (void)fclose(pMinimum);
 }
 
-// ---- the ring ----------------------------------------------------------------------------------
+// ---- the suite ----------------------------------------------------------------------------------
 
 void TotalsPrint(const TOTALS &totals)
 {
@@ -393,8 +394,8 @@ int RingRun(const OPTIONS &options)
                    situations[i].szName);
     }
     TotalsPrint(totals);
-    if (!options.szFloor.empty()) {
-        FloorCheck(options, totals, counts);
+    if (!options.szMinimum.empty()) {
+        MinimumCheck(options, totals, counts);
     }
     const auto seconds = std::chrono::duration_cast<std::chrono::seconds>(CLOCK::now() - start);
     printf("fault: %zu situations, %lld s\n", situations.size(),
@@ -407,7 +408,7 @@ int RingRun(const OPTIONS &options)
 int Usage()
 {
     fprintf(stderr, "usage: fault_tests [--all] [--every N] [--thin N] [--jobs J] "
-                    "[--only TEXT] [--floor FILE] [--show]\n");
+                    "[--only TEXT] [--minimum FILE] [--show]\n");
     return EXIT_FAILURE;
 }
 
@@ -415,8 +416,8 @@ bool OptionTake(OPTIONS &options, const string &szName, const char *szValue)
 {
     if (szName == "--only") {
         options.szOnly = szValue;
-    } else if (szName == "--floor") {
-        options.szFloor = szValue;
+    } else if (szName == "--minimum") {
+        options.szMinimum = szValue;
     } else if (szName == "--every") {
         options.every = strtoul(szValue, nullptr, 10);
     } else if (szName == "--thin") {

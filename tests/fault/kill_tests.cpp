@@ -7,7 +7,7 @@
 //
 // The tool is killed alone, so that what it has started comes to its own end, or with all of that
 // at any system call of its own processes. Without --all, one in N points is tried.
-#include "harness/room.h"
+#include "harness/private_root.h"
 #include "pattern.h"
 #include "sandbox.h"
 #include "storage_machine.h"
@@ -35,7 +35,7 @@ namespace fs = std::filesystem;
 
 constexpr size_t EVERY_DEFAULT = 3; // odd, so that both kinds of killing get their turn
 constexpr size_t JOBS_DEFAULT = 2;
-constexpr size_t FLOOR = 1000;
+constexpr size_t MINIMUM = 1000;
 constexpr size_t SHOWN = 5;
 constexpr int RUN_BOUND = 30000; // milliseconds; the machine may be busy with something else
 constexpr char RUNNER[] = "ARRAYCTL_RUNNER";
@@ -321,7 +321,7 @@ TALLY CaseRun(const OPTIONS &options, const KILL_CASE &subject, size_t worker)
     return tally;
 }
 
-// ---- the ring ----------------------------------------------------------------------------------
+// ---- the suite ----------------------------------------------------------------------------------
 
 // A worker tells of a case in one line; what is wrong is shown at once.
 void WorkerStart(const OPTIONS &options, const std::vector<KILL_CASE> &cases, size_t worker,
@@ -379,7 +379,7 @@ int TotalsPrint(const OPTIONS &options, const std::vector<KILL_CASE> &cases,
         }
         printf("\n");
     }
-    const bool fEnough = !options.szOnly.empty() || kills >= FLOOR;
+    const bool fEnough = !options.szOnly.empty() || kills >= MINIMUM;
     printf("kill: %zu points\n", kills);
     printf("kill: %zu passed, %zu failed\n", cases.size() - failed + (fEnough ? 1 : 0),
            failed + (fEnough ? 0 : 1));

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: MIT
 //
-// The input is /proc/devices. The room itself is compiled in: its answer is cached for the life of
+// The input is /proc/devices. The module itself is compiled in: its answer is cached for the life of
 // a process, and the words are read behind that.
 #include "raid/raid_info.cpp"
 

@@ -253,7 +253,8 @@ CONF_LINE ConfLineRead(const string &szLine, const string &szKey)
 }
 
 // The first line with the key decides.
-FOUND KeyValueGet(PROCESS &process, const optional<string> &szFile, const string &szKey, int room)
+FOUND KeyValueGet(PROCESS &process, const optional<string> &szFile, const string &szKey,
+                  int cbValue)
 {
     if (!szFile) {
         process.code = CODE_OPEN;
@@ -268,7 +269,7 @@ FOUND KeyValueGet(PROCESS &process, const optional<string> &szFile, const string
             break;
         }
         const int needed = static_cast<int>(line.szValue->size()) + 1;
-        if (needed > room) {
+        if (needed > cbValue) {
             process.code = CODE_TOO_SMALL;
             return {-1, ""};
         }
@@ -278,9 +279,9 @@ FOUND KeyValueGet(PROCESS &process, const optional<string> &szFile, const string
     return {0, ""};
 }
 
-FOUND ConfGet(PROCESS &process, const string &szKey, int room)
+FOUND ConfGet(PROCESS &process, const string &szKey, int cbValue)
 {
-    return KeyValueGet(process, process.pMachine->szConf, szKey, room);
+    return KeyValueGet(process, process.pMachine->szConf, szKey, cbValue);
 }
 
 bool ConfIsYes(PROCESS &process, const string &szKey)

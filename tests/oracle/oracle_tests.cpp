@@ -297,7 +297,7 @@ string AnswerText(const ORACLE_ANSWER &answer)
            "\n";
 }
 
-// ------------------------------------------------------------------------------------- the ring
+// ------------------------------------------------------------------------------------- the suite
 
 bool CaseRun(const OPTIONS &options, u64 seed)
 {

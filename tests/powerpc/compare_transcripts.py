@@ -1,6 +1,6 @@
 #!/usr/bin/env python3
 # SPDX-License-Identifier: MIT
-"""Compares what the sandbox ring kept of its runs on two processors.
+"""Compares what the sandbox suite kept of its runs on two processors.
 
 usage: compare_transcripts.py FOLDER FOLDER
 

@@ -69,7 +69,7 @@ def commands():
 # --- how each command of the docs is run ---------------------------------------------------------
 
 def by_check(command):
-    """The ring runs inside ./check; its words are those that it knows."""
+    """The suite runs inside ./check; its words are those that it knows."""
     known = run("./check", "--help")
     for word in command.split()[1:]:
         assert re.search(rf"(^|\s){re.escape(word)}(\s|$)", known), f"./check knows no {word}"
@@ -115,7 +115,7 @@ def by_install(command):
 
 
 def by_options(command):
-    """A machine is booted for the story and by the appliance ring; the options are those of the help."""
+    """A machine is booted for the story and by the appliance suite; the options are those of the help."""
     program, *words = command.split()
     known = run(program, "--help") if program != "tests/appliance/run-all" else read(program)
     for word in words:
@@ -180,10 +180,10 @@ def case_every_command_of_the_docs_is_run():
 
 # --- the rest ------------------------------------------------------------------------------------
 
-def case_the_rings_that_are_told_of_exist():
-    table = re.search(r"\| ring \|.*?\n\n", read("CONTRIBUTING.md"), re.S).group(0)
+def case_the_suites_that_are_told_of_exist():
+    table = re.search(r"\| suite \|.*?\n\n", read("CONTRIBUTING.md"), re.S).group(0)
     told = re.findall(r"^\| ([\w-]+) \|", table, re.M)[1:]
-    known = re.search(r"^rings: (.*)", run("./check", "--help"), re.M).group(1).split()
+    known = re.search(r"^suites: (.*)", run("./check", "--help"), re.M).group(1).split()
     assert len(told) >= 10 and set(told) <= set(known), f"not in ./check: {sorted(set(told) - set(known))}"
 
 
@@ -207,7 +207,7 @@ def case_the_pictures_are_current():
     with tempfile.TemporaryDirectory() as folder:
         run("docs/pictures/make", "--to", folder)
         made = sorted(os.listdir(folder))
-        cases.same(made, ("demo.svg", "layouts.svg", "rooms.svg"), "pictures")
+        cases.same(made, ("demo.svg", "layouts.svg", "modules.svg"), "pictures")
         for name in made:
             current = filecmp.cmp(os.path.join(folder, name), os.path.join(ROOT, "docs/pictures", name), shallow=False)
             assert current, f"docs/pictures/{name} is out of date: run docs/pictures/make"

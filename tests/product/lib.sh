@@ -1,7 +1,7 @@
 # shellcheck shell=bash
 # SPDX-License-Identifier: MIT
 #
-# Cases of the product ring that are shell: each is a command that has to succeed.
+# Cases of the product suite that are shell: each is a command that has to succeed.
 
 nPassed=0
 nFailed=0

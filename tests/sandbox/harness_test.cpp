@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: MIT
 //
-// The ring must notice what it is there to notice.
+// The suite must notice what it is there to notice.
 #include "sandbox.h"
 
 #include "nurocore/process.h"
@@ -341,7 +341,7 @@ TEST(Harness, CommandsTellTheirSurroundings)
     EXPECT_FALSE(result.events[1].fNullError);
 }
 
-// Other rings run tens of thousands of machines. Processor time, because the machine may be
+// Other suites run tens of thousands of machines. Processor time, because the machine may be
 // shared; a wide bound, because a build with sanitizers passes too.
 TEST(Harness, ARunIsCheap)
 {

@@ -18,7 +18,7 @@
 #include <unistd.h>
 
 // What the core library says in the log when a process cannot be made as asked, or a list is asked
-// for what it cannot do. How these functions work otherwise is tested in the unit ring.
+// for what it cannot do. How these functions work otherwise is tested in the unit suite.
 
 namespace
 {

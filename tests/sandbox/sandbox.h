@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: MIT
 #pragma once
 
-// The sandbox ring: the finished, unmodified program and its libraries inside a private root.
+// The sandbox suite: the finished, unmodified program and its libraries inside a private root.
 //
 // A test says what the machine is like (MACHINE), runs the program on it (MachineRun) or a piece of
 // test code beside the libraries (MachineCall), and compares what came of it (RUN_RESULT):

@@ -6,12 +6,12 @@
 #include "nurocore/types.h"
 #include "nurostoragecore/raid_disk.h"
 
-// The kernel's header names array states that the house does not use; it comes with its types.
+// The kernel's header names array states that nothing here uses; its types are needed.
 #include <linux/types.h>
 
 #include <linux/raid/md_u.h>
 
-// Single bits, so that a set of levels is tested with one mask. 0 is a level the house has not.
+// Single bits, so that a set of levels is tested with one mask. 0 stands for any other level.
 constexpr u32 RAID_LEVEL_0 = 1;
 constexpr u32 RAID_LEVEL_1 = 2;
 constexpr u32 RAID_LEVEL_5 = 4;

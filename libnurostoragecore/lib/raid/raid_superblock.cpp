@@ -59,7 +59,7 @@ int RaidDevicesTake(char *szValue, RAID_SUPERBLOCK *pSuperblock)
 
 int LevelTake(char *szValue, RAID_SUPERBLOCK *pSuperblock)
 {
-    // Kept: a level the house has not counts as RAID 5, callers expect it of an unknown one.
+    // Kept: an unknown level counts as RAID 5; callers expect that.
     pSuperblock->level = RAID_LEVEL_5;
     for (const LEVEL_WORD &row : LEVEL_WORDS) {
         if (strcmp(szValue, row.szWord) == 0) {

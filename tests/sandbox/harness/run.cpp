@@ -2,7 +2,7 @@
 #include "sandbox.h"
 
 #include "interpose.h"
-#include "room.h"
+#include "private_root.h"
 #include "transcript.h"
 #include "wire.h"
 

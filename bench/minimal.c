@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: MIT
 //
-// The floor under `arrayctl status N`: the same requests and reads in plain C, and nothing else. No
-// failure is looked into, nothing is logged, no word is chosen; a report cannot cost less.
+// What `arrayctl status N` cannot do without: the same requests and reads in plain C, and nothing
+// else. No failure is looked into, nothing is logged, no word is chosen; a report cannot cost less.
 #include <dirent.h>
 #include <fcntl.h>
 #include <linux/fs.h>

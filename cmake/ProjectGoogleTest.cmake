@@ -1,6 +1,6 @@
 # SPDX-License-Identifier: MIT
 #
-# GoogleTest for every ring: the installed library when it fits the target, else its sources
+# GoogleTest for every suite: the installed library when it fits the target, else its sources
 # (32-bit and foreign targets).
 find_package(GTest CONFIG QUIET)
 if(NOT TARGET GTest::gtest_main)

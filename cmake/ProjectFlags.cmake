@@ -1,6 +1,6 @@
 # SPDX-License-Identifier: MIT
 #
-# The flags of the house: what every target is compiled with, and what the shipped code adds.
+# Compiler flags: what every target is compiled with, and what the shipped code adds.
 
 set(CMAKE_CXX_STANDARD 20)
 set(CMAKE_CXX_STANDARD_REQUIRED ON)
@@ -16,33 +16,33 @@ if(NOT CMAKE_BUILD_TYPE)
 endif()
 
 # Everybody: tests and platform pieces as well as the tool.
-add_library(house_warnings INTERFACE)
-target_compile_options(house_warnings INTERFACE
+add_library(project_warnings INTERFACE)
+target_compile_options(project_warnings INTERFACE
     -Wall -Wextra -Wpedantic -Wconversion -Wshadow -Wformat=2 -Werror)
-target_compile_definitions(house_warnings INTERFACE
+target_compile_definitions(project_warnings INTERFACE
     _GNU_SOURCE _FILE_OFFSET_BITS=64 _TIME_BITS=64)
 
 # The same source gives the same bytes, whatever folder it is built in.
-target_compile_options(house_warnings INTERFACE
+target_compile_options(project_warnings INTERFACE
     "-ffile-prefix-map=${CMAKE_SOURCE_DIR}=." "-ffile-prefix-map=${CMAKE_BINARY_DIR}=build")
 
 # The tool and its libraries need nothing of the C++ runtime library: start-up costs what a C
 # program's start-up costs.
-add_library(house_tool INTERFACE)
-target_link_libraries(house_tool INTERFACE house_warnings)
-target_compile_options(house_tool INTERFACE
+add_library(project_product INTERFACE)
+target_link_libraries(project_product INTERFACE project_warnings)
+target_compile_options(project_product INTERFACE
     $<$<COMPILE_LANGUAGE:CXX>:-fno-exceptions;-fno-rtti;-fno-threadsafe-statics>
     -fvisibility=hidden -fstack-protector-strong)
-target_compile_options(house_tool INTERFACE
+target_compile_options(project_product INTERFACE
     $<$<CONFIG:Release>:-U_FORTIFY_SOURCE;-D_FORTIFY_SOURCE=2;-ffunction-sections;-fdata-sections>
     # Nothing unwinds: there are no exceptions, and a debugger has its own tables.
     $<$<CONFIG:Release>:-fno-unwind-tables;-fno-asynchronous-unwind-tables>)
 
-# A library of the house: NAME, the floors below it, and its sources.
-function(add_house_library szName)
-    cmake_parse_arguments(PARSE_ARGV 1 HOUSE "" "" "SOURCES;USES")
-    add_library(${szName} STATIC ${HOUSE_SOURCES})
+# A library of the product: NAME, the layers below it, and its sources.
+function(add_layer szName)
+    cmake_parse_arguments(PARSE_ARGV 1 LAYER "" "" "SOURCES;USES")
+    add_library(${szName} STATIC ${LAYER_SOURCES})
     set_target_properties(${szName} PROPERTIES OUTPUT_NAME ${szName} PREFIX "")
     target_include_directories(${szName} PUBLIC include PRIVATE lib)
-    target_link_libraries(${szName} PUBLIC ${HOUSE_USES} PRIVATE house_tool)
+    target_link_libraries(${szName} PUBLIC ${LAYER_USES} PRIVATE project_product)
 endfunction()

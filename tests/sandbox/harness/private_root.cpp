@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: MIT
-#include "room.h"
+#include "private_root.h"
 
 #include "wire.h"
 
@@ -34,13 +34,13 @@ constexpr const char *TOOL_PATHS[] = {
 // The host's shell, unless the machine has another.
 constexpr const char *SHELL_PATH = "/bin/sh";
 
-// What survives the emptying of the room, folder by folder.
+// What survives the emptying of the private root, folder by folder.
 const std::set<std::string> KEPT_TOP = {"usr", "lib", "lib32", "lib64",   "libx32",
                                         "bin", "dev", "sbin",  ".sandbox"};
 const std::set<std::string> KEPT_DEV = {"null", "log", "log.away"};
 
 constexpr const char *HINT =
-    "; this kernel or container refuses what the sandbox needs: run the ring in the virtual "
+    "; this kernel or container refuses what the sandbox needs: run the suite in the virtual "
     "appliance";
 
 [[noreturn]] void Die(const std::string &szWhat)
@@ -278,7 +278,7 @@ const std::set<std::string> &KeptNothing()
 }
 
 // Removes what is in the folder, never leaving its file system, so that nothing that is bound into
-// the room can be reached.
+// the private root can be reached.
 void FolderEmpty(int fdParent, const char *szName, dev_t device, const std::set<std::string> &kept)
 {
     const int fd = openat(fdParent, szName, O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);

@@ -16,7 +16,7 @@ const std::string &RoomRoot();
 // The socket that is the machine's /dev/log.
 int RoomLogSocket();
 
-// Empties the room and lays the machine out in it.
+// Empties the private root and lays the machine out in it.
 void RoomLayOut(const MACHINE &machine);
 
 // Writes what stand-ins and driver answer, and starts a new transcript; files are left alone.
