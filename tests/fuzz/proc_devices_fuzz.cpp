@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: MIT
 //
-// The input is /proc/devices. The module itself is compiled in: its answer is cached for the life of
-// a process, and the words are read behind that.
+// The input is /proc/devices. The module itself is compiled in: its answer is cached for the life
+// of a process, and the words are read behind that.
 #include "raid/raid_info.cpp"
 
 #include "fuzz.h"
