@@ -7,7 +7,7 @@
 //
 // The tool is killed alone, so that what it has started comes to its own end, or with all of that
 // at any system call of its own processes. Without --all, one in N points is tried.
-#include "harness/private_root.h"
+#include "private_root.h"
 #include "pattern.h"
 #include "sandbox.h"
 #include "storage_machine.h"

@@ -6,7 +6,7 @@
 //
 // Machine i is made from seed S + i (S is the environment's ORACLE_SEED unless given), so a failing
 // one comes back with "--machines 1 --seed" and its seed. --show prints machines and answers.
-#include "harness/wire.h"
+#include "wire.h"
 #include "oracle_compare.h"
 #include "oracle_machine.h"
 #include "oracle_model.h"

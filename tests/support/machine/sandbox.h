@@ -112,7 +112,7 @@ struct MACHINE_DEVICE_SIZE {
 
 // The n-th call of a libc function fails with an errno; with fGoOn every later one too. Counted in
 // each process by itself, and told in the transcript as "fault NAME N". What can be made to fail is
-// the table in harness/interpose.cpp; the function "*" is every one of them.
+// the table in interpose.cpp; the function "*" is every one of them.
 //
 // A fault of one process counts that one's calls only: "0" is the program, "0.2" the second process
 // that it forked, "0.2.1" the first one of that; told as "fault NAME N PROCESS OBJECT" in one word
