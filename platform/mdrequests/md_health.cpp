@@ -180,12 +180,17 @@ void SlotsRead(const char *szMdDir, MD_ATTRIBUTES *pAttributes)
     }
 }
 
+bool StateRead(const char *szMdDir, MD_ATTRIBUTES *p)
+{
+    return AttributeRead(szMdDir, "array_state", p->szArrayState, sizeof(p->szArrayState));
+}
+
 } // namespace
 
 int MdAttributesRead(const char *szMdDir, MD_ATTRIBUTES *p)
 {
     *p = {};
-    if (!AttributeRead(szMdDir, "array_state", p->szArrayState, sizeof(p->szArrayState))) {
+    if (!StateRead(szMdDir, p)) {
         return -1;
     }
     AttributeRead(szMdDir, "level", p->szLevel, sizeof(p->szLevel));
@@ -196,7 +201,9 @@ int MdAttributesRead(const char *szMdDir, MD_ATTRIBUTES *p)
     AttributeRead(szMdDir, "sync_completed", p->szSyncCompleted, sizeof(p->szSyncCompleted));
     AttributeRead(szMdDir, "resync_start", p->szResyncStart, sizeof(p->szResyncStart));
     SlotsRead(szMdDir, p);
-    return 0;
+    // An array that is stopped meanwhile leaves empty texts, which look like one in good health. Its
+    // state is there before the others and gone with them, so what counts is the state at the end.
+    return StateRead(szMdDir, p) ? 0 : -1;
 }
 
 bool MdIsRunning(const MD_ATTRIBUTES *pAttributes)

@@ -8,6 +8,8 @@
 #include <fstream>
 #include <gtest/gtest.h>
 #include <string>
+#include <sys/stat.h>
+#include <thread>
 #include <vector>
 
 namespace
@@ -270,6 +272,53 @@ TEST_F(MdFolder, MoreSlotsThanAnyFormatAllowsAreNotRead)
     EXPECT_FALSE(attributes.fInSync[0]);
     EXPECT_FALSE(attributes.fInSync[MD_MAX_SLOTS - 1]);
     EXPECT_EQ(MdHealthGet(&attributes), MD_HEALTH_CRASHED);
+}
+
+// The level is a pipe: who reads it waits until the test has changed the rest and writes it.
+struct MdFolderThatChanges : MdFolder {
+    void SetUp() override
+    {
+        MdFolder::SetUp();
+        Write("array_state", "clean\n");
+        Write("raid_disks", "2\n");
+        Write("rd0/state", "in_sync\n");
+        Write("rd1/state", "in_sync\n");
+        ASSERT_EQ(mkfifo((root / "level").c_str(), 0600), 0);
+    }
+    template <typename CHANGE>
+    int ReadWhile(MD_ATTRIBUTES *pAttributes, CHANGE change) const
+    {
+        std::thread changer([this, change] {
+            std::ofstream level(root / "level");
+            change();
+            level << "raid1\n";
+        });
+        const int result = MdAttributesRead(root.c_str(), pAttributes);
+        changer.join();
+        return result;
+    }
+};
+
+TEST_F(MdFolderThatChanges, AnArrayThatVanishesBetweenTwoReadsIsNone)
+{
+    MD_ATTRIBUTES attributes;
+    EXPECT_EQ(ReadWhile(&attributes, [this] { std::filesystem::remove(root / "array_state"); }), -1);
+}
+
+TEST_F(MdFolderThatChanges, AnArrayThatStopsBetweenTwoReadsDoesNotRun)
+{
+    MD_ATTRIBUTES attributes;
+    ASSERT_EQ(ReadWhile(&attributes, [this] { Write("array_state", "clear\n"); }), 0);
+    EXPECT_FALSE(MdIsRunning(&attributes));
+}
+
+TEST_F(MdFolderThatChanges, AnArrayThatStaysIsReadToItsEnd)
+{
+    MD_ATTRIBUTES attributes;
+    ASSERT_EQ(ReadWhile(&attributes, [] {}), 0);
+    EXPECT_TRUE(MdIsRunning(&attributes));
+    EXPECT_STREQ(attributes.szLevel, "raid1");
+    EXPECT_EQ(MdHealthGet(&attributes), MD_HEALTH_NORMAL);
 }
 
 TEST_F(MdFolder, APathThatDoesNotFitIsNoArray)
