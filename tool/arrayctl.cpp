@@ -2,6 +2,7 @@
 //
 // The command line: words in, words out. What is meant for people goes to standard output, what is
 // meant for developers to syslog, nothing to standard error.
+#include "hwcontrol/device_path.h"
 #include "hwcontrol/disk_name.h"
 #include "hwcontrol/disk_path.h"
 #include "hwcontrol/disk_port.h"
@@ -39,7 +40,6 @@ constexpr int STATUS_FAILED = 1;
 
 constexpr size_t MD_PATH_SIZE = 64;
 constexpr int DISK_LIST_SIZE = 1024;
-constexpr size_t DEVICE_PATH_SIZE = 32;
 constexpr size_t MEMBER_LIST_SIZE = 512;
 constexpr size_t CREATE_COMMAND_SIZE = 1024;
 
@@ -192,17 +192,6 @@ constexpr pid_t NO_CHILD = -1;
 // copies of their lists, and main ends it.
 constexpr int GOES_ON = -1;
 
-struct TEXT {
-    char sz[DEVICE_PATH_SIZE];
-};
-
-TEXT DiskPath(const char *szDisk)
-{
-    TEXT path;
-    const int cch = snprintf(path.sz, sizeof(path.sz), "/dev/%s", szDisk);
-    return cch < 0 ? TEXT{} : path;
-}
-
 // Tells the log when there was no memory for a list of disks.
 bool IsAllocated(const NLIBSZLIST *pDisks)
 {
@@ -265,7 +254,7 @@ int DiskFormatTypeGet(const char *szName, u32 wanted)
         NLIBCLog(LOG_ERR, "Null List Error");
         return FORMAT_NONE;
     }
-    const TEXT disk = DiskPath(szName);
+    const DEVICE_PATH disk = DevicePathOf(szName);
     if (access(FORCE_CLEAN_MARKER, F_OK) == 0) {
         return FORMAT_WIPE;
     }
@@ -374,7 +363,7 @@ void DecideCollect(const NLIBSZLIST *pDisks, DISK_CHILD *pChildren)
 
 int PartitionInChild(const char *szDisk, int type, u32 version)
 {
-    const TEXT disk = DiskPath(szDisk);
+    const DEVICE_PATH disk = DevicePathOf(szDisk);
     switch (type) {
     case FORMAT_KEEP_DATA:
     case FORMAT_UNRECOGNISED:
@@ -423,7 +412,7 @@ struct SYSTEM_MEMBERS {
 
 void SystemDiskTake(const char *szDisk, int nSlot, SYSTEM_MEMBERS &members)
 {
-    const TEXT disk = DiskPath(szDisk);
+    const DEVICE_PATH disk = DevicePathOf(szDisk);
     if (members.nDisk >= nSlot) {
         // One too many: it must not look like a member of an array that it is not in.
         (void)PartitionZeroSuperblock(disk.sz, PARTITION_SYSTEM);
@@ -613,7 +602,7 @@ int DataMembersPrepare(const NLIBSZLIST *pDisks, MEMBER_LIST &members)
 {
     int nUsed = 0;
     for (; nUsed < pDisks->nItem; nUsed++) {
-        const TEXT disk = DiskPath(NLIBCSzListGet(pDisks, nUsed));
+        const DEVICE_PATH disk = DevicePathOf(NLIBCSzListGet(pDisks, nUsed));
         if (NLIBCConfSupportDualHead() != 0 && RaidGroupSplitUnitsGet() <= nUsed) {
             NLIBCLog(LOG_ERR, "Get %d disks, more than raid group split unit", nUsed);
             break;
@@ -692,7 +681,7 @@ struct FORMAT_LISTS {
 int PushDecided(PNLIBSZLIST *ppList, const char *szDisk)
 {
     if (NLIBCSzListPush(ppList, szDisk) < 0) {
-        NLIBCLog(LOG_ERR, "Push %s into FormatAllList failed", DiskPath(szDisk).sz);
+        NLIBCLog(LOG_ERR, "Push %s into FormatAllList failed", DevicePathOf(szDisk).sz);
         return -1;
     }
     return 0;
@@ -718,7 +707,7 @@ void NumbersBuild(const NLIBSZLIST *pDisks, char *szNumbers)
     size_t cch = 0;
     szNumbers[0] = '\0';
     for (int i = 0; i < pDisks->nItem && cch < NUMBERS_TEXT_SIZE - 1; i++) {
-        const TEXT disk = DiskPath(NLIBCSzListGet(pDisks, i));
+        const DEVICE_PATH disk = DevicePathOf(NLIBCSzListGet(pDisks, i));
         DISK_PATH_INFO info = {};
         if (DiskPathParse(disk.sz, &info) != 0) {
             NLIBCLog(LOG_ERR, "DiskPathParse(%s) fail", disk.sz);

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: MIT
 #include "hwcontrol/disk_name.h"
 
+#include "hwcontrol/device_path.h"
 #include "nurocore/error.h"
 #include "nurocore/handle.h"
 #include "nurocore/log.h"
@@ -19,12 +20,9 @@
 namespace
 {
 
-constexpr char DEV_PREFIX[] = "/dev/";
-constexpr size_t DEV_PREFIX_LENGTH = sizeof(DEV_PREFIX) - 1;
 constexpr char SD_PREFIX[] = "sd";
 constexpr char MMC_NAME[] = "mmcblk";
 constexpr char BOOT_NAME[] = "nuroboot";
-constexpr size_t NAME_SIZE = 32; // longer names are cut; the kernel's have at most 31 characters
 
 bool IsMmc(const char *szName)
 {
@@ -73,7 +71,7 @@ int DiskIndexGet(const char *szName)
         return -1;
     }
     u32 index = ~0U;
-    const char *pch = NLIBCStrSkipPrefix(NLIBCStrSkipPrefix(szName, DEV_PREFIX), SD_PREFIX);
+    const char *pch = NLIBCStrSkipPrefix(DeviceNameOf(szName), SD_PREFIX);
     for (; *pch >= 'a' && *pch <= 'z'; pch++) {
         index = (index + 1U) * 26U + static_cast<u32>(*pch - 'a');
     }
@@ -128,13 +126,8 @@ int DiskDevicePartitionNameGet(const char *szDisk, int partNum, char *szOut, siz
     if (!IsPartitionRequestValid(szDisk, partNum, szOut, cbOut)) {
         return -1;
     }
-    char szName[NAME_SIZE];
-    const bool fPath = strncmp(szDisk, "/dev", 4) == 0;
-    const size_t cchSkipped = fPath ? std::min(strlen(szDisk), DEV_PREFIX_LENGTH) : 0;
-    const size_t cchName = std::min(strlen(szDisk + cchSkipped), NAME_SIZE - 1);
-    memcpy(szName, szDisk + cchSkipped, cchName);
-    szName[cchName] = '\0';
-
+    char szName[DEVICE_NAME_SIZE];
+    (void)snprintf(szName, sizeof(szName), "%s", DeviceNameBehindDev(szDisk));
     if (std::string_view(szName).starts_with(BOOT_NAME)) {
         NLIBCLog(LOG_ERR, "we don't generate nuroboot partition name here");
         return -1;
@@ -148,12 +141,12 @@ int DiskDevicePartitionPathGet(const char *szDisk, int partNum, char *szOut, siz
     if (!IsPartitionRequestValid(szDisk, partNum, szOut, cbOut)) {
         return -1;
     }
-    char szName[NAME_SIZE];
-    if (DiskDevicePartitionNameGet(szDisk, partNum, szName, NAME_SIZE) != 0) {
+    char szName[DEVICE_NAME_SIZE];
+    if (DiskDevicePartitionNameGet(szDisk, partNum, szName, sizeof(szName)) != 0) {
         NLIBCLog(LOG_ERR, "fail to get device partition name");
         return -1;
     }
-    (void)snprintf(szOut, cbOut, "%s%s", DEV_PREFIX, szName);
+    DevicePathBuild(szName, szOut, cbOut);
     return 0;
 }
 

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: MIT
 #include "hwcontrol/disk_path.h"
 
+#include "hwcontrol/device_path.h"
 #include "hwcontrol/disk_name.h"
 #include "nurocore/error.h"
 #include "nurocore/log.h"
@@ -13,7 +14,6 @@ namespace
 {
 
 constexpr u32 CONTAINER_NONE = 0;
-constexpr int NAME_SIZE = 32;
 
 // By port type.
 constexpr std::array<u32, 10> CONTAINERS = {
@@ -89,9 +89,9 @@ int DiskPathParse(const char *szPath, DISK_PATH_INFO *pInfo)
         NLIBCLog(LOG_ERR, "bad paramters: unknown device, disk path: %s", szPath);
         return -1;
     }
-    const char *const szName = NLIBCStrSkipPrefix(szPath, "/dev/");
-    char szDisk[NAME_SIZE];
-    pInfo->partitionNum = DiskPartitionNumGet(szName, szDisk, NAME_SIZE);
+    const char *const szName = DeviceNameOf(szPath);
+    char szDisk[DEVICE_NAME_SIZE];
+    pInfo->partitionNum = DiskPartitionNumGet(szName, szDisk, sizeof(szDisk));
     pInfo->container = ParsedContainer(type);
     if (type == EUNIT_DEVICE) {
         UnitDiskPlace(szPath, NLIBCStrSkipPrefix(szName, "sd"), pInfo);

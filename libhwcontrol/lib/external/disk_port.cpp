@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: MIT
 #include "hwcontrol/disk_port.h"
 
+#include "hwcontrol/device_path.h"
 #include "hwcontrol/disk_name.h"
 #include "nurocore/conf.h"
 #include "nurocore/error.h"
@@ -22,7 +23,6 @@
 namespace
 {
 
-constexpr int DISK_NAME_SIZE = 32;
 constexpr int MASK_VALUE_SIZE = 65;
 constexpr int EUNIT_LIST_SIZE = 1024; // all disks that expansion units report
 constexpr int HOST_LIST_SIZE = 256;   // those that one SCSI host reports
@@ -166,9 +166,7 @@ struct EUNIT_OUTPUT {
 
 bool IsOpenable(const char *szName)
 {
-    char szPath[DISK_NAME_SIZE];
-    (void)snprintf(szPath, sizeof(szPath), "/dev/%s", szName);
-    const FD_OWNER fd(open(szPath, O_RDWR | O_CLOEXEC));
+    const FD_OWNER fd(open(DevicePathOf(szName).sz, O_RDWR | O_CLOEXEC));
     return static_cast<bool>(fd);
 }
 
@@ -190,10 +188,9 @@ int NameAppend(const char *szName, EUNIT_OUTPUT &output)
 // One host's list: "/dev/" and letters, again after each comma; anything else ends it.
 int HostListAppend(const char *szList, EUNIT_OUTPUT &output)
 {
-    constexpr std::string_view DEV_PREFIX = "/dev/";
     const char *pch = szList;
-    while (StartsWith(pch, DEV_PREFIX)) {
-        pch += DEV_PREFIX.size();
+    while (DeviceNameOf(pch) != pch) {
+        pch = DeviceNameOf(pch);
         const size_t cchLetters =
             strspn(pch, "abcdefghijklmnopqrstuvwxyzABCDEFGHIJKLMNOPQRSTUVWXYZ");
         const size_t cchName = std::min(cchLetters, EUNIT_NAME_MAX);
@@ -257,15 +254,11 @@ DISK_PORT_TYPE ExternalDiskPortCheck(const char *szPath)
     if (strstr(szPath, "mmcblk") != nullptr) {
         return MMC_DEVICE;
     }
-    char szDisk[DISK_NAME_SIZE];
-    if (DiskPartitionNumRemove(szPath, szDisk, DISK_NAME_SIZE) != 0) {
+    char szDisk[DEVICE_PATH_SIZE];
+    if (DiskPartitionNumRemove(szPath, szDisk, sizeof(szDisk)) != 0) {
         return UNKNOWN_DEVICE;
     }
-    const char *szName = szDisk;
-    if (const char *const pchDev = strstr(szDisk, "/dev")) {
-        const char *const pchSlash = strchr(pchDev + 1, '/');
-        szName = pchSlash == nullptr ? szDisk : pchSlash + 1;
-    }
+    const char *const szName = DeviceNameWithin(szDisk);
     return StartsWith(szName, "nuroboot") ? BOOT_DEVICE : ExternalDiskPortCheckName(szName);
 }
 

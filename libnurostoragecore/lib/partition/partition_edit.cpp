@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: MIT
 #include "nurostoragecore/partition_edit.h"
 
+#include "hwcontrol/device_path.h"
 #include "hwcontrol/disk_name.h"
 #include "nurocore/handle.h"
 #include "nurocore/io.h"
@@ -24,7 +25,7 @@ constexpr char SFDISK_PATH[] = "/sbin/sfdisk";
 constexpr size_t OPTION_SIZE = 32;
 constexpr size_t COMMAND_TEXT_SIZE = 512;
 constexpr size_t PATH_SIZE = 128;
-constexpr size_t LISTED_NAME_SIZE = 64;
+constexpr size_t LISTED_PATH_SIZE = 64;
 constexpr int LISTED_LINE_SIZE = 257; // a line of at most 256 bytes
 constexpr int ERR_TABLE_NOT_ADDED = 255;
 constexpr int ERR_NO_KIND = -1;
@@ -240,12 +241,10 @@ i64 PartitionGeometryGet(int partNum, const char *szDisk, u64 *pStart, u32 *pTyp
         return PARTITION_ABSENT;
     }
     const OPTION number = NumberOption(partNum);
-    char szPath[LISTED_NAME_SIZE];
-    const int cch =
-        snprintf(szPath, sizeof(szPath), "/dev/%s", NLIBCStrSkipPrefix(szDisk, "/dev/"));
+    char szPath[LISTED_PATH_SIZE];
+    DevicePathBuild(DeviceNameOf(szDisk), szPath, sizeof(szPath));
     const PIPE_OWNER pListing(
-        cch < 0 ? nullptr
-                : NLIBCPopen(SFDISK_PATH, "r", "-l", "-uS", number.szText, szPath, nullptr));
+        NLIBCPopen(SFDISK_PATH, "r", "-l", "-uS", number.szText, szPath, nullptr));
     char szLine[LISTED_LINE_SIZE];
     if (pListing == nullptr || NLIBCFgets(szLine, LISTED_LINE_SIZE, pListing.get()) == nullptr) {
         return PARTITION_ABSENT;

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: MIT
 #include "nurostoragecore/partition_enum.h"
 
+#include "hwcontrol/device_path.h"
 #include "hwcontrol/disk_path.h"
 #include "nurocore/error.h"
 #include "nurocore/file.h"
@@ -8,7 +9,6 @@
 #include "nurocore/log.h"
 #include "nurocore/text.h"
 
-#include <cstdio>
 #include <cstring>
 #include <string_view>
 
@@ -18,8 +18,8 @@ namespace
 constexpr int LINE_LIST_SIZE = 1024;
 constexpr int FIELD_LIST_SIZE = 128;
 constexpr int PATH_SIZE = 64;
-constexpr int NAME_SIZE = 1024; // a line is read in pieces of at most 1023
-constexpr int FIELD_COUNT = 4;  // major, minor, blocks, name
+constexpr int FIELD_SIZE = 1024; // a line is read in pieces of at most 1023
+constexpr int FIELD_COUNT = 4;   // major, minor, blocks, name
 constexpr int FIELD_NAME = 3;
 
 bool IsKept(const PARTITION_ENUM_FILTER *pFilter, const char *szName)
@@ -49,7 +49,7 @@ int LineAppend(const PARTITION_ENUM_FILTER *pFilter, const char *szLine, PNLIBSZ
     if (NLIBCStrTok(szLine, " \t", ppFields) != FIELD_COUNT) {
         return 0;
     }
-    char szName[NAME_SIZE];
+    char szName[FIELD_SIZE];
     const char *const szField = NLIBCSzListGet(*ppFields, FIELD_NAME);
     const size_t cchName = strlen(szField) - 1; // its last character is taken for the line's end
     memcpy(szName, szField, cchName);
@@ -58,8 +58,8 @@ int LineAppend(const PARTITION_ENUM_FILTER *pFilter, const char *szLine, PNLIBSZ
         return 0;
     }
     char szPath[PATH_SIZE];
-    const int cch = snprintf(szPath, sizeof(szPath), "/dev/%s", szName);
-    return cch < 0 ? -1 : NLIBCSzListPush(ppList, szPath);
+    DevicePathBuild(szName, szPath, sizeof(szPath));
+    return NLIBCSzListPush(ppList, szPath);
 }
 
 } // namespace

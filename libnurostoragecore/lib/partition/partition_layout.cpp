@@ -1,13 +1,13 @@
 // SPDX-License-Identifier: MIT
 #include "nurostoragecore/partition_layout.h"
 
+#include "hwcontrol/device_path.h"
 #include "hwcontrol/disk_name.h"
 #include "nurocore/conf.h"
 #include "nurocore/error.h"
 #include "nurocore/handle.h"
 #include "nurocore/io.h"
 #include "nurocore/log.h"
-#include "nurocore/text.h"
 #include "partition/partition_type.h"
 
 #include <array>
@@ -18,7 +18,7 @@
 namespace
 {
 
-constexpr int NAME_SIZE = 128;
+constexpr int PARTITION_NAME_SIZE = 128;
 constexpr int PATH_SIZE = 512;
 constexpr int LINE_SIZE = 129; // a line of at most 128 bytes
 
@@ -147,9 +147,9 @@ int PartitionStartSizeGet(const char *szDisk, int partNum, u64 *pStart, u64 *pSi
         NLIBCErrSetHere(ERR_BAD_PARAMETER);
         return -1;
     }
-    const char *const szName = NLIBCStrSkipPrefix(szDisk, "/dev/");
-    char szPartition[NAME_SIZE];
-    if (DiskDevicePartitionNameGet(szName, partNum, szPartition, NAME_SIZE) != 0) {
+    const char *const szName = DeviceNameOf(szDisk);
+    char szPartition[PARTITION_NAME_SIZE];
+    if (DiskDevicePartitionNameGet(szName, partNum, szPartition, PARTITION_NAME_SIZE) != 0) {
         return -1;
     }
     char szDirectory[PATH_SIZE];

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: MIT
 #include "nurostoragecore/partition_version.h"
 
+#include "hwcontrol/device_path.h"
 #include "hwcontrol/disk_port.h"
 #include "nurocore/conf.h"
 #include "nurocore/error.h"
@@ -61,7 +62,7 @@ u32 VersionOfDisk(const char *szName)
 {
     char szDisk[DISK_PATH_SIZE];
     u32 version = 0;
-    (void)snprintf(szDisk, sizeof(szDisk), "/dev/%s", szName);
+    DevicePathBuild(szName, szDisk, sizeof(szDisk));
     if (PartitionCheckLayout(szDisk, IsSupportRaid(), &version) == 0 || !IsCounted(szDisk)) {
         return 0;
     }

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: MIT
 #include "nurostoragecore/raid_disk.h"
 
+#include "hwcontrol/device_path.h"
 #include "hwcontrol/disk_name.h"
 #include "nurocore/error.h"
 #include "nurocore/handle.h"
@@ -51,7 +52,7 @@ int PathGet(const char *szDir, char *szPath)
         NLIBCErrSetHere(ERR_TEXT_NOT_FOUND);
         return -1;
     }
-    (void)snprintf(szPath, RAID_PATH_SIZE, "/dev/%s", pchPrefix + strlen(MEMBER_PREFIX));
+    DevicePathBuild(pchPrefix + strlen(MEMBER_PREFIX), szPath, RAID_PATH_SIZE);
     return 0;
 }
 
