@@ -5,7 +5,6 @@
 //
 //   containers             Google Benchmark; takes its options (--benchmark_filter=push ...)
 //   containers --counts    allocations and bytes as "NAME VALUE", for bench/gates
-#include "nurocore/handle.h"
 #include "nurocore/hash.h"
 #include "nurocore/szlist.h"
 

@@ -3,7 +3,8 @@
 // What a disk or a partition more costs, on machines of the sandbox. Prints tables; the times are
 // for reading, only what was done is checked.
 #include "hwcontrol/disk_port.h"
-#include "nurocore/handle.h"
+#include "nurocore/hash.h"
+#include "nurocore/szlist.h"
 #include "nurostoragecore/partition_enum.h"
 #include "nurostoragecore/raid_remove.h"
 #include "storage_machine.h"

@@ -1,17 +1,14 @@
 // SPDX-License-Identifier: MIT
 #pragma once
 
-// What must be released, and how: one deleter a kind, so that no way out of a function leaks.
+// Owners of what libc hands out: one deleter a kind, so that no way out of a function leaks. A type
+// of our own has its owner beside it.
 
-#include "nurocore/hash.h"
-#include "nurocore/pipe.h"
-#include "nurocore/szlist.h"
-
+#include <cstddef>
 #include <cstdio>
 #include <cstdlib>
 #include <glob.h>
 #include <memory>
-#include <mntent.h>
 #include <unistd.h>
 
 struct HEAP_DELETER {
@@ -28,20 +25,6 @@ struct STREAM_DELETER {
     }
 };
 
-struct PIPE_DELETER {
-    void operator()(FILE *p) const
-    {
-        (void)NLIBCPclose(p);
-    }
-};
-
-struct MOUNT_TABLE_DELETER {
-    void operator()(FILE *p) const
-    {
-        (void)endmntent(p);
-    }
-};
-
 struct GLOB_DELETER {
     void operator()(glob_t *p) const
     {
@@ -49,22 +32,8 @@ struct GLOB_DELETER {
     }
 };
 
-// A list or a table may move while it is held, so its owner holds the address of the pointer.
-struct LIST_DELETER {
-    void operator()(PNLIBSZLIST *pp) const
-    {
-        NLIBCSzListFree(*pp);
-    }
-};
-
-struct HASH_DELETER {
-    void operator()(PNLIBHASH *pp) const
-    {
-        NLIBCHashFree(*pp);
-    }
-};
-
-// A descriptor in the clothes of a pointer; -1 is none.
+// A descriptor with what std::unique_ptr asks of a pointer type: the null value is -1, because 0 is
+// a descriptor.
 struct FD_VALUE {
     int fd = -1;
 
@@ -97,9 +66,5 @@ struct FD_DELETER {
 template <typename T>
 using HEAP_OWNER = std::unique_ptr<T, HEAP_DELETER>;
 using STREAM_OWNER = std::unique_ptr<FILE, STREAM_DELETER>;
-using PIPE_OWNER = std::unique_ptr<FILE, PIPE_DELETER>;
-using MOUNT_TABLE_OWNER = std::unique_ptr<FILE, MOUNT_TABLE_DELETER>;
 using GLOB_OWNER = std::unique_ptr<glob_t, GLOB_DELETER>;
-using LIST_OWNER = std::unique_ptr<PNLIBSZLIST, LIST_DELETER>;
-using HASH_OWNER = std::unique_ptr<PNLIBHASH, HASH_DELETER>;
 using FD_OWNER = std::unique_ptr<int, FD_DELETER>;

@@ -7,6 +7,8 @@
 #include "nurocore/szlist.h"
 #include "nurocore/types.h"
 
+#include <memory>
+
 struct NLIBHASH_SLOT {
     char *pszKey; // both NULL in a free slot, both inside the pool in a used one
     char *pszValue;
@@ -33,6 +35,17 @@ PNLIBHASH NLIBCHashAlloc(int cbPool);
 
 // NULL is ignored.
 void NLIBCHashFree(PNLIBHASH pHash);
+
+// Frees a table at the end of a scope. It holds the address of the pointer, because a table that
+// grows moves.
+struct HASH_DELETER {
+    void operator()(PNLIBHASH *ppHash) const
+    {
+        NLIBCHashFree(*ppHash);
+    }
+};
+
+using HASH_OWNER = std::unique_ptr<PNLIBHASH, HASH_DELETER>;
 
 // Stores copies of the pair, or replaces the key's value. Returns the slot of the key (0 or more);
 // -1 for NULL arguments, a full table, or no memory to grow: the table then stays as it was.

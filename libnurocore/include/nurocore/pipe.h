@@ -4,6 +4,7 @@
 // Streams to and from a program that is run by its path with an argument list, never by a shell.
 
 #include <cstdio>
+#include <memory>
 
 // Starts szPath with the arguments that follow, up to a NULL. Mode letters: "r" read what it
 // writes, "w" write what it reads; with "r", "E" reads its standard error instead and "B" both;
@@ -20,3 +21,13 @@ FILE *NLIBCPopenV(const char *szPath, const char *szMode, char *const argv[]);
 // 0 when somebody else has reaped it; -1 with ERR_BAD_PARAMETER for NULL, with ERR_NO_SUCH_CHILD
 // for a stream of another origin (it stays open) or a failed wait.
 int NLIBCPclose(FILE *pStream);
+
+// Closes a pipe stream at the end of a scope, for callers that do not ask how its program ended.
+struct PIPE_DELETER {
+    void operator()(FILE *pStream) const
+    {
+        (void)NLIBCPclose(pStream);
+    }
+};
+
+using PIPE_OWNER = std::unique_ptr<FILE, PIPE_DELETER>;

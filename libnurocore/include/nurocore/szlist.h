@@ -10,6 +10,8 @@
 
 #include "nurocore/types.h"
 
+#include <memory>
+
 struct NLIBSZLIST {
     i32 nSize;     // bytes of the whole block
     i32 nItem;     // slots in use
@@ -34,6 +36,17 @@ PNLIBSZLIST NLIBCSzListAlloc(int nSize);
 
 // NULL is ignored.
 void NLIBCSzListFree(PNLIBSZLIST pList);
+
+// Frees a list at the end of a scope. It holds the address of the pointer, because a list that
+// grows moves.
+struct LIST_DELETER {
+    void operator()(PNLIBSZLIST *ppList) const
+    {
+        NLIBCSzListFree(*ppList);
+    }
+};
+
+using LIST_OWNER = std::unique_ptr<PNLIBSZLIST, LIST_DELETER>;
 
 // Stores a copy of szItem at index; slots between the end and index are left empty. A sorted list
 // ignores index and chooses the place itself. Returns the index used, -1 on failure.

@@ -6,7 +6,6 @@
 #include "nurocore/hash.h"
 
 #include "nurocore/error.h"
-#include "nurocore/handle.h"
 
 #include <algorithm>
 #include <climits>

@@ -1,7 +1,6 @@
 // SPDX-License-Identifier: MIT
 #include "nurostoragecore/lvm.h"
 
-#include "nurocore/handle.h"
 #include "nurocore/io.h"
 #include "nurocore/log.h"
 #include "nurocore/pipe.h"
@@ -10,6 +9,7 @@
 
 #include <cstdio>
 #include <cstring>
+#include <memory>
 #include <mntent.h>
 #include <string_view>
 #include <unistd.h>
@@ -28,6 +28,15 @@ constexpr char VGREMOVE_PATH[] = "/sbin/vgremove";
 constexpr char PVREMOVE_PATH[] = "/sbin/pvremove";
 constexpr char UMOUNT_PATH[] = "/bin/umount";
 constexpr char MOUNTS_PATH[] = "/proc/mounts";
+
+struct MOUNT_TABLE_DELETER {
+    void operator()(FILE *pMounts) const
+    {
+        (void)endmntent(pMounts);
+    }
+};
+
+using MOUNT_TABLE_OWNER = std::unique_ptr<FILE, MOUNT_TABLE_DELETER>;
 
 // The last row that names the device; rows before it are dropped, so of several volumes the last
 // one is meant. Kept loose: a row of /dev/md20 names /dev/md2 too.

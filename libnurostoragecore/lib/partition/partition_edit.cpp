@@ -3,7 +3,6 @@
 
 #include "hwcontrol/device_path.h"
 #include "hwcontrol/disk_name.h"
-#include "nurocore/handle.h"
 #include "nurocore/io.h"
 #include "nurocore/log.h"
 #include "nurocore/pipe.h"

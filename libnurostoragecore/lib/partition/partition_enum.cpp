@@ -5,8 +5,8 @@
 #include "hwcontrol/disk_path.h"
 #include "nurocore/error.h"
 #include "nurocore/file.h"
-#include "nurocore/handle.h"
 #include "nurocore/log.h"
+#include "nurocore/szlist.h"
 #include "nurocore/text.h"
 
 #include <cstring>

@@ -3,8 +3,9 @@
 
 #include "hwcontrol/disk_name.h"
 #include "nurocore/error.h"
-#include "nurocore/handle.h"
+#include "nurocore/hash.h"
 #include "nurocore/log.h"
+#include "nurocore/szlist.h"
 #include "nurostoragecore/partition_enum.h"
 #include "nurostoragecore/raid_superblock.h"
 #include "nurostoragecore/space.h"

@@ -1,7 +1,6 @@
 // SPDX-License-Identifier: MIT
 #include "nurostoragecore/raid_superblock.h"
 
-#include "nurocore/handle.h"
 #include "nurocore/io.h"
 #include "nurocore/log.h"
 #include "nurocore/pipe.h"
