@@ -144,6 +144,7 @@ int StatusReport(const char *szMd)
 
 // --- destroy -----------------------------------------------------------------------------------
 
+// LVM that could not be removed may still hold the array: time for it to let go before the stop.
 constexpr unsigned int LVM_FAILED_PAUSE_SECONDS = 3;
 
 // Always 0: callers that need to know look at the array afterwards.
@@ -347,6 +348,7 @@ void MemberAppend(const char *szDisk, int partNum, MEMBER_LIST &members)
 constexpr int CHILD_PARTITIONED = 1;
 constexpr int PARTITION_SYSTEM = 1;
 constexpr int PARTITION_SWAP = 2;
+// Whoever looks at new devices may still hold the fresh partitions; mdadm wants them free.
 constexpr unsigned int ARRAY_PAUSE_SECONDS = 3;
 constexpr size_t MISSING_TEXT_SIZE = 256;
 constexpr size_t DUPLICATE_LIST_SIZE = 1024;

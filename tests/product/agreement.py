@@ -13,6 +13,7 @@ import subprocess
 import sys
 import tempfile
 
+import calls
 import cases
 
 ROOT = os.path.abspath(os.path.join(os.path.dirname(__file__), "../.."))
@@ -177,6 +178,29 @@ def case_the_log_page_has_every_line_that_ends_an_operation():
     assert not missing, f"docs/log.md lacks {sorted(missing)}"
     foreign = {text for text in listed - written if re.search(r"%[a-z]", text)}
     assert not foreign, f"docs/log.md has what nothing writes: {sorted(foreign)}"
+
+
+def case_the_architecture_page_has_the_functions_that_no_command_calls():
+    listed = re.search(r"## Functions that no command calls\n(.*?)\n## ", read("docs/architecture.md"), re.S).group(1)
+    rows = re.findall(r"^\| `(\w+)` \| (.*?) \| .*? \|$", listed, re.M)
+    cases.same([name for _, names in rows for name in re.findall(r"`(\w+)`", names)], calls.uncalled(), "architecture.md")
+    tests = "".join(read(path) for path in glob.glob("tests/*/*_test.cpp", root_dir=ROOT))
+    for module, names in rows:
+        header = read(*glob.glob(f"lib*/include/*/{module}.h", root_dir=ROOT))
+        for name in re.findall(r"`(\w+)`", names):
+            assert re.search(rf"\b{name}\(", header), f"{name} is not in {module}.h"
+            assert re.search(rf"\b{name}\(", tests), f"no test calls {name}"
+
+
+def case_the_log_page_tells_which_lines_no_command_can_write():
+    by_commands, by_others = set(), set()
+    reached = calls.reached(calls.graph())
+    for node, texts in calls.graph().items():
+        found = re.findall(r"NLIBCLog\(LOG_ERR,\s*" + LITERAL, "".join(texts))
+        (by_commands if node in reached else by_others).update(literal(text) for text in found)
+    told = re.search(r"### Never by a command\n(.*?)\n## ", read("docs/log.md"), re.S).group(1)
+    told = re.sub(r"\[.*?\]\(.*?\)", "", told).replace("\n", " ")
+    cases.same(re.findall(r"`([^`]+)`", told), by_others - by_commands, "log.md")
 
 
 cases.run(sys.modules[__name__])

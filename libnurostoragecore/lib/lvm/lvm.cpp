@@ -20,6 +20,7 @@ namespace
 constexpr int LINE_SIZE = 1024;
 constexpr int LV_PATH_SIZE = 256;
 constexpr int MOUNT_ENTRY_SIZE = 4096;
+// Whom -k killed gets time to end: until then the folder is in use.
 constexpr unsigned int UNMOUNT_PAUSE_SECONDS = 1;
 
 constexpr char PVS_PATH[] = "/sbin/pvs";

@@ -198,7 +198,8 @@ int RAIDRemove(const RAID_INFO *pInfo, PNLIBHASH pUuidHash)
         NLIBCLog(LOG_ERR, "Bad parameters");
         return -1;
     }
-    // Read before the stop: it takes the running array to tell its members.
+    // Read before the stop: it takes the running array to tell its members. They are asked as the
+    // driver tells no UUID, so the record of a query has none.
     char szUuid[RAID_UUID_SIZE];
     (void)snprintf(szUuid, sizeof(szUuid), "%s", pInfo->szUuid);
     const bool fUuid = szUuid[0] != '\0' || RAIDUUIDGet(pInfo->szPath, szUuid, RAID_UUID_SIZE) == 1;
