@@ -6,9 +6,13 @@
 
 #include <climits>
 #include <cstring>
+#include <string>
+#include <string_view>
 
 namespace
 {
+
+using std::literals::operator""sv;
 
 struct TRIM_CASE {
     const char *szText;
@@ -210,6 +214,55 @@ TEST(StrTok, RefusesNull)
     EXPECT_FAILS(NLIBCStrTok("a", ",", nullptr), -1, ERR_BAD_PARAMETER);
     EXPECT_FAILS(NLIBCStrTok("a", ",", &pNone), -1, ERR_BAD_PARAMETER);
     EXPECT_EQ(list.p->nItem, 0);
+}
+
+// Eight bytes of memory before and after; cbText of them are the buffer, and what lies behind it
+// must stay.
+struct APPEND_CASE {
+    std::string_view before;
+    size_t cbText;
+    const char *szMore;
+    std::string_view cut;   // after NLIBCStrAppend
+    size_t cchCut;          // what it returns
+    std::string_view whole; // after NLIBCStrAppendWhole
+    int fWhole;             // what it returns
+};
+
+constexpr APPEND_CASE APPEND_CASES[] = {
+    {"ab\0#####"sv, 8, "cd", "abcd\0###"sv, 4, "abcd\0###"sv, 1},
+    // fits exactly, one byte short, full
+    {"ab\0#####"sv, 5, "cd", "abcd\0###"sv, 4, "abcd\0###"sv, 1},
+    {"ab\0#####"sv, 4, "cd", "abc\0####"sv, 3, "ab\0#####"sv, 0},
+    {"ab\0#####"sv, 3, "cd", "ab\0#####"sv, 2, "ab\0#####"sv, 0},
+    // to an empty text
+    {"\0#######"sv, 5, "abcd", "abcd\0###"sv, 4, "abcd\0###"sv, 1},
+    {"\0#######"sv, 4, "abcd", "abc\0####"sv, 3, "\0#######"sv, 0},
+    {"\0#######"sv, 1, "a", "\0#######"sv, 0, "\0#######"sv, 0},
+    // an empty text fits wherever there is a terminator
+    {"ab\0#####"sv, 8, "", "ab\0#####"sv, 2, "ab\0#####"sv, 1},
+    {"ab\0#####"sv, 3, "", "ab\0#####"sv, 2, "ab\0#####"sv, 1},
+    // no buffer, and one whose text has no end
+    {"########"sv, 0, "a", "########"sv, 0, "########"sv, 0},
+    {"########"sv, 0, "", "########"sv, 0, "########"sv, 0},
+    {"ab######"sv, 2, "cd", "ab######"sv, 2, "ab######"sv, 0},
+};
+
+TEST(StrAppend, CutsAtTheEndOfTheBuffer)
+{
+    for (const APPEND_CASE &row : APPEND_CASES) {
+        std::string bytes(row.before);
+        EXPECT_EQ(NLIBCStrAppend(bytes.data(), row.cbText, row.szMore), row.cchCut);
+        EXPECT_EQ(bytes, row.cut) << row.cbText << " bytes and " << row.szMore;
+    }
+}
+
+TEST(StrAppendWhole, AppendsAllOrNothing)
+{
+    for (const APPEND_CASE &row : APPEND_CASES) {
+        std::string bytes(row.before);
+        EXPECT_EQ(NLIBCStrAppendWhole(bytes.data(), row.cbText, row.szMore), row.fWhole);
+        EXPECT_EQ(bytes, row.whole) << row.cbText << " bytes and " << row.szMore;
+    }
 }
 
 TEST(StrToI32, ClampsTo32Bits)

@@ -1,11 +1,12 @@
 // SPDX-License-Identifier: MIT
 #pragma once
 
-// Trimming, splitting and decimal numbers.
+// Trimming, splitting, appending and decimal numbers.
 
 #include "nurocore/szlist.h"
 #include "nurocore/types.h"
 
+#include <cstddef>
 #include <string_view>
 
 // Copies szSrc without the white space around it (blank, tab, line feed, carriage return) and
@@ -21,6 +22,15 @@ char *NLIBCStrSepNonEmpty(char **pszCursor, const char *szDelims);
 // Pushes every field of szText that is not empty onto the list. Returns how many, 0 for none, -1
 // on failure: ERR_BAD_PARAMETER, ERR_OUT_OF_MEMORY, or the code of the push.
 int NLIBCStrTok(const char *szText, const char *szDelims, PNLIBSZLIST *ppList);
+
+// Appends szMore to szText, a terminated text in a buffer of cbText bytes, and cuts it where the
+// buffer ends; the text stays terminated. Returns the length of the text then. A buffer of 0 bytes
+// is neither read nor written.
+size_t NLIBCStrAppend(char *szText, size_t cbText, const char *szMore);
+
+// The same, but all of szMore or nothing. Returns 1 when it was appended, 0 when text and
+// terminator do not fit: szText is then as it was.
+int NLIBCStrAppendWhole(char *szText, size_t cbText, const char *szMore);
 
 // szText behind the prefix when it begins with it, else szText.
 const char *NLIBCStrSkipPrefix(const char *szText, std::string_view prefix);

@@ -85,6 +85,27 @@ int NLIBCStrTok(const char *szText, const char *szDelims, PNLIBSZLIST *ppList)
     return nField;
 }
 
+size_t NLIBCStrAppend(char *szText, size_t cbText, const char *szMore)
+{
+    const size_t cchText = strnlen(szText, cbText);
+    if (cchText == cbText) {
+        return cchText;
+    }
+    const size_t cchMore = strnlen(szMore, cbText - cchText - 1);
+    memcpy(szText + cchText, szMore, cchMore);
+    szText[cchText + cchMore] = '\0';
+    return cchText + cchMore;
+}
+
+int NLIBCStrAppendWhole(char *szText, size_t cbText, const char *szMore)
+{
+    if (strlen(szMore) >= cbText - strnlen(szText, cbText)) {
+        return 0;
+    }
+    (void)NLIBCStrAppend(szText, cbText, szMore);
+    return 1;
+}
+
 const char *NLIBCStrSkipPrefix(const char *szText, std::string_view prefix)
 {
     return std::string_view(szText).starts_with(prefix) ? szText + prefix.size() : szText;
