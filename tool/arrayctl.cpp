@@ -204,18 +204,12 @@ bool IsAllocated(const NLIBSZLIST *pDisks)
     return true;
 }
 
-// The disks of the machine: a dual-head machine's are in its expansion unit.
 bool DisksEnum(PNLIBSZLIST *ppDisks)
 {
-    if (NLIBCConfSupportDualHead() != 0) {
-        if (ExternalDiskPortEnum(EUNIT_DEVICE, ppDisks) < 0) {
-            NLIBCLog(LOG_ERR, "Failed to enum EUNIT_DEVICE");
-            return false;
-        }
-        return true;
-    }
-    if (ExternalDiskPortEnum(INTERNAL_DEVICE, ppDisks) < 0) {
-        NLIBCLog(LOG_ERR, "Failed to enum INTERNAL_DEVICE");
+    const DISK_PORT_TYPE type = ExternalDiskPortOfArrays();
+    if (ExternalDiskPortEnum(type, ppDisks) < 0) {
+        NLIBCLog(LOG_ERR, "Failed to enum %s",
+                 type == EUNIT_DEVICE ? "EUNIT_DEVICE" : "INTERNAL_DEVICE");
         return false;
     }
     return true;

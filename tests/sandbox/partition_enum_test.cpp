@@ -261,4 +261,23 @@ TEST(PartitionPathEnum, WithoutMemoryForItsListsFails)
     }
 }
 
+// The heading, an empty line, sda and sdb: what was added before stays.
+TEST(PartitionPathEnum, WithoutMemoryForALineFails)
+{
+    const char *const ADDED[] = {"", "/dev/name\n", "/dev/name\n", "/dev/name\n/dev/sda\n"};
+    for (int nCall = 1; nCall <= 4; nCall++) {
+        MACHINE machine = MachineWithNames({"sda", "sdb"});
+        machine.faults = {{.szFunction = "strdup", .nCall = nCall}};
+        const char *const szAdded = ADDED[nCall - 1];
+        const RUN_RESULT result = MachineCall(machine, [szAdded] {
+            PNLIBSZLIST pList = NLIBCSzListAlloc(512);
+            EXPECT_EQ(PartitionPathEnum(nullptr, &pList), -1);
+            EXPECT_EQ(NLIBCErrGet(), ERR_OUT_OF_MEMORY);
+            EXPECT_EQ(ListText(pList), szAdded);
+            NLIBCSzListFree(pList);
+        });
+        EXPECT_EQ(LogText(result), "");
+    }
+}
+
 } // namespace

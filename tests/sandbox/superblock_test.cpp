@@ -542,10 +542,14 @@ TEST(SuperblockGet, AReportThatCannotBeReadToItsEndFails)
         MACHINE machine = MachineMake();
         MachineTool(machine, ExamineCommand("sda3"), {.szOut = ReportOf(UUID_MD2)});
         machine.faults = {{.szFunction = "fgets", .nCall = nCall, .error = EIO}};
-        (void)MachineCall(machine, [] {
+        const RUN_RESULT result = MachineCall(machine, [] {
+            NLIBCErrSet(ERR_OUT_OF_SPACE, "before", 1);
             RAID_SUPERBLOCK superblock = {};
             EXPECT_EQ(RAIDSuperblockGet("/dev/sda3", &superblock), -1);
+            EXPECT_EQ(NLIBCErrGet(), ERR_OUT_OF_SPACE);
         });
+        EXPECT_EQ(LogText(result),
+                  "<11>raid_superblock.cpp:# Fail to read the report of mdadm -E /dev/sda3\n");
     }
     // An interruption is none: the line is read again.
     MACHINE machine = MachineMake();

@@ -28,6 +28,6 @@ const char *DeviceNameOf(const char *szPath);
 // always been named so.
 const char *DeviceNameBehindDev(const char *szPath);
 
-// Kept: the name behind the first "/dev" and the next "/", wherever they stand; szPath without them.
-// Ports have always been told so.
+// Kept: the name behind the first "/dev" and the next "/", wherever they stand; szPath without
+// them. Ports have always been told so.
 const char *DeviceNameWithin(const char *szPath);

@@ -25,6 +25,10 @@ DISK_PORT_TYPE ExternalDiskPortCheck(const char *szPath);
 // The same for the bare name of a whole disk.
 DISK_PORT_TYPE ExternalDiskPortCheckName(const char *szName);
 
+// The port type of the disks that this machine builds its arrays of: those of the expansion unit
+// when it has two heads, else the internal ones.
+DISK_PORT_TYPE ExternalDiskPortOfArrays();
+
 // Appends the names (not paths) of all disks of a port type to the list and puts it in byte order.
 // Returns 0, also when there is none; -1 on failure, the list may have got some by then.
 int ExternalDiskPortEnum(DISK_PORT_TYPE type, PNLIBSZLIST *ppList);

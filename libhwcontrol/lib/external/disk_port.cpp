@@ -291,6 +291,11 @@ DISK_PORT_TYPE ExternalDiskPortCheckName(const char *szName)
     return IsInMask(MASK_CACHE, index) ? CACHE_DEVICE : OTHER_DEVICE;
 }
 
+DISK_PORT_TYPE ExternalDiskPortOfArrays()
+{
+    return NLIBCConfSupportDualHead() != 0 ? EUNIT_DEVICE : INTERNAL_DEVICE;
+}
+
 int ExternalDiskPortEnum(DISK_PORT_TYPE type, PNLIBSZLIST *ppList)
 {
     if (ppList == nullptr || *ppList == nullptr) {

@@ -20,8 +20,10 @@ struct RAID_SUPERBLOCK {
 };
 
 // Fills a record that the caller has zeroed with what the report on szDevice says. Returns 1, 0
-// when the device has no superblock (record untouched), -1 on failure (record unusable), also
-// when the report could not be read to its end. Sets no code of its own.
+// when the device has no superblock (record untouched), -1 on failure (record unusable): bad
+// arguments, mdadm could not be started, a malformed line, or a read error before the end of the
+// report, half of which must not pass for an array without a UUID. Each failure is in the log; the
+// last-error record keeps what the start of mdadm left there, else it is untouched.
 int RAIDSuperblockGet(const char *szDevice, RAID_SUPERBLOCK *pSuperblock);
 
 // Takes one line of a report, which it cuts up, into the record. Returns 0, also for a line that

@@ -46,8 +46,9 @@ int LineAppend(const PARTITION_ENUM_FILTER *pFilter, const char *szLine, PNLIBSZ
                PNLIBSZLIST *ppList)
 {
     NLIBCSzListClear(*ppFields);
-    if (NLIBCStrTok(szLine, " \t", ppFields) != FIELD_COUNT) {
-        return 0;
+    const int nField = NLIBCStrTok(szLine, " \t", ppFields);
+    if (nField != FIELD_COUNT) {
+        return nField < 0 ? -1 : 0;
     }
     char szName[FIELD_SIZE];
     const char *const szField = NLIBCSzListGet(*ppFields, FIELD_NAME);

@@ -3,7 +3,6 @@
 
 #include "hwcontrol/device_path.h"
 #include "hwcontrol/disk_port.h"
-#include "nurocore/conf.h"
 #include "nurocore/error.h"
 #include "nurocore/handle.h"
 #include "nurocore/log.h"
@@ -97,8 +96,7 @@ int VersionWithoutArray(u32 *pVersion, int fChooseBiggest)
         NLIBCErrSetHere(ERR_OUT_OF_MEMORY);
         return -1;
     }
-    const DISK_PORT_TYPE type = NLIBCConfSupportDualHead() != 0 ? EUNIT_DEVICE : INTERNAL_DEVICE;
-    if (ExternalDiskPortEnum(type, &pDisks) != 0) {
+    if (ExternalDiskPortEnum(ExternalDiskPortOfArrays(), &pDisks) != 0) {
         return -1;
     }
     *pVersion = VersionOfDisks(pDisks, fChooseBiggest);

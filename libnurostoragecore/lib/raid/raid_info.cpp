@@ -34,18 +34,16 @@ struct SYNC_STATUS {
 constexpr unsigned long MD_GET_SYNC_STATUS = _IOR(MD_MAJOR, 0x60, SYNC_STATUS);
 constexpr unsigned long MD_GET_ARRAY_STATUS = _IOR(MD_MAJOR, 0x61, i32);
 
-// Each platform builds the numbers from its own direction bits. The size of a size_t goes into one
-// of them, though it always moves 64 bits.
+// Each platform builds the numbers from its own direction bits: 2 in the highest two bits, or 2 (on
+// one 1) in a field of three. The size of a size_t goes into one of them, though it always moves 64
+// bits.
+constexpr u32 DIRECTION_READ = static_cast<u32>(_IOC_READ) << static_cast<u32>(_IOC_DIRSHIFT);
+static_assert(DIRECTION_READ == 0x80000000 || DIRECTION_READ == 0x40000000);
 static_assert(sizeof(SYNC_STATUS) == 24 && sizeof(mdu_array_info_t) == 72);
-#if defined(__powerpc__)
-static_assert(GET_ARRAY_INFO == 0x40480911 && MD_GET_ARRAY_STATUS == 0x40040961 &&
-              MD_GET_SYNC_STATUS == 0x40180960);
-static_assert(BLKGETSIZE64 == (sizeof(size_t) == 8 ? 0x40081272 : 0x40041272));
-#else
-static_assert(GET_ARRAY_INFO == 0x80480911 && MD_GET_ARRAY_STATUS == 0x80040961 &&
-              MD_GET_SYNC_STATUS == 0x80180960);
-static_assert(BLKGETSIZE64 == (sizeof(size_t) == 8 ? 0x80081272 : 0x80041272));
-#endif
+static_assert(GET_ARRAY_INFO == (DIRECTION_READ | 0x480911) &&
+              MD_GET_ARRAY_STATUS == (DIRECTION_READ | 0x040961) &&
+              MD_GET_SYNC_STATUS == (DIRECTION_READ | 0x180960));
+static_assert(BLKGETSIZE64 == (DIRECTION_READ | (sizeof(size_t) == 8 ? 0x081272 : 0x041272)));
 
 constexpr u64 BYTES_PER_KIB = 1024;
 constexpr u64 SECTORS_PER_KIB = 2;

@@ -175,6 +175,10 @@ int RAIDSuperblockGet(const char *szDevice, RAID_SUPERBLOCK *pSuperblock)
         }
         result = 1;
     }
-    // Half a report would pass for one of an array without a UUID.
-    return feof(pReport.get()) != 0 ? result : -1;
+    if (feof(pReport.get()) == 0) {
+        // Half a report would pass for one of an array without a UUID.
+        NLIBCLog(LOG_ERR, "Fail to read the report of mdadm -E %s", szDevice);
+        return -1;
+    }
+    return result;
 }
