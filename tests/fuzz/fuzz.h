@@ -18,6 +18,14 @@ inline void Claim(bool fHolds, const char *szClaim)
     }
 }
 
+// Of an input that is a walk: what is checked after each step grows with their number.
+constexpr size_t WALK_LENGTH = 240;
+
+inline void ClaimNoDefect(const std::string &defect)
+{
+    Claim(defect.empty(), defect.c_str());
+}
+
 inline std::string_view InputText(const std::uint8_t *pInput, size_t cbInput)
 {
     return {reinterpret_cast<const char *>(pInput), cbInput};
@@ -63,35 +71,3 @@ void ForEachLine(std::string_view text, size_t cbLine, TAKE take)
         }
     }
 }
-
-// An input as a series of decisions; all zero at its end. What is checked after every one grows
-// with their number, so there are not too many.
-struct DECISIONS {
-    std::string_view rest;
-
-    explicit DECISIONS(std::string_view input) : rest(input.substr(0, 240))
-    {
-    }
-
-    int Below(int n)
-    {
-        if (rest.empty()) {
-            return 0;
-        }
-        const int byte = static_cast<unsigned char>(rest.front());
-        rest.remove_prefix(1);
-        return byte % n;
-    }
-    // Few letters, so that equals and neighbours come often; never empty, long ones seldom.
-    std::string Text(std::string_view letters)
-    {
-        const int length = Below(256);
-        const int cch = length < 250 ? 1 + length % 5 : 1 + (length - 249) * 50;
-        std::string text;
-        for (int i = 0; i < cch; i++) {
-            const int letter = cch <= 5 ? Below(static_cast<int>(letters.size())) : i;
-            text += letters[static_cast<size_t>(letter) % letters.size()];
-        }
-        return text;
-    }
-};
