@@ -1,17 +1,18 @@
 // SPDX-License-Identifier: MIT
 //
-// The input is /proc/devices. The module itself is compiled in: its answer is cached for the life
-// of a process, and the words are read behind that.
-#include "raid/raid_info.cpp"
+// The input is /proc/devices.
+#include "raid/mdp_major.h"
 
 #include "fuzz.h"
 #include "outside.h"
+
+#include <algorithm>
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *pInput, size_t cbInput)
 {
     const std::string_view file = InputText(pInput, cbInput);
     OutsideClear();
-    OutsideFile(DEVICES_PATH, file);
+    OutsideFile("/proc/devices", file);
     const i32 number = MdpMajorRead();
     Claim(number >= MAJOR_UNKNOWN, "a major number or none");
 
