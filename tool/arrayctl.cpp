@@ -324,17 +324,31 @@ int ShellExitStatus(int result)
     return static_cast<int>((static_cast<u32>(result) >> 8U) & 0xFFU);
 }
 
-// Partition paths with a blank after each.
+// Partition paths with a blank after each, as many as there is room for.
 struct MEMBER_LIST {
     char sz[MEMBER_LIST_SIZE];
+    int nPartition; // those left out among them
+    int nLeftOut;
 };
 
+// Whole or not at all: half a partition's path is often the path of a whole disk.
 void MemberAppend(const char *szDisk, int partNum, MEMBER_LIST &members)
 {
     char szPartition[DEVICE_PATH_SIZE] = "";
+    char szEntry[sizeof(szPartition) + 1];
     (void)DiskDevicePartitionPathGet(szDisk, partNum, szPartition, sizeof(szPartition));
-    const size_t cch = strlen(members.sz);
-    (void)snprintf(members.sz + cch, sizeof(members.sz) - cch, "%s ", szPartition);
+    (void)snprintf(szEntry, sizeof(szEntry), "%s ", szPartition);
+    members.nPartition++;
+    members.nLeftOut += NLIBCStrAppendWhole(members.sz, sizeof(members.sz), szEntry) == 1 ? 0 : 1;
+}
+
+// The command goes on with fewer partitions than it counts, so mdadm refuses it.
+void LeftOutTell(int nLeftOut, int nPartition)
+{
+    if (nLeftOut > 0) {
+        NLIBCLog(LOG_ERR, "[Info] %d of %d partitions left out, no room in the command", nLeftOut,
+                 nPartition);
+    }
 }
 
 // --- initsys, initsys-dd -----------------------------------------------------------------------
@@ -345,8 +359,9 @@ constexpr int PARTITION_SWAP = 2;
 // Whoever looks at new devices may still hold the fresh partitions; mdadm wants them free.
 constexpr unsigned int ARRAY_PAUSE_SECONDS = 3;
 constexpr size_t MISSING_TEXT_SIZE = 256;
-constexpr size_t DUPLICATE_LIST_SIZE = 1024;
 constexpr size_t DUPLICATE_COMMAND_SIZE = 512;
+constexpr char DUPLICATE_COMMAND[] = "/bin/nurodd ";
+constexpr std::string_view SILENT = " > /dev/null 2>&1";
 
 void DecideCollect(const NLIBSZLIST *pDisks, DISK_CHILD *pChildren)
 {
@@ -432,15 +447,33 @@ void PartitionCollect(const NLIBSZLIST *pDisks, const DISK_CHILD *pChildren, int
     }
 }
 
+// Appends the partitions of a list that have room, each with its blank. Returns how many have.
+int MembersAppend(const MEMBER_LIST &members, char *szText, size_t cbText)
+{
+    int nTaken = 0;
+    for (const char *szRest = members.sz; *szRest != '\0';) {
+        const size_t cchEntry = strcspn(szRest, " ") + 1;
+        char szEntry[DEVICE_PATH_SIZE + 1];
+        (void)snprintf(szEntry, sizeof(szEntry), "%.*s", static_cast<int>(cchEntry), szRest);
+        nTaken += NLIBCStrAppendWhole(szText, cbText, szEntry);
+        szRest += cchEntry;
+    }
+    return nTaken;
+}
+
 // What the duplication tool makes of the partitions does not change the outcome.
 void PartitionsDuplicate(const SYSTEM_MEMBERS &members)
 {
-    char szMembers[DUPLICATE_LIST_SIZE];
-    char szCommand[DUPLICATE_COMMAND_SIZE];
-    (void)snprintf(szMembers, sizeof(szMembers), "%s %s", members.system.sz, members.swap.sz);
-    const int cch =
-        snprintf(szCommand, sizeof(szCommand), "/bin/nurodd %s > /dev/null 2>&1", szMembers);
-    const int result = cch < 0 ? -1 : system(szCommand);
+    char szCommand[DUPLICATE_COMMAND_SIZE] = "";
+    constexpr size_t CB_BEFORE_SILENT = sizeof(szCommand) - SILENT.size();
+    (void)NLIBCStrAppend(szCommand, CB_BEFORE_SILENT, DUPLICATE_COMMAND);
+    int nTaken = MembersAppend(members.system, szCommand, CB_BEFORE_SILENT);
+    (void)NLIBCStrAppend(szCommand, CB_BEFORE_SILENT, " ");
+    nTaken += MembersAppend(members.swap, szCommand, CB_BEFORE_SILENT);
+    (void)NLIBCStrAppend(szCommand, sizeof(szCommand), SILENT.data());
+    const int nPartition = members.system.nPartition + members.swap.nPartition;
+    LeftOutTell(nPartition - nTaken, nPartition);
+    const int result = system(szCommand);
     if (result == -1) {
         (void)puts("can not fork to nurodd");
     } else if (ShellExitStatus(result) != 0) {
@@ -460,11 +493,9 @@ const char *MetadataOption(const char *szMd)
 
 void MissingTextBuild(int nMissing, char *szText)
 {
-    size_t cch = 0;
     szText[0] = '\0';
-    for (int i = 0; i < nMissing && cch < MISSING_TEXT_SIZE - 1; i++) {
-        (void)snprintf(szText + cch, MISSING_TEXT_SIZE - cch, " missing");
-        cch = strlen(szText);
+    for (int i = 0; i < nMissing && strlen(szText) < MISSING_TEXT_SIZE - 1; i++) {
+        (void)NLIBCStrAppend(szText, MISSING_TEXT_SIZE, " missing");
     }
 }
 
@@ -535,6 +566,8 @@ int SystemInit(bool fDuplicate)
     }
     SYSTEM_MEMBERS members = {};
     PartitionCollect(pDisks, pChildren.get(), nSlot, members);
+    LeftOutTell(members.system.nLeftOut, members.system.nPartition);
+    LeftOutTell(members.swap.nLeftOut, members.swap.nPartition);
     if (fDuplicate) {
         PartitionsDuplicate(members);
     }
@@ -660,12 +693,14 @@ int DataVolumeCreate(int argc)
     if (nUsed < 0) {
         return STATUS_FAILED;
     }
+    LeftOutTell(members.nLeftOut, members.nPartition);
     return nUsed == 0 ? NoDisk() : DataArrayCreate(nUsed, members);
 }
 
 // --- enumformatalldisks, enumformatalldisks_indualhead_install ---------------------------------
 
 constexpr size_t NUMBERS_TEXT_SIZE = 4096;
+constexpr size_t NUMBER_TEXT_SIZE = 16;
 constexpr int STATUS_PUSH_FAILED = -1; // 255 to whoever started the tool
 
 struct FORMAT_LISTS {
@@ -700,16 +735,16 @@ int FormatTypesCollect(const DISK_CHILD *pChildren, FORMAT_LISTS &lists)
 
 void NumbersBuild(const NLIBSZLIST *pDisks, char *szNumbers)
 {
-    size_t cch = 0;
     szNumbers[0] = '\0';
-    for (int i = 0; i < pDisks->nItem && cch < NUMBERS_TEXT_SIZE - 1; i++) {
+    for (int i = 0; i < pDisks->nItem; i++) {
         const DEVICE_PATH disk = DevicePathOf(NLIBCSzListGet(pDisks, i));
         DISK_PATH_INFO info = {};
         if (DiskPathParse(disk.sz, &info) != 0) {
             NLIBCLog(LOG_ERR, "DiskPathParse(%s) fail", disk.sz);
         }
-        (void)snprintf(szNumbers + cch, NUMBERS_TEXT_SIZE - cch, "%d ", info.diskIndex);
-        cch = strlen(szNumbers);
+        char szNumber[NUMBER_TEXT_SIZE];
+        (void)snprintf(szNumber, sizeof(szNumber), "%d ", info.diskIndex);
+        (void)NLIBCStrAppend(szNumbers, NUMBERS_TEXT_SIZE, szNumber);
     }
 }
 

@@ -874,11 +874,34 @@ ACCEPTED PrepareAll(ORACLE_ANSWER &answer, PROCESS &parent, const vector<string>
     return accepted;
 }
 
+// The members that still fit, each of them whole. Returns how many do not.
+int MembersTake(const string &szMembers, size_t room, string &szText)
+{
+    int nLeftOut = 0;
+    std::istringstream members(szMembers);
+    for (string szPartition; members >> szPartition;) {
+        if (szText.size() + szPartition.size() + 1 > room) {
+            nLeftOut++;
+        } else {
+            szText += szPartition + " ";
+        }
+    }
+    return nLeftOut;
+}
+
 void Duplicate(PROCESS &parent, const ACCEPTED &accepted, string &szOut)
 {
-    const string szCommand = string(ORACLE_NURODD) + " " + accepted.szSystem + " " +
-                             accepted.szSwap + " > /dev/null 2>&1";
-    if (RunShell(parent, szCommand.substr(0, NURODD_ROOM)) != 0) {
+    const string szSilent = " > /dev/null 2>&1";
+    const size_t room = NURODD_ROOM - szSilent.size();
+    string szCommand = string(ORACLE_NURODD) + " ";
+    int nLeftOut = MembersTake(accepted.szSystem, room, szCommand);
+    szCommand += szCommand.size() < room ? " " : "";
+    nLeftOut += MembersTake(accepted.szSwap, room, szCommand);
+    if (nLeftOut > 0) {
+        LogError(parent, "[Info] " + to_string(nLeftOut) + " of " + to_string(2 * accepted.nDisks) +
+                             " partitions left out, no room in the command");
+    }
+    if (RunShell(parent, szCommand + szSilent) != 0) {
         szOut += "system init with nurodd failed\n";
     }
 }

@@ -297,25 +297,6 @@ TEST(InitsysSlots, AreCountedBeforeTheLayoutIsChosen)
             std::string(NO_DISK));
 }
 
-// Nor is there room for more than 511 characters of members: 46 paths of eleven, and five.
-TEST(InitsysSlots, AreTakenByAsManyMembersAsTheTextHasRoomFor)
-{
-    MACHINE machine = MachineWithConf(std::string(CONF_TWO_UNITS) + "max_sys_raid_disks=47\n");
-    MachineFile(machine, "/.force_clean_all_disk", "");
-    std::string szSystem;
-    std::string szSwap;
-    for (const std::string &szDisk : TwoUnitsAdd(machine, 47)) {
-        szSystem += "/dev/" + szDisk + "1 ";
-        szSwap += "/dev/" + szDisk + "2 ";
-    }
-    MachineTool(machine, "/sbin/sfdisk ...", {.nTimes = ANY_TIMES});
-    MachineTool(machine, "/sbin/mdadm -C ...", {.nTimes = 2});
-    machine.msBound = 60000;
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 0);
-    EXPECT_EQ(LogErrors(result), Inited(szSystem.substr(0, 511), szSwap.substr(0, 511)));
-}
-
 // ---- what is decided for a disk ----------------------------------------------------------------
 
 TEST(InitsysDecides, ToKeepTheDataOfADiskOfTheWantedLayout)
@@ -1030,34 +1011,6 @@ TEST(InitsysDuplicate, RunsWithTwoEmptyListsWhenNoDiskIsThere)
     const RUN_RESULT failed = MachineRun(machine, {"initsys-dd"});
     EXPECT_EQ(failed.status, 1);
     EXPECT_EQ(ShellText(), "/bin/nurodd   > /dev/null 2>&1\n");
-}
-
-// 511 characters of the command go to the shell: the lists lose their end and the noise its way.
-TEST(InitsysDuplicate, GetsAsMuchAsTheCommandHasRoomFor)
-{
-    MACHINE machine = MachineWithConf("maxdisks=26\nsupportraid=yes\nusbportcfg=0x80000000\n"
-                                      "internalportcfg=0x3ffffff\n");
-    MachineFile(machine, "/.force_clean_all_disk", "");
-    std::string szSystem;
-    std::string szSwap;
-    for (char ch = 'a'; ch <= 'z'; ch++) {
-        const std::string szDisk = std::string("sd") + ch;
-        MachineDiskAdd(machine, szDisk);
-        szSystem += "/dev/" + szDisk + "1 ";
-        szSwap += "/dev/" + szDisk + "2 ";
-    }
-    MachineTool(machine, "/sbin/sfdisk ...", {.nTimes = ANY_TIMES});
-    MachineTool(machine, "/sbin/mdadm -C ...", {.nTimes = 2});
-    MachineTool(machine, "/bin/nurodd ...", {.szOut = "noise\n"});
-    ShellWatch(machine);
-    machine.msBound = 30000;
-    const RUN_RESULT result = MachineRun(machine, {"initsys-dd"});
-    EXPECT_EQ(result.status, 0);
-    const std::string szShell = ShellText();
-    const std::string szWhole = "/bin/nurodd " + szSystem + " " + szSwap + " > /dev/null 2>&1";
-    EXPECT_EQ(szShell.substr(0, szShell.find('\n')), szWhole.substr(0, 511));
-    EXPECT_EQ(result.szOut, "noise\n");
-    EXPECT_EQ(LogErrors(result), Inited(szSystem, szSwap)); // the arrays have all of them
 }
 
 } // namespace

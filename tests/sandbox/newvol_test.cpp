@@ -430,25 +430,6 @@ std::string OverLimit(size_t nTaken)
            " disks, more than raid group split unit\n";
 }
 
-// 46 paths of eleven characters and five of the next: 511.
-TEST(NewvolDualHead, NamesAsManyMembersAsTheTextHasRoomFor)
-{
-    MACHINE machine = MachineWithConf(std::string(CONF_TWO_UNITS) + "raidgroup_split_units=50\n");
-    const std::vector<std::string> disks = TwoUnitsAdd(machine, 50);
-    MachineTool(machine, "/sbin/sfdisk ...", {.nTimes = 150});
-    MachineTool(machine, "/sbin/mdadm -C /dev/md2 ...", {.status = 1});
-    ShellWatch(machine);
-    machine.msBound = 60000;
-    const RUN_RESULT result = MachineRun(machine, {"newvol"});
-    EXPECT_EQ(result.status, 1);
-    const std::string szMembers = MembersText(disks).substr(0, 511);
-    EXPECT_EQ(szMembers.substr(506), "/dev/");
-    EXPECT_EQ(ShellText(),
-              "/sbin/mdadm -C /dev/md2 -amd -R -l5  -n50 " + szMembers + "> /dev/null 2>&1\n");
-    EXPECT_EQ(LogText(result), "<11>arrayctl.cpp:# Failed to create RAID '/dev/md2' on '" +
-                                   szMembers + "', errno=1\n");
-}
-
 struct LIMIT_CASE {
     const char *szConf;
     size_t nDisk;
