@@ -19,6 +19,7 @@
 #include "nurostoragecore/partition_edit.h"
 #include "nurostoragecore/partition_layout.h"
 #include "nurostoragecore/partition_version.h"
+#include "nurostoragecore/program_path.h"
 #include "nurostoragecore/raid_info.h"
 #include "nurostoragecore/raid_membership.h"
 #include "nurostoragecore/raid_remove.h"
@@ -509,7 +510,7 @@ int SystemRaidCreate(const char *szMd, int nDisk, int nSlot, const char *szMembe
     char szCommand[CREATE_COMMAND_SIZE];
     const int cch =
         snprintf(szCommand, sizeof(szCommand),
-                 "/sbin/mdadm -C %s %s -amd -R -l1 %s -n%d %s %s> /dev/null 2>&1", szMd,
+                 "%s -C %s %s -amd -R -l1 %s -n%d %s %s> /dev/null 2>&1", MDADM_PATH, szMd,
                  MetadataOption(szMd), nDisk == 1 ? "-f" : "", nSlot, szMembers, szMissing);
     (void)sleep(ARRAY_PAUSE_SECONDS);
     if (cch < 0 || ShellExitStatus(system(szCommand)) != 0) {
@@ -660,9 +661,8 @@ int DataArrayCreate(int nDisk, const MEMBER_LIST &members)
     (void)printf("Creating RAID %d volume... \n", level);
 
     char szCommand[CREATE_COMMAND_SIZE];
-    (void)snprintf(szCommand, sizeof(szCommand),
-                   "/sbin/mdadm -C %s -amd -R -l%d %s -n%d %s> /dev/null 2>&1", DATA_MD_PATH, level,
-                   nDisk == 1 ? "-f" : "", nDisk, members.sz);
+    (void)snprintf(szCommand, sizeof(szCommand), "%s -C %s -amd -R -l%d %s -n%d %s> /dev/null 2>&1",
+                   MDADM_PATH, DATA_MD_PATH, level, nDisk == 1 ? "-f" : "", nDisk, members.sz);
     const int status = ShellExitStatus(system(szCommand));
     if (status != 0) {
         NLIBCLog(LOG_ERR, "Failed to create RAID '%s' on '%s', errno=%d", DATA_MD_PATH, members.sz,

@@ -6,6 +6,7 @@
 #include <climits>
 #include <cstdlib>
 #include <regex>
+#include <sstream>
 #include <strings.h>
 
 namespace

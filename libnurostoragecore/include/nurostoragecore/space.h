@@ -12,6 +12,10 @@
 // when there is no memory for the arguments.
 [[gnu::sentinel]] int SpaceExecl(const char *szPath, ...);
 
+// The same for a vector of the caller's, argv[0] the path, ended by NULL. A caller that tells of a
+// failed command makes its words of the same vector.
+int SpaceExecv(const char *const argv[]);
+
 // Reads the stream to its end and, when there was anything, appends a line with the time and
 // szCommand (NULL is an empty text). Returns 0, or -1: ERR_BAD_PARAMETER for a NULL stream, no code
 // when the log cannot be opened.

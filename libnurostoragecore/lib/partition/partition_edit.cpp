@@ -9,9 +9,10 @@
 #include "nurocore/text.h"
 #include "nurostoragecore/partition_layout.h"
 #include "nurostoragecore/partition_version.h"
+#include "nurostoragecore/program_path.h"
 #include "nurostoragecore/space.h"
 #include "partition/partition_type.h"
-#include "raid/raid_tool.h"
+#include "space/command_text.h"
 
 #include <array>
 #include <cstdio>
@@ -20,14 +21,16 @@
 namespace
 {
 
-constexpr char SFDISK_PATH[] = "/sbin/sfdisk";
 constexpr size_t OPTION_SIZE = 32;
 constexpr size_t COMMAND_TEXT_SIZE = 512;
+constexpr size_t ARGUMENT_TEXT_MAX = 256; // characters of one argument in the log
 constexpr size_t PATH_SIZE = 128;
 constexpr size_t LISTED_PATH_SIZE = 64;
 constexpr int LISTED_LINE_SIZE = 257; // a line of at most 256 bytes
-constexpr int ERR_TABLE_NOT_ADDED = 255;
-constexpr int ERR_NO_KIND = -1;
+
+// What the log says for a step that has no result of a command.
+constexpr int RESULT_TABLE_NOT_ADDED = 255;
+constexpr int RESULT_NO_KIND = -1;
 
 constexpr int PARTITION_DATA = 3;
 
@@ -59,8 +62,10 @@ OPTION NumberOption(int partNum)
     return option;
 }
 
-int CommandFailed(const char *szCommand, int result)
+int CommandFailed(const char *const argv[], int result)
 {
+    char szCommand[COMMAND_TEXT_SIZE];
+    CommandTextBuild(argv, ARGUMENT_TEXT_MAX, szCommand, sizeof(szCommand));
     NLIBCLog(LOG_ERR, "Failed to [%s], err=%d", szCommand, result);
     return -1;
 }
@@ -77,21 +82,16 @@ int DataPartitionCreate(const char *szDisk, const PARTITION_LAYOUT &layout)
     const OPTION gap = SizeOption("-j", layout.dataGap);
     const OPTION type = TypeOption(TYPE_LINUX);
     // The empty argument is kept: the partitioner takes its place for an option's.
-    const int result = SpaceExecl(SFDISK_PATH, number.szText, "", "-uS", "-q", "-f", gap.szText,
-                                  "-z-1", type.szText, "-F", szDisk, nullptr);
-    if (result == 0) {
-        return 0;
-    }
-    char szCommand[COMMAND_TEXT_SIZE];
-    (void)snprintf(szCommand, sizeof(szCommand), "%s %s %s -uS -q -f %s -z-1 %s -F %.256s",
-                   SFDISK_PATH, number.szText, "", gap.szText, type.szText, szDisk);
-    return CommandFailed(szCommand, result);
+    const char *const argv[] = {SFDISK_PATH, number.szText, "",          "-uS", "-q",   "-f",
+                                gap.szText,  "-z-1",        type.szText, "-F",  szDisk, nullptr};
+    const int result = SpaceExecv(argv);
+    return result == 0 ? 0 : CommandFailed(argv, result);
 }
 
 int SystemPartitionsCreate(const char *szDisk, const PARTITION_LAYOUT &layout)
 {
     if (PartitionTableAdd(szDisk) != 0) {
-        return PartitionFailed(szDisk, ERR_TABLE_NOT_ADDED);
+        return PartitionFailed(szDisk, RESULT_TABLE_NOT_ADDED);
     }
     const OPTION start = SizeOption("-j", layout.partitions[0].start);
     const OPTION systemSize = SizeOption("-z", layout.systemSize);
@@ -103,15 +103,10 @@ int SystemPartitionsCreate(const char *szDisk, const PARTITION_LAYOUT &layout)
     }
     const OPTION swapSize = SizeOption("-z", layout.swapSize);
     const OPTION swapType = TypeOption(TYPE_SWAP);
-    result = SpaceExecl(SFDISK_PATH, "-N2", "-uS", "-q", "-f", "-j0", swapSize.szText,
-                        swapType.szText, "-F", szDisk, nullptr);
-    if (result == 0) {
-        return 0;
-    }
-    char szCommand[COMMAND_TEXT_SIZE];
-    (void)snprintf(szCommand, sizeof(szCommand), "%s -N2 -uS -q -f -j0 %s %s -F %.256s",
-                   SFDISK_PATH, swapSize.szText, swapType.szText, szDisk);
-    return CommandFailed(szCommand, result);
+    const char *const argv[] = {SFDISK_PATH,     "-N2",           "-uS", "-q",   "-f",   "-j0",
+                                swapSize.szText, swapType.szText, "-F",  szDisk, nullptr};
+    result = SpaceExecv(argv);
+    return result == 0 ? 0 : CommandFailed(argv, result);
 }
 
 // The version asked for, else the disk's own, else the machine's.
@@ -189,7 +184,8 @@ int PartitionCreate(const char *szDisk, int kind, const u32 *pVersion)
     if ((kind & PARTITION_KIND_SYSTEM) != 0) {
         return SystemPartitionsCreate(szDisk, *pLayout);
     }
-    return CommandFailed("", ERR_NO_KIND);
+    const char *const NO_COMMAND[] = {nullptr};
+    return CommandFailed(NO_COMMAND, RESULT_NO_KIND);
 }
 
 int PartitionClean(const char *szDisk, int mode)

@@ -2,12 +2,11 @@
 #include "nurostoragecore/raid_add.h"
 
 #include "nurocore/log.h"
+#include "nurostoragecore/program_path.h"
 #include "nurostoragecore/raid_info.h"
 #include "nurostoragecore/space.h"
 #include "raid/raid_owner.h"
-#include "raid/raid_tool.h"
-
-#include <cstdio>
+#include "space/command_text.h"
 
 namespace
 {
@@ -15,13 +14,17 @@ namespace
 constexpr size_t COMMAND_TEXT_SIZE = 512;
 constexpr u32 LEVELS_WITH_REDUNDANCY = RAID_LEVEL_1 | RAID_LEVEL_5 | RAID_LEVEL_6 | RAID_LEVEL_10;
 
-void CommandTextBuild(const char *szOption, const char *szMd, const char *szDisk, char *szText)
+// Runs the command; a failed one is told in its own words.
+int AddCommandRun(const char *const argv[])
 {
-    const int cch =
-        snprintf(szText, COMMAND_TEXT_SIZE, "%s %s%s -a %s", MDADM_PATH, szOption, szMd, szDisk);
-    if (cch < 0) {
-        szText[0] = '\0';
+    const int result = SpaceExecv(argv);
+    if (result == 0) {
+        return 0;
     }
+    char szCommand[COMMAND_TEXT_SIZE];
+    CommandTextBuild(argv, COMMAND_TEXT_SIZE, szCommand, sizeof(szCommand));
+    NLIBCLog(LOG_ERR, "Failed to '%s', ret = %d", szCommand, result);
+    return -1;
 }
 
 } // namespace
@@ -59,21 +62,14 @@ int RAIDAdd(const char *szMd, const char *szDisk)
         NLIBCLog(LOG_ERR, "Failed to get RAID '%s' info. Can not add disk into it. ", szMd);
         return -1;
     }
-    int result = 0;
-    char szCommand[COMMAND_TEXT_SIZE];
     if ((pInfo->level & LEVELS_WITH_REDUNDANCY) != 0) {
-        CommandTextBuild("", szMd, szDisk, szCommand);
-        result = SpaceExecl(MDADM_PATH, szMd, "-a", szDisk, nullptr);
-    } else if (pInfo->level == RAID_LEVEL_LINEAR) {
-        CommandTextBuild("--grow ", szMd, szDisk, szCommand);
-        result = SpaceExecl(MDADM_PATH, "--grow", szMd, "-a", szDisk, nullptr);
-    } else {
-        NLIBCLog(LOG_ERR, "Bad raid level to add disk: %d", static_cast<int>(pInfo->level));
-        return -1;
+        const char *const argv[] = {MDADM_PATH, szMd, "-a", szDisk, nullptr};
+        return AddCommandRun(argv);
     }
-    if (result != 0) {
-        NLIBCLog(LOG_ERR, "Failed to '%s', ret = %d", szCommand, result);
-        return -1;
+    if (pInfo->level == RAID_LEVEL_LINEAR) {
+        const char *const argv[] = {MDADM_PATH, "--grow", szMd, "-a", szDisk, nullptr};
+        return AddCommandRun(argv);
     }
-    return 0;
+    NLIBCLog(LOG_ERR, "Bad raid level to add disk: %d", static_cast<int>(pInfo->level));
+    return -1;
 }

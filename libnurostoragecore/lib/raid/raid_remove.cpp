@@ -7,10 +7,10 @@
 #include "nurocore/log.h"
 #include "nurocore/szlist.h"
 #include "nurostoragecore/partition_enum.h"
+#include "nurostoragecore/program_path.h"
 #include "nurostoragecore/raid_superblock.h"
 #include "nurostoragecore/space.h"
 #include "raid/raid_owner.h"
-#include "raid/raid_tool.h"
 
 #include <cstdio>
 #include <cstring>

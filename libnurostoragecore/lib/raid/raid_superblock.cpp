@@ -5,7 +5,7 @@
 #include "nurocore/log.h"
 #include "nurocore/pipe.h"
 #include "nurocore/text.h"
-#include "raid/raid_tool.h"
+#include "nurostoragecore/program_path.h"
 
 #include <cstdio>
 #include <cstring>

@@ -6,6 +6,7 @@
 #include "nurocore/log.h"
 #include "nurocore/pipe.h"
 #include "nurocore/process.h"
+#include "space/command_text.h"
 
 #include <cstdarg>
 #include <cstring>
@@ -20,18 +21,13 @@ constexpr size_t ERROR_TEXT_SIZE = 2048;
 constexpr size_t LOG_LINE_SIZE = 2048;
 constexpr size_t TIME_STAMP_SIZE = 32;
 
-// Path and arguments with a blank between them; what does not fit is left out of the text, not of
-// the command.
-void CommandTextBuild(char *const argv[], char *szText)
+// What does not fit is left out of the text, not of the command.
+void CommandLogText(const char *const argv[], char *szText)
 {
-    size_t cchText = 0;
-    szText[0] = '\0';
-    for (size_t i = 0; argv[i] != nullptr && cchText < COMMAND_TEXT_SIZE - 1; i++) {
-        (void)snprintf(szText + cchText, COMMAND_TEXT_SIZE - cchText, "%s ", argv[i]);
-        cchText += strlen(szText + cchText);
-    }
-    if (cchText > 0 && szText[cchText - 1] == ' ') {
-        szText[cchText - 1] = '\0';
+    CommandTextBuild(argv, COMMAND_TEXT_SIZE, szText, COMMAND_TEXT_SIZE);
+    // Kept: where the buffer ends behind an argument, its blank goes too.
+    if (strlen(szText) == COMMAND_TEXT_SIZE - 1 && szText[COMMAND_TEXT_SIZE - 2] == ' ') {
+        szText[COMMAND_TEXT_SIZE - 2] = '\0';
     }
 }
 
@@ -90,6 +86,21 @@ int SpaceErrorLog(FILE *pStream, const char *szCommand)
     return 0;
 }
 
+int SpaceExecv(const char *const argv[])
+{
+    if (argv == nullptr || argv[0] == nullptr) {
+        NLIBCErrSetHere(ERR_BAD_PARAMETER);
+        return -1;
+    }
+    char szCommand[COMMAND_TEXT_SIZE];
+    CommandLogText(argv, szCommand);
+    // execv takes the vector so, and does not write.
+    FILE *const pStream = NLIBCPopenV(argv[0], "rE", const_cast<char *const *>(argv));
+    // The log is a record, not a judge: the tool's own status decides.
+    (void)SpaceErrorLog(pStream, szCommand);
+    return NLIBCPclose(pStream);
+}
+
 int SpaceExecl(const char *szPath, ...)
 {
     if (szPath == nullptr) {
@@ -98,15 +109,7 @@ int SpaceExecl(const char *szPath, ...)
     }
     va_list arguments;
     va_start(arguments, szPath);
-    HEAP_OWNER<char *> argv(NLIBCArgvAlloc(szPath, arguments));
+    const HEAP_OWNER<char *> argv(NLIBCArgvAlloc(szPath, arguments));
     va_end(arguments);
-    if (argv == nullptr) {
-        return -1;
-    }
-    char szCommand[COMMAND_TEXT_SIZE];
-    CommandTextBuild(argv.get(), szCommand);
-    FILE *const pStream = NLIBCPopenV(szPath, "rE", argv.get());
-    // The log is a record, not a judge: the tool's own status decides.
-    (void)SpaceErrorLog(pStream, szCommand);
-    return NLIBCPclose(pStream);
+    return argv == nullptr ? -1 : SpaceExecv(argv.get());
 }
