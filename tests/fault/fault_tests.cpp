@@ -11,16 +11,15 @@
 #include "judge.h"
 #include "sandbox.h"
 #include "situations.h"
+#include "suite.h"
 
 #include <algorithm>
 #include <cerrno>
-#include <chrono>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <fstream>
 #include <sstream>
-#include <sys/wait.h>
-#include <unistd.h>
 
 namespace
 {
@@ -29,17 +28,15 @@ using std::string;
 using std::to_string;
 using STRINGS = std::vector<string>;
 
-constexpr size_t EVERY_DEFAULT = 8;
-constexpr size_t JOBS_DEFAULT = 2;
 constexpr int CALLS_MAX = 2000; // a call that fails for ever ends the loop here
 constexpr char EVERY_CALL[] = "*";
 
 struct OPTIONS {
     bool fAll = false;
     bool fShow = false;
-    size_t every = EVERY_DEFAULT;
-    size_t thin = 1;
-    size_t jobs = JOBS_DEFAULT;
+    std::uint64_t every = 8;
+    std::uint64_t thin = 1;
+    std::uint64_t jobs = 2;
     string szOnly = {};
     string szMinimum = {};
 };
@@ -123,12 +120,6 @@ CALL_COUNTS CallsCount(const STRINGS &calls)
 
 // ---- one situation -----------------------------------------------------------------------------
 
-struct TALLY {
-    size_t injections = 0;
-    std::map<size_t, size_t> allowed = {};
-    STRINGS wrong = {};
-};
-
 struct SWEEP {
     const OPTIONS &options;
     const SITUATION &situation;
@@ -150,7 +141,7 @@ void VerdictTake(SWEEP &sweep, const MACHINE_FAULT &fault, const RUN_RESULT &res
 {
     const VERDICT verdict = Judge(sweep.situation, sweep.clean, result);
     for (const auto &[row, n] : verdict.allowed) {
-        sweep.tally.allowed[row] += n;
+        sweep.tally.allowed[AllowanceText(row)] += n;
     }
     string szText = sweep.situation.szName + ": " + FaultName(fault) + "\n";
     for (const string &szWrong : verdict.wrong) {
@@ -176,7 +167,7 @@ bool Inject(SWEEP &sweep, const MACHINE_FAULT &fault)
     if (!WasInjected(result)) {
         return false;
     }
-    sweep.tally.injections++;
+    sweep.tally.done++;
     VerdictTake(sweep, fault, result);
     return true;
 }
@@ -253,181 +244,65 @@ TALLY SituationSweep(const OPTIONS &options, const SITUATION &situation, size_t 
     return sweep.tally;
 }
 
-// ---- workers -----------------------------------------------------------------------------------
-
-// A worker tells of a situation in lines; the text of what is wrong comes indented after its line.
-void TallyTell(FILE *pOut, size_t situation, const TALLY &tally)
-{
-    fprintf(pOut, "situation %zu %zu %zu\n", situation, tally.injections, tally.wrong.size());
-    for (const auto &[row, n] : tally.allowed) {
-        fprintf(pOut, "allowed %zu %zu\n", row, n);
-    }
-    for (const string &szWrong : tally.wrong) {
-        fprintf(pOut, "wrong %s", szWrong.c_str());
-    }
-    (void)fflush(pOut);
-}
-
-void WorkerStart(const OPTIONS &options, const std::vector<SITUATION> &situations, size_t worker,
-                 FILE *pOut)
-{
-    if (fork() != 0) {
-        return;
-    }
-    for (size_t i = 0; i < situations.size(); i++) {
-        TallyTell(pOut, i, SituationSweep(options, situations[i], worker));
-    }
-    (void)fclose(pOut);
-    exit(EXIT_SUCCESS);
-}
-
-struct TOTALS {
-    std::map<string, size_t> byCommand = {}; // injections
-    std::map<size_t, size_t> reported = {};  // situation -> workers that told of it
-    std::map<size_t, size_t> wrong = {};     // situation -> runs
-    std::map<size_t, size_t> allowed = {};
-    size_t injections = 0;
-};
-
-string CommandOf(const SITUATION &situation)
-{
-    return situation.szName.substr(0, situation.szName.find(':'));
-}
-
-void WorkerRead(const std::vector<SITUATION> &situations, FILE *pIn, TOTALS &totals)
-{
-    rewind(pIn);
-    char *pszLine = nullptr;
-    size_t cb = 0;
-    while (getline(&pszLine, &cb, pIn) > 0) {
-        size_t situation = 0;
-        size_t first = 0;
-        size_t second = 0;
-        if (sscanf(pszLine, "situation %zu %zu %zu", &situation, &first, &second) == 3) {
-            totals.reported[situation]++;
-            totals.wrong[situation] += second;
-            totals.byCommand[CommandOf(situations[situation])] += first;
-            totals.injections += first;
-        } else if (sscanf(pszLine, "allowed %zu %zu", &first, &second) == 2) {
-            totals.allowed[first] += second;
-        } else {
-            (void)fputs(pszLine, stdout);
-        }
-    }
-    free(pszLine);
-    (void)fclose(pIn);
-}
-
-// ---- the minimum
-// ---------------------------------------------------------------------------------
-
-struct COUNTS {
-    size_t passed = 0;
-    size_t failed = 0;
-};
-
-void CountCheck(COUNTS &counts, bool fPassed, const string &szWhat)
-{
-    (fPassed ? counts.passed : counts.failed)++;
-    if (!fPassed) {
-        printf("FAILED: %s\n", szWhat.c_str());
-    }
-}
+// ---- the suite ---------------------------------------------------------------------------------
 
 // Lines "COMMAND NUMBER": no fewer injections than were once reached.
-void MinimumCheck(const OPTIONS &options, const TOTALS &totals, COUNTS &counts)
+void MinimumCheck(const OPTIONS &options, std::map<string, std::uint64_t> &byCommand,
+                  COUNTS &counts)
 {
-    FILE *const pMinimum = fopen(options.szMinimum.c_str(), "r");
-    if (pMinimum == nullptr) {
-        CountCheck(counts, false, "cannot read " + options.szMinimum);
-        return;
+    std::ifstream file(options.szMinimum);
+    string szCommand;
+    std::uint64_t minimum = 0;
+    VerdictTell(counts, file.good(), "minimum: " + options.szMinimum);
+    while (file >> szCommand >> minimum) {
+        VerdictTell(counts, byCommand[szCommand] >= minimum,
+                    "minimum: " + szCommand + " has " + to_string(byCommand[szCommand]) +
+                        " injections, it had " + to_string(minimum));
     }
-    char szCommand[64] = "";
-    size_t minimum = 0;
-    while (fscanf(pMinimum, "%63s %zu", szCommand, &minimum) == 2) {
-        const auto found = totals.byCommand.find(szCommand);
-        const size_t reached = found == totals.byCommand.end() ? 0 : found->second;
-        CountCheck(counts, reached >= minimum,
-                   string(szCommand) + " has " + to_string(reached) + " injections, it had " +
-                       to_string(minimum));
-    }
-    (void)fclose(pMinimum);
 }
 
-// ---- the suite ----------------------------------------------------------------------------------
-
-void TotalsPrint(const TOTALS &totals)
+void TotalsTell(const OPTIONS &options, const std::vector<SITUATION> &situations,
+                const std::vector<TEST_TOTAL> &totals, COUNTS &counts)
 {
+    std::map<string, std::uint64_t> allowed;
+    std::map<string, std::uint64_t> byCommand;
+    std::uint64_t injections = 0;
+    for (size_t i = 0; i < totals.size(); i++) {
+        const string &szName = situations[i].szName;
+        byCommand[szName.substr(0, szName.find(':'))] += totals[i].done;
+        injections += totals[i].done;
+        for (const auto &[szReason, n] : totals[i].allowed) {
+            allowed[szReason] += n;
+        }
+    }
     for (size_t row = 0; row < AllowanceCount(); row++) {
-        const auto found = totals.allowed.find(row);
-        printf("allowed %zu times: %s\n", found == totals.allowed.end() ? 0 : found->second,
-               AllowanceText(row).c_str());
+        const string szReason = AllowanceText(row);
+        printf("allowed %s times: %s\n", to_string(allowed[szReason]).c_str(), szReason.c_str());
     }
-    for (const auto &[szCommand, n] : totals.byCommand) {
-        printf("fault: %s %zu injections\n", szCommand.c_str(), n);
+    if (!options.szMinimum.empty()) {
+        MinimumCheck(options, byCommand, counts);
     }
+    printf("fault: %s injections\n", to_string(injections).c_str());
 }
 
-int RingRun(const OPTIONS &options)
+int SituationsTry(const OPTIONS &options)
 {
-    using CLOCK = std::chrono::steady_clock;
-    const CLOCK::time_point start = CLOCK::now();
     std::vector<SITUATION> situations = SituationsMake();
     std::erase_if(situations, [&](const SITUATION &situation) {
         return situation.szName.find(options.szOnly) == string::npos;
     });
-    (void)fflush(stdout);
-    std::vector<FILE *> told;
-    for (size_t worker = 0; worker < options.jobs; worker++) {
-        told.push_back(tmpfile());
-        WorkerStart(options, situations, worker, told.back());
-    }
-    while (wait(nullptr) > 0) {
-    }
-    TOTALS totals;
-    for (FILE *const pIn : told) {
-        WorkerRead(situations, pIn, totals);
+    SUITE suite = {.szDone = "injections",
+                   .szAgain = "fault_tests --only",
+                   .nWorker = options.jobs,
+                   .work = [&](size_t test, size_t worker) {
+                       return SituationSweep(options, situations[test], worker);
+                   }};
+    for (const SITUATION &situation : situations) {
+        suite.names.push_back(situation.szName);
     }
     COUNTS counts;
-    for (size_t i = 0; i < situations.size(); i++) {
-        CountCheck(counts, totals.wrong[i] == 0 && totals.reported[i] == options.jobs,
-                   situations[i].szName);
-    }
-    TotalsPrint(totals);
-    if (!options.szMinimum.empty()) {
-        MinimumCheck(options, totals, counts);
-    }
-    const auto seconds = std::chrono::duration_cast<std::chrono::seconds>(CLOCK::now() - start);
-    printf("fault: %zu situations, %lld s\n", situations.size(),
-           static_cast<long long>(seconds.count()));
-    printf("fault: %zu injections\n", totals.injections);
-    printf("fault: %zu passed, %zu failed\n", counts.passed, counts.failed);
-    return counts.failed == 0 ? EXIT_SUCCESS : EXIT_FAILURE;
-}
-
-int Usage()
-{
-    fprintf(stderr, "usage: fault_tests [--all] [--every N] [--thin N] [--jobs J] "
-                    "[--only TEXT] [--minimum FILE] [--show]\n");
-    return EXIT_FAILURE;
-}
-
-bool OptionTake(OPTIONS &options, const string &szName, const char *szValue)
-{
-    if (szName == "--only") {
-        options.szOnly = szValue;
-    } else if (szName == "--minimum") {
-        options.szMinimum = szValue;
-    } else if (szName == "--every") {
-        options.every = strtoul(szValue, nullptr, 10);
-    } else if (szName == "--thin") {
-        options.thin = strtoul(szValue, nullptr, 10);
-    } else if (szName == "--jobs") {
-        options.jobs = strtoul(szValue, nullptr, 10);
-    } else {
-        return false;
-    }
-    return options.every > 0 && options.thin > 0 && options.jobs > 0;
+    TotalsTell(options, situations, SuiteRun(suite, counts), counts);
+    return CountsTell(counts);
 }
 
 } // namespace
@@ -435,15 +310,13 @@ bool OptionTake(OPTIONS &options, const string &szName, const char *szValue)
 int main(int argc, char *argv[])
 {
     OPTIONS options;
-    for (int i = 1; i < argc; i++) {
-        const string szName = argv[i];
-        if (szName == "--all") {
-            options.fAll = true;
-        } else if (szName == "--show") {
-            options.fShow = true;
-        } else if (i + 1 >= argc || !OptionTake(options, szName, argv[++i])) {
-            return Usage();
-        }
-    }
-    return RingRun(options);
+    const bool fTaken = OptionsTake(argc, argv,
+                                    {{"--all", &options.fAll},
+                                     {"--every", &options.every},
+                                     {"--thin", &options.thin},
+                                     {"--jobs", &options.jobs},
+                                     {"--only", &options.szOnly},
+                                     {"--minimum", &options.szMinimum},
+                                     {"--show", &options.fShow}});
+    return fTaken ? SituationsTry(options) : EXIT_FAILURE;
 }

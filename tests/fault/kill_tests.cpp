@@ -7,10 +7,11 @@
 //
 // The tool is killed alone, so that what it has started comes to its own end, or with all of that
 // at any system call of its own processes. Without --all, one in N points is tried.
-#include "private_root.h"
 #include "pattern.h"
+#include "private_root.h"
 #include "sandbox.h"
 #include "storage_machine.h"
+#include "suite.h"
 
 #include <algorithm>
 #include <cstdio>
@@ -21,8 +22,6 @@
 #include <map>
 #include <set>
 #include <sstream>
-#include <sys/wait.h>
-#include <unistd.h>
 #include <utility>
 
 namespace
@@ -33,10 +32,7 @@ using std::to_string;
 using STRINGS = std::vector<string>;
 namespace fs = std::filesystem;
 
-constexpr size_t EVERY_DEFAULT = 3; // odd, so that both kinds of killing get their turn
-constexpr size_t JOBS_DEFAULT = 2;
-constexpr size_t MINIMUM = 1000;
-constexpr size_t SHOWN = 5;
+constexpr std::uint64_t MINIMUM = 1000;
 constexpr int RUN_BOUND = 30000; // milliseconds; the machine may be busy with something else
 constexpr char RUNNER[] = "ARRAYCTL_RUNNER";
 
@@ -46,8 +42,8 @@ constexpr const char *TOOLS[] = {"/sbin/mdadm",    "/sbin/sfdisk",   "/sbin/pvs"
 
 struct OPTIONS {
     bool fAll = false;
-    size_t every = EVERY_DEFAULT;
-    size_t jobs = JOBS_DEFAULT;
+    std::uint64_t every = 3; // odd, so that both kinds of killing get their turn
+    std::uint64_t jobs = 2;
     string szOnly = {};
 };
 
@@ -215,12 +211,6 @@ struct POINT {
     bool fAll = false;
 };
 
-struct TALLY {
-    size_t kills = 0;
-    std::map<string, size_t> allowed = {}; // reason -> kills
-    STRINGS wrong = {};
-};
-
 // How often each process of the tool enters the kernel in an undisturbed run.
 std::vector<POINT> PointsTake()
 {
@@ -292,7 +282,7 @@ void PointTry(const KILL_CASE &subject, const POINT &point, const STRINGS &expec
 {
     const RUN_RESULT killed = SteppedRun(subject, point);
     const RUN_RESULT again = MachineTryAgain(subject.machine, subject.words);
-    tally.kills++;
+    tally.done++;
     if (killed.fTimedOut || again.fTimedOut || again.signal != 0) {
         tally.wrong.push_back(subject.szName + ": it hangs or breaks after a kill at " +
                               point.szProcess + " " + to_string(point.nEntry) + "\n");
@@ -321,107 +311,43 @@ TALLY CaseRun(const OPTIONS &options, const KILL_CASE &subject, size_t worker)
     return tally;
 }
 
-// ---- the suite ----------------------------------------------------------------------------------
+// ---- the suite ---------------------------------------------------------------------------------
 
-// A worker tells of a case in one line; what is wrong is shown at once.
-void WorkerStart(const OPTIONS &options, const std::vector<KILL_CASE> &cases, size_t worker,
-                 FILE *pOut)
+void TotalsTell(const OPTIONS &options, const SUITE &suite, const std::vector<TEST_TOTAL> &totals,
+                COUNTS &counts)
 {
-    if (fork() != 0) {
-        return;
-    }
-    for (size_t i = 0; i < cases.size(); i++) {
-        const TALLY tally = CaseRun(options, cases[i], worker);
-        for (size_t n = 0; n < std::min(tally.wrong.size(), SHOWN); n++) {
-            (void)fputs(tally.wrong[n].c_str(), stdout);
+    std::uint64_t kills = 0;
+    for (size_t i = 0; i < totals.size(); i++) {
+        kills += totals[i].done;
+        for (const auto &[szReason, n] : totals[i].allowed) {
+            printf("allowed %s times: %s: %s\n", to_string(n).c_str(), suite.names[i].c_str(),
+                   szReason.c_str());
         }
-        fprintf(pOut, "%zu %zu %zu\n", i, tally.kills, tally.wrong.size());
-        for (const auto &[szReason, n] : tally.allowed) {
-            printf("kept %zu times: %s: %s\n", n, cases[i].szName.c_str(), szReason.c_str());
-        }
-        (void)fflush(nullptr);
     }
-    exit(EXIT_SUCCESS);
+    if (options.szOnly.empty()) {
+        VerdictTell(counts, kills >= MINIMUM, "minimum: " + to_string(MINIMUM) + " kills");
+    }
+    printf("kill: %s points\n", to_string(kills).c_str());
 }
 
-struct CASE_TOTAL {
-    size_t reports = 0;
-    size_t kills = 0;
-    size_t wrong = 0;
-};
-
-void WorkerRead(FILE *pIn, std::vector<CASE_TOTAL> &totals)
-{
-    rewind(pIn);
-    size_t i = 0;
-    size_t kills = 0;
-    size_t wrong = 0;
-    while (fscanf(pIn, "%zu %zu %zu", &i, &kills, &wrong) == 3) {
-        totals[i].reports++;
-        totals[i].kills += kills;
-        totals[i].wrong += wrong;
-    }
-}
-
-int TotalsPrint(const OPTIONS &options, const std::vector<KILL_CASE> &cases,
-                const std::vector<CASE_TOTAL> &totals)
-{
-    size_t kills = 0;
-    size_t failed = 0;
-    for (size_t i = 0; i < cases.size(); i++) {
-        const CASE_TOTAL &total = totals[i];
-        const bool fPassed = total.wrong == 0 && total.reports == options.jobs;
-        kills += total.kills;
-        failed += fPassed ? 0 : 1;
-        printf("%s %s: %zu kills", fPassed ? "ok" : "FAILED", cases[i].szName.c_str(), total.kills);
-        if (total.wrong > 0) {
-            printf(", %zu end in another state", total.wrong);
-        }
-        printf("\n");
-    }
-    const bool fEnough = !options.szOnly.empty() || kills >= MINIMUM;
-    printf("kill: %zu points\n", kills);
-    printf("kill: %zu passed, %zu failed\n", cases.size() - failed + (fEnough ? 1 : 0),
-           failed + (fEnough ? 0 : 1));
-    return failed == 0 && fEnough ? EXIT_SUCCESS : EXIT_FAILURE;
-}
-
-int RingRun(const OPTIONS &options)
+int CasesTry(const OPTIONS &options)
 {
     std::vector<KILL_CASE> cases = CasesMake();
     std::erase_if(cases, [&](const KILL_CASE &subject) {
         return subject.szName.find(options.szOnly) == string::npos;
     });
+    SUITE suite = {
+        .szDone = "kills",
+        .szAgain = "kill_tests --only",
+        .nWorker = options.jobs,
+        .work = [&](size_t test, size_t worker) { return CaseRun(options, cases[test], worker); }};
     for (KILL_CASE &subject : cases) {
+        suite.names.push_back(subject.szName);
         subject.machine = Remembering(std::move(subject.machine));
     }
-    std::vector<FILE *> told;
-    for (size_t worker = 0; worker < options.jobs; worker++) {
-        told.push_back(tmpfile());
-        WorkerStart(options, cases, worker, told.back());
-    }
-    while (wait(nullptr) > 0) {
-    }
-    std::vector<CASE_TOTAL> totals(cases.size());
-    for (FILE *const pIn : told) {
-        WorkerRead(pIn, totals);
-    }
-    return TotalsPrint(options, cases, totals);
-}
-
-bool OptionTake(OPTIONS &options, const string &szName, const char *szValue)
-{
-    if (szName == "--only") {
-        options.szOnly = szValue;
-        return true;
-    }
-    size_t *const pNumber = szName == "--every"  ? &options.every
-                            : szName == "--jobs" ? &options.jobs
-                                                 : nullptr;
-    if (pNumber != nullptr) {
-        *pNumber = strtoul(szValue, nullptr, 10);
-    }
-    return pNumber != nullptr && *pNumber > 0;
+    COUNTS counts;
+    TotalsTell(options, suite, SuiteRun(suite, counts), counts);
+    return CountsTell(counts);
 }
 
 } // namespace
@@ -429,14 +355,10 @@ bool OptionTake(OPTIONS &options, const string &szName, const char *szValue)
 int main(int argc, char *argv[])
 {
     OPTIONS options;
-    for (int i = 1; i < argc; i++) {
-        const string szName = argv[i];
-        if (szName == "--all") {
-            options.fAll = true;
-        } else if (i + 1 >= argc || !OptionTake(options, szName, argv[++i])) {
-            fprintf(stderr, "usage: kill_tests [--all] [--every N] [--jobs J] [--only TEXT]\n");
-            return EXIT_FAILURE;
-        }
-    }
-    return RingRun(options);
+    const bool fTaken = OptionsTake(argc, argv,
+                                    {{"--all", &options.fAll},
+                                     {"--every", &options.every},
+                                     {"--jobs", &options.jobs},
+                                     {"--only", &options.szOnly}});
+    return fTaken ? CasesTry(options) : EXIT_FAILURE;
 }

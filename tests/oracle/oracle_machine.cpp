@@ -649,13 +649,6 @@ string FileText(const string &szPath, const std::optional<string> &szFile)
 
 } // namespace
 
-bool OracleNumberParse(const char *szText, std::uint64_t &number)
-{
-    char *pEnd = nullptr;
-    number = strtoull(szText, &pEnd, 10);
-    return pEnd != szText && *pEnd == '\0';
-}
-
 ORACLE_CASE OracleCaseMake(std::uint64_t seed)
 {
     DICE dice(seed);

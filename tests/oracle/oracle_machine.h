@@ -16,8 +16,5 @@ struct ORACLE_CASE {
 
 ORACLE_CASE OracleCaseMake(std::uint64_t seed);
 
-// A number as the command line gives one. False for a text that is none, or more than one.
-bool OracleNumberParse(const char *szText, std::uint64_t &number);
-
 // The machine and the command as text for a person.
 std::string OracleCaseText(const ORACLE_CASE &subject);

@@ -8,6 +8,7 @@
 //     oracle_real show SEED N FOLDER      the same, with the machines and what was seen
 #include "oracle_compare.h"
 #include "oracle_plan.h"
+#include "suite.h"
 
 #include <algorithm>
 #include <cstdio>
@@ -296,7 +297,7 @@ int main(int argc, char *argv[])
     u64 first = 0;
     u64 count = 0;
     if ((!fPlan && szWord != "compare" && szWord != "show") || argc != (fPlan ? 4 : 5) ||
-        !OracleNumberParse(argv[2], first) || !OracleNumberParse(argv[3], count) || count == 0) {
+        !NumberTake(argv[2], first) || !NumberTake(argv[3], count)) {
         fprintf(stderr, "usage: oracle_real plan SEED N | compare|show SEED N FOLDER\n");
         return EXIT_FAILURE;
     }

@@ -6,18 +6,16 @@
 //
 // Machine i is made from seed S + i (S is the environment's ORACLE_SEED unless given), so a failing
 // one comes back with "--machines 1 --seed" and its seed. --show prints machines and answers.
-#include "wire.h"
 #include "oracle_compare.h"
 #include "oracle_machine.h"
 #include "oracle_model.h"
 #include "sandbox.h"
+#include "suite.h"
+#include "wire.h"
 
 #include <algorithm>
 #include <cstdio>
 #include <cstdlib>
-#include <cstring>
-#include <sys/wait.h>
-#include <unistd.h>
 
 namespace
 {
@@ -27,20 +25,15 @@ using std::to_string;
 using std::vector;
 using u64 = std::uint64_t;
 
-constexpr u64 MACHINES_DEFAULT = 2000;
-constexpr u64 SEED_DEFAULT = 1;
-constexpr u64 JOBS_DEFAULT = 2;
-constexpr u64 PROGRESS_STEP = 250;
+constexpr u64 MACHINES_OF_TEST = 250;
 constexpr int BOUND = 60000; // milliseconds; the machine may be busy with something else
 constexpr const char SHELL[] = "/bin/sh";
 constexpr const char MD0_MEMBER[] = "/sys/block/md0/md/dev-";
-constexpr char MARK_PASSED = '.';
-constexpr char MARK_FAILED = 'F';
 
 struct OPTIONS {
-    u64 machines = MACHINES_DEFAULT;
-    u64 seed = SEED_DEFAULT;
-    u64 jobs = JOBS_DEFAULT;
+    u64 machines = 2000;
+    u64 seed = 1;
+    u64 jobs = 2;
     bool fShow = false;
 };
 
@@ -299,114 +292,59 @@ string AnswerText(const ORACLE_ANSWER &answer)
 
 // ------------------------------------------------------------------------------------- the suite
 
-bool CaseRun(const OPTIONS &options, u64 seed)
+// What is wrong with the machine of this seed; empty when nothing is.
+string CaseRun(const OPTIONS &options, u64 seed)
 {
     const ORACLE_CASE subject = OracleCaseMake(seed);
-    string text;
     if (options.fShow) {
-        text += "machine of seed " + to_string(seed) + "\n" + OracleCaseText(subject) +
-                "its answer\n" + AnswerText(OracleAnswer(subject.machine, subject.words));
+        const string szAnswer = AnswerText(OracleAnswer(subject.machine, subject.words));
+        printf("machine of seed %s\n%sits answer\n%s", to_string(seed).c_str(),
+               OracleCaseText(subject).c_str(), szAnswer.c_str());
     }
     const vector<string> differences = CaseDifferences(subject);
-    if (!differences.empty()) {
-        text += "FAILED seed " + to_string(seed) + ": tool and model differ on this machine\n" +
-                (options.fShow ? "" : OracleCaseText(subject));
-        for (const string &szDifference : differences) {
-            text += "difference in " + szDifference;
-        }
-        text += "again with: oracle_tests --machines 1 --seed " + to_string(seed) + "\n";
+    if (differences.empty()) {
+        return "";
     }
-    (void)fwrite(text.data(), 1, text.size(), stdout);
-    (void)fflush(stdout);
-    return differences.empty();
+    string text = "seed " + to_string(seed) + ": tool and model differ on this machine\n" +
+                  OracleCaseText(subject);
+    for (const string &szDifference : differences) {
+        text += "difference in " + szDifference;
+    }
+    return text + "again with: oracle_tests --machines 1 --seed " + to_string(seed) + "\n";
 }
 
-// Each worker has a sandbox of its own and tells the result of each machine with one byte.
-void WorkerStart(const OPTIONS &options, u64 worker, int fdRead, int fdWrite)
-{
-    if (fork() != 0) {
-        return;
-    }
-    close(fdRead);
-    for (u64 i = worker; i < options.machines; i += options.jobs) {
-        const char mark = CaseRun(options, options.seed + i) ? MARK_PASSED : MARK_FAILED;
-        if (write(fdWrite, &mark, 1) != 1) {
-            exit(EXIT_FAILURE);
-        }
-    }
-    exit(EXIT_SUCCESS);
-}
-
-struct TALLY {
-    u64 passed = 0;
-    u64 failed = 0;
-};
-
-TALLY MarksCount(const OPTIONS &options, int fdRead)
+TALLY CasesRun(const OPTIONS &options, size_t test, size_t worker)
 {
     TALLY tally;
-    char mark = 0;
-    while (read(fdRead, &mark, 1) == 1) {
-        (mark == MARK_PASSED ? tally.passed : tally.failed)++;
-        const u64 done = tally.passed + tally.failed;
-        if (done % PROGRESS_STEP == 0 && done < options.machines) {
-            printf("oracle: %llu of %llu machines, %llu failed\n",
-                   static_cast<unsigned long long>(done),
-                   static_cast<unsigned long long>(options.machines),
-                   static_cast<unsigned long long>(tally.failed));
-            (void)fflush(stdout);
+    const u64 first = test * MACHINES_OF_TEST;
+    const u64 end = std::min(first + MACHINES_OF_TEST, options.machines);
+    for (u64 i = first + worker; i < end; i += options.jobs) {
+        const string szWrong = CaseRun(options, options.seed + i);
+        tally.done++;
+        if (!szWrong.empty()) {
+            tally.wrong.push_back(szWrong);
         }
     }
     return tally;
 }
 
-int RingRun(const OPTIONS &options)
+int MachinesTry(const OPTIONS &options)
 {
-    int fds[2] = {-1, -1};
-    if (pipe(fds) != 0) {
-        perror("oracle: pipe");
-        return EXIT_FAILURE;
+    SUITE suite = {
+        .szDone = "machines",
+        .szAgain = "",
+        .nWorker = options.jobs,
+        .work = [&](size_t test, size_t worker) { return CasesRun(options, test, worker); }};
+    for (u64 i = 0; i < options.machines; i += MACHINES_OF_TEST) {
+        suite.names.push_back("machines from seed " + to_string(options.seed + i));
     }
-    printf("oracle: %llu machines, seeds from %llu\n",
-           static_cast<unsigned long long>(options.machines),
-           static_cast<unsigned long long>(options.seed));
-    (void)fflush(stdout);
-    for (u64 worker = 0; worker < options.jobs; worker++) {
-        WorkerStart(options, worker, fds[0], fds[1]);
+    COUNTS counts;
+    u64 machines = 0;
+    for (const TEST_TOTAL &total : SuiteRun(suite, counts)) {
+        machines += total.done;
     }
-    close(fds[1]);
-    TALLY tally = MarksCount(options, fds[0]);
-    while (wait(nullptr) > 0) {
-    }
-    // A worker that broke down owes the rest of its machines.
-    tally.failed = options.machines - tally.passed;
-    printf("oracle: %llu passed, %llu failed\n", static_cast<unsigned long long>(tally.passed),
-           static_cast<unsigned long long>(tally.failed));
-    return tally.failed == 0 ? EXIT_SUCCESS : EXIT_FAILURE;
-}
-
-bool OptionsParse(int argc, char *argv[], OPTIONS &options)
-{
-    const char *szSeed = getenv("ORACLE_SEED");
-    if (szSeed != nullptr && !OracleNumberParse(szSeed, options.seed)) {
-        return false;
-    }
-    const std::pair<const char *, u64 *> numbers[] = {
-        {"--machines", &options.machines}, {"--seed", &options.seed}, {"--jobs", &options.jobs}};
-    for (int i = 1; i < argc; i++) {
-        if (strcmp(argv[i], "--show") == 0) {
-            options.fShow = true;
-            continue;
-        }
-        const auto option = std::find_if(std::begin(numbers), std::end(numbers), [&](auto &entry) {
-            return strcmp(entry.first, argv[i]) == 0;
-        });
-        if (option == std::end(numbers) || i + 1 == argc ||
-            !OracleNumberParse(argv[++i], *option->second)) {
-            return false;
-        }
-    }
-    return options.machines > 0 && options.jobs > 0;
+    printf("oracle: %s machines\n", to_string(machines).c_str());
+    return CountsTell(counts);
 }
 
 } // namespace
@@ -414,9 +352,12 @@ bool OptionsParse(int argc, char *argv[], OPTIONS &options)
 int main(int argc, char *argv[])
 {
     OPTIONS options;
-    if (!OptionsParse(argc, argv, options)) {
-        fprintf(stderr, "usage: oracle_tests [--machines N] [--seed S] [--jobs J] [--show]\n");
-        return EXIT_FAILURE;
-    }
-    return RingRun(options);
+    const char *const szSeed = getenv("ORACLE_SEED");
+    const bool fSeed = szSeed == nullptr || NumberTake(szSeed, options.seed);
+    const bool fTaken = fSeed && OptionsTake(argc, argv,
+                                             {{"--machines", &options.machines},
+                                              {"--seed", &options.seed},
+                                              {"--jobs", &options.jobs},
+                                              {"--show", &options.fShow}});
+    return fTaken ? MachinesTry(options) : EXIT_FAILURE;
 }

@@ -1,0 +1,62 @@
+// SPDX-License-Identifier: MIT
+#pragma once
+
+// What the suites have in common that share their tests out among processes: options, workers, and
+// what is told of each test.
+
+#include <cstddef>
+#include <cstdint>
+#include <functional>
+#include <map>
+#include <string>
+#include <variant>
+#include <vector>
+
+// An option of the command line: a switch, a number of 1 or more, or a text.
+struct OPTION {
+    const char *szName;
+    std::variant<bool *, std::uint64_t *, std::string *> pTo;
+};
+
+// False for words that are none of these options, after a line that says how to use them.
+bool OptionsTake(int argc, char *argv[], const std::vector<OPTION> &options);
+
+// A number of 1 or more, and nothing behind it.
+bool NumberTake(const char *szText, std::uint64_t &number);
+
+// What one worker finds out about its share of a test.
+struct TALLY {
+    std::uint64_t done = 0; // injections, kills, machines
+    std::map<std::string, std::uint64_t> allowed =
+        {};                              // why something may differ -> how often it did
+    std::vector<std::string> wrong = {}; // a text, with its line end, for each
+};
+
+struct SUITE {
+    std::vector<std::string> names = {};
+    const char *szDone;  // what is counted in each test
+    const char *szAgain; // the command that runs one test again, without its name; may be empty
+    std::uint64_t nWorker;
+    std::function<TALLY(size_t test, size_t worker)> work;
+};
+
+struct COUNTS {
+    std::uint64_t passed = 0;
+    std::uint64_t failed = 0;
+};
+
+// "ok NAME" or "FAILED NAME".
+void VerdictTell(COUNTS &counts, bool fPassed, const std::string &szName);
+
+// Every worker does its share of every test, in a process of its own. Tells of each test as soon as
+// all have done theirs, and returns what was counted; of what was wrong only how often it was.
+struct TEST_TOTAL {
+    std::uint64_t reports = 0; // workers that have told of it
+    std::uint64_t done = 0;
+    std::uint64_t wrong = 0;
+    std::map<std::string, std::uint64_t> allowed = {};
+};
+std::vector<TEST_TOTAL> SuiteRun(const SUITE &suite, COUNTS &counts);
+
+// The last line, and the exit status.
+int CountsTell(const COUNTS &counts);
