@@ -8,6 +8,7 @@
 #include "nurocore/handle.h"
 #include "nurocore/keyvalue.h"
 #include "nurocore/log.h"
+#include "nurocore/text.h"
 #include "nurocore/types.h"
 
 #include <algorithm>
@@ -175,12 +176,14 @@ int NameAppend(const char *szName, EUNIT_OUTPUT &output)
     if (output.fCheckOpen && !IsOpenable(szName)) {
         return 0;
     }
-    const size_t cchOut = strlen(output.szOut);
-    if (cchOut + strlen(szName) > output.cbOut) {
+    // Kept: the blank and the terminator do not count, so the last name may lose its blank, or its
+    // last letter too.
+    if (strlen(output.szOut) + strlen(szName) > output.cbOut) {
         NLIBCErrSetHere(ERR_BAD_FORMAT);
         return -1;
     }
-    (void)snprintf(output.szOut + cchOut, output.cbOut - cchOut, "%s ", szName);
+    (void)NLIBCStrAppend(output.szOut, output.cbOut, szName);
+    (void)NLIBCStrAppend(output.szOut, output.cbOut, " ");
     output.fAny = true;
     return 0;
 }
