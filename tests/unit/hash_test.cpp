@@ -6,6 +6,7 @@
 
 #include <algorithm>
 #include <climits>
+#include <cstdint>
 
 namespace
 {
@@ -85,11 +86,39 @@ TEST(HashAlloc, TheAllocatorTakesBothNumbersAsTheyAre)
     EXPECT_EQ(TEST_HASH(NLIBCHashAllocator(7, 0)).p->cbFree, 0);
 }
 
-TEST(HashAlloc, WithoutMemoryThereIsNoTable)
+TEST(HashAlloc, RefusesNegativeNumbers)
 {
-    EXPECT_FAILS(NLIBCHashAllocator(-1, 512), nullptr, ERR_OUT_OF_MEMORY);
-    EXPECT_FAILS(NLIBCHashAllocator(7, -1), nullptr, ERR_OUT_OF_MEMORY);
+    EXPECT_FAILS(NLIBCHashAllocator(-1, 512), nullptr, ERR_BAD_PARAMETER);
+    EXPECT_FAILS(NLIBCHashAllocator(7, -1), nullptr, ERR_BAD_PARAMETER);
+    EXPECT_FAILS(NLIBCHashAllocator(INT_MIN, INT_MIN), nullptr, ERR_BAD_PARAMETER);
 }
+
+TEST(HashAlloc, ATableWithoutSlotsIsEmptyAndStaysSo)
+{
+    for (const int cbPool : {0, 512}) {
+        TEST_HASH hash(NLIBCHashAllocator(0, cbPool));
+        ASSERT_NE(hash.p, nullptr);
+        EXPECT_EQ(hash.p->nSlot, 0);
+        EXPECT_EQ(hash.p->cbFree, cbPool);
+        EXPECT_QUIET(NLIBCHashSet(&hash.p, "k", "v"), -1);
+        EXPECT_QUIET(NLIBCHashSet(&hash.p, "", ""), -1);
+        EXPECT_QUIET(NLIBCHashGet(hash.p, "k"), nullptr);
+        EXPECT_QUIET(NLIBCHashKeyListGet(hash.p, nullptr), 0);
+        EXPECT_EQ(hash.p->nEntry, 0);
+        EXPECT_EQ(Defect(hash.p), "");
+    }
+}
+
+#if SIZE_MAX == UINT32_MAX
+// A slot is 8 bytes here, the header 20: these tables need 2^32 + 532, 2^32 + 19 and 2^34 + 12
+// bytes, and the low 32 bits of each are a small number.
+TEST(HashAlloc, ATableLargerThanTheAddressSpaceIsNone)
+{
+    EXPECT_FAILS(NLIBCHashAllocator(0x20000000, 512), nullptr, ERR_OUT_OF_MEMORY);
+    EXPECT_FAILS(NLIBCHashAllocator(0x10000000, INT_MAX), nullptr, ERR_OUT_OF_MEMORY);
+    EXPECT_FAILS(NLIBCHashAllocator(INT_MAX, 0), nullptr, ERR_OUT_OF_MEMORY);
+}
+#endif
 
 TEST(HashFree, IgnoresNull)
 {
@@ -196,6 +225,19 @@ TEST(HashSet, KeepsTheTableWhenItCannotGrow)
     EXPECT_FAILS(NLIBCHashSet(&hash.p, "a", "longer"), -1, ERR_OUT_OF_MEMORY);
     EXPECT_EQ(hash.p, pBefore);
     EXPECT_EQ(ValueOf(hash.p, "a"), "1");
+    EXPECT_EQ(Defect(hash.p), "");
+}
+
+// An empty pool of 31000 slots grows by what the first pair needs for each: 70002 * 31000 is more
+// than 2147483647.
+TEST(HashSet, KeepsTheTableWhenThePoolWouldPass32Bits)
+{
+    TEST_HASH hash(NLIBCHashAllocator(31000, 512));
+    ASSERT_NE(hash.p, nullptr);
+    const PNLIBHASH pBefore = hash.p;
+    EXPECT_FAILS(NLIBCHashSet(&hash.p, "", std::string(70000, 'v').c_str()), -1, ERR_OUT_OF_MEMORY);
+    EXPECT_EQ(hash.p, pBefore);
+    EXPECT_EQ(hash.p->nEntry, 0);
     EXPECT_EQ(Defect(hash.p), "");
 }
 

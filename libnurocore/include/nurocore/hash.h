@@ -26,11 +26,12 @@ static_assert(sizeof(NLIBHASH) == 4 * sizeof(i32) + sizeof(char *));
 
 using PNLIBHASH = NLIBHASH *;
 
-// An empty table of nSlot slots and cbPool bytes for texts. The caller frees it with
-// NLIBCHashFree. NULL with ERR_OUT_OF_MEMORY on failure.
+// An empty table of nSlot slots and cbPool bytes for texts. One without slots takes no key. The
+// caller frees it with NLIBCHashFree. NULL on failure: ERR_BAD_PARAMETER for a negative number,
+// ERR_OUT_OF_MEMORY when there is no memory for it.
 PNLIBHASH NLIBCHashAllocator(int nSlot, int cbPool);
 
-// The same with 31 slots and a pool of 512 bytes at least.
+// The same with 31 slots and a pool of at least 512 bytes, whatever cbPool is.
 PNLIBHASH NLIBCHashAlloc(int cbPool);
 
 // NULL is ignored.
@@ -48,7 +49,8 @@ struct HASH_DELETER {
 using HASH_OWNER = std::unique_ptr<PNLIBHASH, HASH_DELETER>;
 
 // Stores copies of the pair, or replaces the key's value. Returns the slot of the key (0 or more);
-// -1 for NULL arguments, a full table, or no memory to grow: the table then stays as it was.
+// -1 for NULL arguments, a full table (both without a code), or no memory to grow
+// (ERR_OUT_OF_MEMORY): the table then stays as it was.
 int NLIBCHashSet(PNLIBHASH *ppHash, const char *szKey, const char *szValue);
 
 // The key's value; it belongs to the table. NULL when there is none.

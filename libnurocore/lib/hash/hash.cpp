@@ -11,12 +11,15 @@
 #include <climits>
 #include <cstdlib>
 #include <cstring>
+#include <utility>
 
 namespace
 {
 
 constexpr int HASH_SLOTS_DEFAULT = 31;
 constexpr int HASH_POOL_MIN = 512;
+constexpr i64 HASH_HEADER_SIZE = sizeof(NLIBHASH);
+constexpr i64 HASH_SLOT_SIZE = sizeof(NLIBHASH_SLOT);
 constexpr float HASH_FREE_SLOT_RATIO_MIN = 0.25F;
 
 NLIBHASH_SLOT *Slots(PNLIBHASH pHash)
@@ -29,15 +32,15 @@ const NLIBHASH_SLOT *Slots(const NLIBHASH *pHash)
     return reinterpret_cast<const NLIBHASH_SLOT *>(pHash + 1);
 }
 
+// In 64 bits, so that a table that does not fit its fields or the address space is noticed.
 PNLIBHASH TableAlloc(i64 nSlot, i64 cbPool)
 {
-    if (nSlot < 1 || nSlot > INT_MAX || cbPool < 0 || cbPool > INT_MAX) {
-        NLIBCErrSetHere(ERR_OUT_OF_MEMORY);
-        return nullptr;
-    }
-    const size_t cbSlots = static_cast<size_t>(nSlot) * sizeof(NLIBHASH_SLOT);
-    const size_t cbTable = sizeof(NLIBHASH) + cbSlots + static_cast<size_t>(cbPool);
-    const auto pHash = static_cast<PNLIBHASH>(calloc(1, cbTable));
+    // Kept: a crowded table of one slot cannot grow, 1 * 4 - 5 slots are fewer than none.
+    const bool fFieldsFit = nSlot >= 0 && nSlot <= INT_MAX && cbPool <= INT_MAX;
+    const i64 cbTable = HASH_HEADER_SIZE + nSlot * HASH_SLOT_SIZE + cbPool;
+    const auto pHash = fFieldsFit && std::in_range<size_t>(cbTable)
+                           ? static_cast<PNLIBHASH>(calloc(1, static_cast<size_t>(cbTable)))
+                           : nullptr;
     if (pHash == nullptr) {
         NLIBCErrSetHere(ERR_OUT_OF_MEMORY);
         return nullptr;
@@ -53,15 +56,14 @@ PNLIBHASH TableAlloc(i64 nSlot, i64 cbPool)
 // others.
 int SlotFor(const NLIBHASH *pHash, const char *szKey)
 {
-    const int nHome = NLIBCHashIndex(szKey, pHash->nSlot);
-    int index = nHome;
-    do {
+    int index = NLIBCHashIndex(szKey, pHash->nSlot);
+    for (int nTried = 0; nTried < pHash->nSlot; nTried++) {
         const char *const pszKey = Slots(pHash)[index].pszKey;
         if (pszKey == nullptr || strcmp(pszKey, szKey) == 0) {
             return index;
         }
         index = index + 1 == pHash->nSlot ? 0 : index + 1;
-    } while (index != nHome);
+    }
     return -1;
 }
 
@@ -126,6 +128,10 @@ PNLIBHASH MakeRoom(PNLIBHASH pHash, i64 nNeeded)
 
 PNLIBHASH NLIBCHashAllocator(int nSlot, int cbPool)
 {
+    if (nSlot < 0 || cbPool < 0) {
+        NLIBCErrSetHere(ERR_BAD_PARAMETER);
+        return nullptr;
+    }
     return TableAlloc(nSlot, cbPool);
 }
 
