@@ -83,7 +83,7 @@ machine_overlay() {
     install -D -m 644 "$APPLIANCE_DIR/guest/lvm.conf" "$szRoot/etc/lvm/lvm.conf"
     install -D -m 644 "$APPLIANCE_DIR/guest/welcome" "$szRoot/appliance/welcome"
     overlay_build "$szRoot" tool/arrayctl /usr/sbin/arrayctl
-    overlay_build "$szRoot" platform/mdrequests/libmdrequests.so /usr/lib/libmdrequests.so
+    overlay_build "$szRoot" platform/mdrequests/mdrequests /usr/sbin/mdrequests
     overlay_build "$szRoot" platform/sfdisk/sfdisk /usr/sbin/sfdisk
     for szFile in "${files[@]}"; do
         overlay_file "$szRoot" "${szFile%%:*}" "${szFile#*:}"

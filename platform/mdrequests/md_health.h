@@ -41,7 +41,8 @@ struct MD_ATTRIBUTES {
 };
 
 // Reads the attributes below szMdDir, e.g. "/sys/dev/block/9:0/md". Returns 0, or -1 when there is
-// no array_state file, before the other attributes or after them, which means no array at all.
+// no array_state file, which means no array at all. One that goes away during the call is left
+// with an empty state, in which nothing runs.
 int MdAttributesRead(const char *szMdDir, MD_ATTRIBUTES *pAttributes);
 
 // True when the state is one in which the driver serves the array.

@@ -329,7 +329,7 @@ run_destroy() {
     mkdir -p "$RUNS"
     ln -sf /sbin/arrayctl "$RUNS/$1"
     begin=$(cut -d. -f1 /proc/uptime)
-    LD_PRELOAD=/usr/lib/libmdrequests.so "$RUNS/$1" destroy "$2" >"$RUNS/$1.out" 2>&1
+    /sbin/mdrequests "$RUNS/$1" destroy "$2" >"$RUNS/$1.out" 2>&1
     echo $? >"$RUNS/$1.status"
     echo $(($(cut -d. -f1 /proc/uptime) - begin)) >"$RUNS/$1.seconds"
 }

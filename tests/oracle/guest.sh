@@ -30,7 +30,6 @@ install_recorder() {
     ln -s /usr/bin/true "$REAL/nurodd"
     cat >"$ORACLE/recorder" <<'SCRIPT'
 #!/bin/sh
-unset LD_PRELOAD
 # The newline ends the record, and the whole record is one write.
 printf '%s\037' "$$" "$0" "$@" '
 ' >>/oracle/current/calls

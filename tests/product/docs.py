@@ -52,7 +52,7 @@ def blocks():
 
 
 STARTS = ("./", "cmake ", "ctest ", "packaging/", "tests/", "appliance/", "bench/", "docs/pictures/", "build/",
-          "DESTDIR=", "LD_PRELOAD=", "ln ", "git ", PROMPT)
+          "DESTDIR=", "mdrequests ", "ln ", "git ", PROMPT)
 
 
 def commands():
@@ -129,8 +129,8 @@ def by_story(command):
 
 
 def by_installed(command):
-    """The platform package's library, in front of the tool, on an array that does not exist."""
-    words = command.replace("/usr/libexec/arrayctl", BUILD + "/platform/mdrequests")
+    """The platform package's launcher, around the tool, on an array that does not exist."""
+    words = command.replace("mdrequests ", f"{BUILD}/platform/mdrequests/mdrequests ")
     words = words.replace(" arrayctl status 0", f" {BUILD}/tool/arrayctl status 4711")
     ended = subprocess.run(["sh", "-c", words], capture_output=True, text=True, check=False)
     assert (ended.stdout, ended.stderr, ended.returncode) == ("RAID /dev/md4711 is not found\n", "", 1), ended
@@ -159,7 +159,7 @@ def by_being_there(command):
 RULES = (
     (r"\./check\b", by_check), (r"\./demo$", by_demo), (r"(cmake|ctest) ", by_preset),
     (r"build/release/tests/", by_test_program), (r"build/release/bench/", by_bench), (r"bench/", by_gates),
-    (r"DESTDIR=", by_install), (r"LD_PRELOAD=", by_installed),
+    (r"DESTDIR=", by_install), (r"mdrequests ", by_installed),
     (r"appliance/(run|shell)\b|tests/appliance/run-all", by_options), (re.escape(PROMPT), by_story),
     (r"packaging/make-", by_install_test), (r"docs/pictures/make", by_pictures),
     (r"tests/tree/before-commit|ln -s .*tests/tree/before-commit", by_being_there),

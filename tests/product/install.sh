@@ -18,8 +18,9 @@ cd "$ROOT" || exit 1
 TOOL_FILES="usr/sbin/arrayctl
 usr/share/bash-completion/completions/arrayctl
 usr/share/man/man8/arrayctl.8"
-PLATFORM_FILES="usr/libexec/arrayctl/libmdrequests.so
-usr/libexec/arrayctl/sfdisk"
+PLATFORM_FILES="usr/libexec/arrayctl/sfdisk
+usr/sbin/mdrequests
+usr/share/man/man8/mdrequests.8.gz"
 
 listing() { (cd "$1" && find . -type f -printf '%p %s %T@ %m\n' | LC_ALL=C sort); }
 

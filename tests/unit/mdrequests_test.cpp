@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: MIT
+#include "md_answer.h"
 #include "md_health.h"
 
 #include <array>
@@ -9,6 +10,7 @@
 #include <gtest/gtest.h>
 #include <string>
 #include <sys/stat.h>
+#include <sys/sysmacros.h>
 #include <thread>
 #include <vector>
 
@@ -299,10 +301,12 @@ struct MdFolderThatChanges : MdFolder {
     }
 };
 
-TEST_F(MdFolderThatChanges, AnArrayThatVanishesBetweenTwoReadsIsNone)
+TEST_F(MdFolderThatChanges, AnArrayThatVanishesBetweenTwoReadsDoesNotRun)
 {
     MD_ATTRIBUTES attributes;
-    EXPECT_EQ(ReadWhile(&attributes, [this] { std::filesystem::remove(root / "array_state"); }), -1);
+    ASSERT_EQ(ReadWhile(&attributes, [this] { std::filesystem::remove(root / "array_state"); }), 0);
+    EXPECT_STREQ(attributes.szArrayState, "");
+    EXPECT_FALSE(MdIsRunning(&attributes));
 }
 
 TEST_F(MdFolderThatChanges, AnArrayThatStopsBetweenTwoReadsDoesNotRun)
@@ -319,6 +323,26 @@ TEST_F(MdFolderThatChanges, AnArrayThatStaysIsReadToItsEnd)
     EXPECT_TRUE(MdIsRunning(&attributes));
     EXPECT_STREQ(attributes.szLevel, "raid1");
     EXPECT_EQ(MdHealthGet(&attributes), MD_HEALTH_NORMAL);
+}
+
+TEST(MdAnswerGet, WithoutAnArrayOnlyTheMdDriversOwnDevicesAreNone)
+{
+    // Number 1048575 is the last one there can be. The first device of memory is none of the
+    // driver's.
+    MD_ANSWER answer;
+    EXPECT_EQ(MdAnswerGet(makedev(9, 1048575), MD_GET_ARRAY_STATUS, &answer), -1);
+    EXPECT_EQ(MdAnswerGet(makedev(1, 1048575), MD_GET_ARRAY_STATUS, &answer), 0);
+}
+
+TEST(MdAnswerGet, TheRequestsHaveTheDriversNumbers)
+{
+#if defined(__powerpc__)
+    EXPECT_EQ(MD_GET_SYNC_STATUS, 0x40180960U);
+    EXPECT_EQ(MD_GET_ARRAY_STATUS, 0x40040961U);
+#else
+    EXPECT_EQ(MD_GET_SYNC_STATUS, 0x80180960U);
+    EXPECT_EQ(MD_GET_ARRAY_STATUS, 0x80040961U);
+#endif
 }
 
 TEST_F(MdFolder, APathThatDoesNotFitIsNoArray)
