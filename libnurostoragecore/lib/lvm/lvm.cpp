@@ -7,7 +7,6 @@
 #include "nurocore/process.h"
 #include "nurostoragecore/program_path.h"
 #include "nurostoragecore/space.h"
-#include "space/command_text.h"
 
 #include <cstdio>
 #include <cstring>
@@ -25,8 +24,6 @@ constexpr int MOUNT_ENTRY_SIZE = 4096;
 // Whom -k killed gets time to end: until then the folder is in use.
 constexpr unsigned int UNMOUNT_PAUSE_SECONDS = 1;
 
-constexpr const char *ROWS_COMMAND[] = {
-    PVS_PATH, "-o", "pv_name,vg_name,lv_name,origin", "--noheading", "--separator", ":", nullptr};
 constexpr char MOUNTS_PATH[] = "/proc/mounts";
 
 struct MOUNT_TABLE_DELETER {
@@ -42,11 +39,11 @@ using MOUNT_TABLE_OWNER = std::unique_ptr<FILE, MOUNT_TABLE_DELETER>;
 // one is meant. Kept loose: a row of /dev/md20 names /dev/md2 too.
 bool LastRowGet(const char *szDevice, char *szRow)
 {
-    const PIPE_OWNER pRows(NLIBCPopenV(PVS_PATH, "r", const_cast<char *const *>(ROWS_COMMAND)));
+    const PIPE_OWNER pRows(NLIBCPopen(PVS_PATH, "r", "-o", "pv_name,vg_name,lv_name,origin",
+                                      "--noheading", "--separator", ":", nullptr));
     if (pRows == nullptr) {
-        char szCommand[LINE_SIZE];
-        CommandTextBuild(ROWS_COMMAND, sizeof(szCommand), szCommand, sizeof(szCommand));
-        NLIBCLog(LOG_ERR, "Fail to do [%s]", szCommand);
+        NLIBCLog(LOG_ERR, "Fail to do [/sbin/pvs -o pv_name,vg_name,lv_name,origin --noheading "
+                          "--separator :]");
         return false;
     }
     bool fFound = false;

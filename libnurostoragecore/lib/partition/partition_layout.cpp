@@ -1,12 +1,11 @@
 // SPDX-License-Identifier: MIT
 #include "nurostoragecore/partition_layout.h"
 
+#include "attribute/attribute.h"
 #include "hwcontrol/device_path.h"
 #include "hwcontrol/disk_name.h"
 #include "nurocore/conf.h"
 #include "nurocore/error.h"
-#include "nurocore/handle.h"
-#include "nurocore/io.h"
 #include "nurocore/log.h"
 #include "partition/partition_type.h"
 
@@ -82,14 +81,10 @@ int SectorsRead(const char *szDirectory, const char *szAttr, u64 *pSectors)
 {
     char szFile[PATH_SIZE + 8];
     (void)snprintf(szFile, sizeof(szFile), "%s/%s", szDirectory, szAttr);
-    const STREAM_OWNER pFile(fopen(szFile, "r"));
-    if (pFile == nullptr) {
-        NLIBCErrSetHere(ERR_OPEN_FAILED);
-        return -1;
-    }
     char szLine[LINE_SIZE];
-    if (NLIBCFgets(szLine, LINE_SIZE, pFile.get()) == nullptr) {
-        NLIBCErrSetHere(ERR_READ_FAILED);
+    const ssize_t cbRead = AttributeRead(szFile, szLine, LINE_SIZE);
+    if (cbRead <= ATTRIBUTE_NOT_READ) {
+        NLIBCErrSetHere(cbRead == ATTRIBUTE_NOT_OPENED ? ERR_OPEN_FAILED : ERR_READ_FAILED);
         return -1;
     }
     char *pchEnd = nullptr;

@@ -1,11 +1,11 @@
 // SPDX-License-Identifier: MIT
 #include "nurostoragecore/raid_disk.h"
 
+#include "attribute/attribute.h"
 #include "hwcontrol/device_path.h"
 #include "hwcontrol/disk_name.h"
 #include "nurocore/error.h"
 #include "nurocore/handle.h"
-#include "nurocore/io.h"
 #include "nurocore/log.h"
 #include "nurocore/text.h"
 #include "raid/raid_owner.h"
@@ -60,14 +60,14 @@ int SlotGet(const char *szDir, i32 *pSlot)
 {
     char szFile[PATH_SIZE];
     (void)snprintf(szFile, sizeof(szFile), "%s/slot", szDir);
-    const STREAM_OWNER pFile(fopen(szFile, "r"));
-    if (pFile == nullptr) {
+    char szSlot[SLOT_SIZE];
+    const ssize_t cbRead = AttributeRead(szFile, szSlot, SLOT_SIZE);
+    if (cbRead == ATTRIBUTE_NOT_OPENED) {
         // Kept: no code here, callers see the one that stood before.
         NLIBCLog(LOG_ERR, "failed to fopen %s, errno=%m", szFile);
         return -1;
     }
-    char szSlot[SLOT_SIZE];
-    if (NLIBCFgets(szSlot, SLOT_SIZE, pFile.get()) == nullptr) {
+    if (cbRead == ATTRIBUTE_NOT_READ) {
         NLIBCLog(LOG_DEBUG, "Failed to get disk slot, errno=%m");
         NLIBCErrSetHere(ERR_READ_FAILED);
         return -1;
@@ -112,13 +112,13 @@ int RAIDDiskAttrRead(const char *szFile, char *szBuf)
         NLIBCErrSetHere(ERR_BAD_PARAMETER);
         return -1;
     }
-    const STREAM_OWNER pFile(fopen(szFile, "r"));
-    if (pFile == nullptr) {
+    const ssize_t cbRead = AttributeRead(szFile, szBuf, RAID_ATTR_SIZE);
+    if (cbRead == ATTRIBUTE_NOT_OPENED) {
         NLIBCLog(LOG_DEBUG, "Failed to fopen %s, errno=%m", szFile);
         NLIBCErrSetHere(ERR_OPEN_FAILED);
         return -1;
     }
-    if (NLIBCFgets(szBuf, RAID_ATTR_SIZE, pFile.get()) == nullptr) {
+    if (cbRead == ATTRIBUTE_NOT_READ) {
         NLIBCLog(LOG_DEBUG, "Failed to NLIBCFgets %s, errno=%m", szFile);
         NLIBCErrSetHere(ERR_READ_FAILED);
         return -1;
@@ -258,13 +258,13 @@ int RAIDSyncActionGet(int nMd, int *pAction)
     }
     char szFile[PATH_SIZE];
     (void)snprintf(szFile, sizeof(szFile), "/sys/block/md%d/md/sync_action", nMd);
-    const STREAM_OWNER pFile(fopen(szFile, "r"));
-    if (pFile == nullptr) {
+    char szAction[ACTION_SIZE];
+    const ssize_t cbRead = AttributeRead(szFile, szAction, ACTION_SIZE);
+    if (cbRead == ATTRIBUTE_NOT_OPENED) {
         NLIBCLog(LOG_ERR, "open \"%s\" failed", szFile);
         return -1;
     }
-    char szAction[ACTION_SIZE];
-    if (NLIBCFgets(szAction, ACTION_SIZE, pFile.get()) == nullptr) {
+    if (cbRead == ATTRIBUTE_NOT_READ) {
         NLIBCLog(LOG_ERR, "failed to get line from \"%s\"", szFile);
         return -1;
     }

@@ -11,7 +11,8 @@ void CommandTextBuild(const char *const argv[], size_t cchArgumentMax, char *szT
         if (i > 0) {
             szText[cchText++] = ' ';
         }
-        const size_t cchArgument = std::min(strnlen(argv[i], cchArgumentMax), cbText - 1 - cchText);
+        const size_t cchArgument =
+            std::min({strlen(argv[i]), cchArgumentMax, cbText - 1 - cchText});
         memcpy(szText + cchText, argv[i], cchArgument);
         cchText += cchArgument;
     }
