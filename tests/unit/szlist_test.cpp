@@ -450,6 +450,20 @@ TEST(SzListSet, TakesNewBytesForALongerString)
     EXPECT_EQ(Defect(list.p), "");
 }
 
+// 24 bytes of header, two slots, 10 bytes free, strings of 468 and 2: the 14 bytes of the new one
+// begin where the second slot does, and the slot is written last.
+TEST(SzListSet, DoesNotLookWhetherALongerStringFits)
+{
+    TEST_LIST list({std::string(467, 'a'), "b"}, SZLIST_UNSORTED);
+    ASSERT_EQ(list.p->nFree, 10);
+    EXPECT_QUIET(NLIBCSzListSet(&list.p, 1, "0123456789abc"), 1);
+    EXPECT_EQ(list.p->nFree, -4);
+    EXPECT_EQ(list.p->EndofFree, 28);
+    EXPECT_EQ(SlotOf(list.p, 1), 28);
+    EXPECT_STREQ(NLIBCSzListGet(list.p, 1) + 4, "456789abc");
+    EXPECT_EQ(list.p->nSize, 512);
+}
+
 TEST(SzListSet, FillsAnEmptySlotAndKeepsTheBlocksLastByte)
 {
     TEST_LIST list(512);

@@ -23,7 +23,6 @@
 #include "nurocore/log.h"
 
 #include <algorithm>
-#include <cassert>
 #include <climits>
 #include <cstdio>
 #include <cstdlib>
@@ -415,8 +414,7 @@ int NLIBCSzListSet(PNLIBSZLIST *ppList, int index, const char *szItem)
     if (cbItem <= strlen(Item(pList, index)) + 1) {
         memmove(At(pList, Slots(pList)[index]), szItem, cbItem);
     } else {
-        // Kept on purpose: no growth and no test for room here, callers see to nFree themselves.
-        assert(static_cast<i64>(cbItem) <= pList->nFree);
+        // Kept: no growth and no test for room here, callers see to nFree themselves.
         Slots(pList)[index] = StringStore(pList, szItem, cbItem);
         pList->nFree -= static_cast<i32>(cbItem);
     }
