@@ -211,6 +211,21 @@ TEST(FileGetKeyValue, ASmallerBufferStaysAsItWas)
     }
 }
 
+TEST(FileGetKeyValue, AMissingKeyIsMissingWhateverTheSizeOfTheBuffer)
+{
+    const TEST_FOLDER folder;
+    const std::string path = folder.Write("conf", "k=value\nempty=\n");
+    for (const int cbValue : {8, 1, 0, -1, INT_MIN}) {
+        SCOPED_TRACE(cbValue);
+        for (const char *szKey : {"other", "empty"}) {
+            char szValue[] = "before!";
+            EXPECT_FAILS(NLIBCFileGetKeyValue(path.c_str(), szKey, szValue, cbValue, 0), 0,
+                         ERR_KEY_NOT_FOUND);
+            EXPECT_STREQ(szValue, "before!");
+        }
+    }
+}
+
 TEST(FileGetKeyValue, ReadsLinesOfAnyLength)
 {
     const TEST_FOLDER folder;

@@ -55,15 +55,15 @@ void LookupTakeLine(LOOKUP &lookup, char *szLine, int flags)
 
 int LookupResult(const LOOKUP &lookup)
 {
+    if (lookup.cbNeeded == 0) {
+        NLIBCErrSetHere(ERR_KEY_NOT_FOUND);
+        return 0;
+    }
     if (lookup.szValue != nullptr && lookup.cbNeeded > lookup.cbValue) {
         NLIBCErrSetHere(ERR_BUF_TOO_SMALL);
         return -1;
     }
-    if (lookup.cbNeeded > 0) {
-        return lookup.cbNeeded;
-    }
-    NLIBCErrSetHere(ERR_KEY_NOT_FOUND);
-    return 0;
+    return lookup.cbNeeded;
 }
 
 } // namespace
