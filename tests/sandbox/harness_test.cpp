@@ -272,6 +272,48 @@ TEST(Harness, TheLogIsReadWithItsPriority)
                                "<14>no prefix\n");
 }
 
+TEST(Harness, LogLinesCommandsAndSleepsComeInOneOrder)
+{
+    MACHINE machine = MachineMake();
+    machine.faults = {{.szFunction = "access"}};
+    MachineTool(machine, "/sbin/mdadm -S", {.nTimes = 2});
+    const RUN_RESULT result = MachineCall(machine, [] {
+        syslog(LOG_ERR, "file.cpp:1 first");
+        (void)sleep(1);
+        EXPECT_EQ(SpaceExecl("/sbin/mdadm", "-S", nullptr), 0);
+        syslog(LOG_DEBUG, "file.cpp:1 then");
+        syslog(LOG_DEBUG, "file.cpp:1 again");
+        EXPECT_EQ(access("/tmp", F_OK), -1);
+        EXPECT_EQ(SpaceExecl("/sbin/mdadm", "-S", nullptr), 0);
+        syslog(LOG_ERR, "file.cpp:1 last");
+    });
+    EXPECT_EQ(
+        OrderText(result),
+        Lines({"<11>file.cpp:# first", "sleep 1", "/sbin/mdadm -S", "<15>file.cpp:# then",
+               "<15>file.cpp:# again", "fault access 1", "/sbin/mdadm -S", "<11>file.cpp:# last"}));
+}
+
+// Where the machine has no log, too.
+TEST(Harness, WhatHappensIsToldWithoutALog)
+{
+    MACHINE machine = MachineMake();
+    machine.fNoLog = true;
+    const RUN_RESULT result = MachineCall(machine, [] {
+        syslog(LOG_ERR, "file.cpp:1 heard by nobody");
+        (void)sleep(1);
+    });
+    EXPECT_EQ(OrderText(result), "sleep 1\n");
+}
+
+TEST(Harness, TheTimeIsTheMachines)
+{
+    MachineCall(MachineMake(), [] {
+        time_t now = 0;
+        EXPECT_EQ(time(&now), 1793840523);
+        EXPECT_EQ(now, 1793840523);
+    });
+}
+
 TEST(Harness, ManyLogLinesDoNotBlockTheProgram)
 {
     const RUN_RESULT result = MachineCall(MachineMake(), [] {

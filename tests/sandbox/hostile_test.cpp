@@ -27,7 +27,6 @@ namespace
 {
 
 constexpr char PVS[] = "/sbin/pvs -o pv_name,vg_name,lv_name,origin --noheading --separator :";
-constexpr char STOP[] = "/sbin/mdadm -S /dev/md2";
 constexpr char REPORT[] = "/dev/md2 is running, status: NORMAL, rebuilding: None\n"
                           "Device level: RAID 1\n"
                           "Device size: 1024 MB (1073741824 bytes) \n"
@@ -40,10 +39,7 @@ constexpr char REPORT[] = "/dev/md2 is running, status: NORMAL, rebuilding: None
 
 void WipesExpect(MACHINE &machine)
 {
-    ExamineExpect(machine, "sda3", UUID_MD2);
-    ExamineExpect(machine, "sdb3", UUID_MD2, 2);
-    MachineTool(machine, WipeCommand("sda3"));
-    MachineTool(machine, WipeCommand("sdb3"));
+    StepsExpect(machine, STEPS{Examined("sdb3", UUID_MD2)} + MirrorWiped());
 }
 
 // A mirror that "destroy 2" takes down, command by command.
@@ -51,7 +47,7 @@ MACHINE MirrorToDestroy()
 {
     MACHINE machine = MachineWithMirror();
     MachineTool(machine, PVS);
-    MachineTool(machine, STOP);
+    MachineTool(machine, STOP_MD2);
     WipesExpect(machine);
     return machine;
 }
@@ -329,7 +325,7 @@ TEST(HostileSignals, AVolumeWhoseShellCannotBeWaitedForIsAFailure)
 TEST(HostileSignals, ChildrenThatReapThemselvesLeaveNoStatus)
 {
     MACHINE machine = MachineMake();
-    MachineTool(machine, STOP, {.status = 1});
+    MachineTool(machine, STOP_MD2, {.status = 1});
     (void)MachineCall(machine, [] {
         struct sigaction action = {};
         action.sa_handler = SIG_DFL;
@@ -375,11 +371,11 @@ TEST(HostileUmask, TheErrorLogIsWrittenWhateverItHides)
 {
     MACHINE machine = MachineWithMirror();
     MachineTool(machine, PVS);
-    MachineTool(machine, STOP, {.szErr = "mdadm: stopped /dev/md2\n"});
+    MachineTool(machine, STOP_MD2, {.szErr = "mdadm: stopped /dev/md2\n"});
     WipesExpect(machine);
     machine.prepare = [] { (void)umask(0777); };
     DestroyTells(machine);
-    EXPECT_EQ(OperationErrors(), "<time> command=\"/sbin/mdadm -S /dev/md2\" "
+    EXPECT_EQ(OperationErrors(), "Nov 05 01:02:03 command=\"/sbin/mdadm -S /dev/md2\" "
                                  "Error=\"mdadm: stopped /dev/md2 \"\n");
 }
 
@@ -484,15 +480,14 @@ TEST(HostileNames, PartitionsAreExaminedAsOneArgument)
                 "   8 6 1 sd\xe4\xff"
                 "6\n   8 7 1 sd a7\n");
     MachineTool(machine, PVS);
-    MachineTool(machine, STOP);
-    ExamineExpect(machine, "sdb3", UUID_MD2);
-    ExamineExpect(machine, "sda3", UUID_MD2);
+    MachineTool(machine, STOP_MD2);
+    StepsExpect(machine,
+                STEPS{Examined("sdb3", UUID_MD2), Examined("sda3", UUID_MD2)} + Wiped("sda3"));
     for (const char *const szPath : {"/dev/sd%s%n4", "/dev/sd';x;'5",
                                      "/dev/sd\xe4\xff"
                                      "6"}) {
         MachineTool(machine, {"/sbin/mdadm", "-E", szPath}, {.status = 1});
     }
-    MachineTool(machine, WipeCommand("sda3"));
     DestroyTells(machine);
 }
 
@@ -673,7 +668,7 @@ TEST(HostileDisks, AFullLogChangesNothingOfARemoval)
 {
     MACHINE machine = MachineWithMirror();
     MachineTool(machine, PVS);
-    MachineTool(machine, STOP, {.szErr = "mdadm: stopped /dev/md2\n"});
+    MachineTool(machine, STOP_MD2, {.szErr = "mdadm: stopped /dev/md2\n"});
     WipesExpect(machine);
     machine.prepare = [] { FullMount("/var/log"); };
     const RUN_RESULT result = MachineRun(machine, {"destroy", "2"});
@@ -720,8 +715,8 @@ TEST(HostileDisks, WithoutProcAnArrayIsStoppedAndNothingWiped)
     MACHINE machine = MachineWithMirror();
     MachineRemove(machine, "/proc");
     MachineTool(machine, PVS);
-    MachineTool(machine, STOP);
-    ExamineExpect(machine, "sdb3", UUID_MD2);
+    MachineTool(machine, STOP_MD2);
+    StepsExpect(machine, {Examined("sdb3", UUID_MD2)});
     const RUN_RESULT result = MachineRun(machine, {"destroy", "2"});
     EXPECT_EQ(result.status, 0);
     EXPECT_NE(LogText(result).find("<11>raid_remove.cpp:# Fail to enum partition path\n"),
@@ -777,8 +772,8 @@ TEST(HostileTools, OnesThatFailOrDieStopNothing)
           TOOL_ANSWER{.status = 1, .cbFlood = 1U << 20U, .nTimes = 3}}) {
         MACHINE machine = MachineWithMirror();
         MachineTool(machine, PVS);
-        ExamineExpect(machine, "sdb3", UUID_MD2);
-        MachineTool(machine, STOP, answer);
+        StepsExpect(machine, {Examined("sdb3", UUID_MD2)});
+        MachineTool(machine, STOP_MD2, answer);
         StopFails(machine, std::to_string(answer.status) + "/" + std::to_string(answer.signal));
     }
 }
@@ -789,7 +784,7 @@ TEST(HostileTools, AFloodOnBothStreamsBlocksNobody)
     MACHINE machine = MachineWithMirror();
     machine.msBound = 60000;
     MachineTool(machine, PVS, {.cbFlood = FLOOD_SIZE});
-    MachineTool(machine, STOP, {.cbFlood = FLOOD_SIZE});
+    MachineTool(machine, STOP_MD2, {.cbFlood = FLOOD_SIZE});
     WipesExpect(machine);
     DestroyTells(machine);
     const std::string szLog = MachineFileRead("/var/log/space_operation_error.log").value_or("");
@@ -803,7 +798,7 @@ TEST(HostileTools, AGrandchildThatHoldsTheStreamIsWaitedFor)
     constexpr int MS_HELD = 700;
     MACHINE machine = MachineWithMirror();
     MachineTool(machine, PVS);
-    MachineTool(machine, STOP, {.msGrandchild = MS_HELD});
+    MachineTool(machine, STOP_MD2, {.msGrandchild = MS_HELD});
     WipesExpect(machine);
     machine.fMayLeaveChildren = true;
     const RUN_RESULT result = MachineRun(machine, {"destroy", "2"});

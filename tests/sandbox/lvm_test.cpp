@@ -84,29 +84,22 @@ TEST(LVMGetLVPath, IsThatOfTheLastRowWithTheDevice)
     }
 }
 
-TEST(LVMGetLVPath, ARowThatIsTooLongComesInPieces)
-{
-    const std::string szLong(1023, ' ');
-    MachineCall(MachineWithRows(szLong + "/dev/md2:vg1:lv1:\n"), [] {
-        char szPath[256] = "";
-        EXPECT_EQ(LVMGetLVPath("/dev/md2", szPath, sizeof(szPath)), 0);
-        EXPECT_STREQ(szPath, "/dev/vg1/lv1");
-    });
-    MachineCall(MachineWithRows(szLong.substr(4) + "/dev/md2:vg1:lv1:\n"), [] {
-        char szPath[256] = "";
-        EXPECT_EQ(LVMGetLVPath("/dev/md2", szPath, sizeof(szPath)), -1);
-    });
-}
-
-// As many as 1023 characters, the last separator among them.
+// As many as 1023 characters, the last separator among them, and a longer row comes in pieces.
 TEST(LVMGetLVPath, ARowMayFillTheWholeLine)
 {
     const std::string szRow = "/dev/md2:vg1:lv1:";
-    MachineCall(MachineWithRows(std::string(1023 - szRow.size(), ' ') + szRow + "origin\n"), [] {
-        char szPath[256] = "";
-        EXPECT_EQ(LVMGetLVPath("/dev/md2", szPath, sizeof(szPath)), 0);
-        EXPECT_STREQ(szPath, "/dev/vg1/lv1");
-    });
+    const struct {
+        size_t nBlank;
+        int result;
+    } cases[] = {{1023 - szRow.size(), 0}, {1019, -1}, {1023, 0}};
+    for (const auto &row : cases) {
+        SCOPED_TRACE(row.nBlank);
+        MachineCall(MachineWithRows(std::string(row.nBlank, ' ') + szRow + "origin\n"), [&row] {
+            char szPath[256] = "before";
+            EXPECT_EQ(LVMGetLVPath("/dev/md2", szPath, sizeof(szPath)), row.result);
+            EXPECT_STREQ(szPath, row.result == 0 ? "/dev/vg1/lv1" : "before");
+        });
+    }
 }
 
 TEST(LVMGetLVPath, IsCutToTheBuffer)
@@ -133,8 +126,7 @@ TEST(LVMGetLVPath, BadArgumentsRunNothing)
         EXPECT_STREQ(szPath, "before");
         EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
     });
-    EXPECT_EQ(LogText(result), "");
-    EXPECT_EQ(TranscriptText(result), "");
+    EXPECT_EQ(OrderText(result), "");
 }
 
 TEST(LVMGetLVPath, WarningsAndTheStatusAreNotAsked)
@@ -149,7 +141,7 @@ TEST(LVMGetLVPath, WarningsAndTheStatusAreNotAsked)
         EXPECT_EQ(LVMGetLVPath("/dev/md2", szPath, sizeof(szPath)), 0);
         EXPECT_STREQ(szPath, "/dev/vg1/lv1");
     });
-    EXPECT_EQ(MachineFileRead("/var/log/space_operation_error.log"), std::nullopt);
+    EXPECT_EQ(OperationErrors(), "");
     ASSERT_EQ(result.events.size(), 1U);
     EXPECT_TRUE(result.events[0].fNullInput);
     EXPECT_TRUE(result.events[0].fNullError);
@@ -193,230 +185,161 @@ TEST(LVMGetLVPath, ACommandThatCannotBeStartedIsTold)
 
 constexpr char ROW_MD2[] = "  /dev/md2:vg1:lv1:\n";
 
-struct REMOVALS {
-    TOOL_ANSWER volume = {};
-    TOOL_ANSWER group = {};
-    TOOL_ANSWER physical = {};
-};
-
-void RemovalsExpect(MACHINE &machine, const REMOVALS &removals = {})
+STEPS Pvs(const std::string &szRows)
 {
-    MachineTool(machine, "/sbin/lvremove -f /dev/vg1/lv1", removals.volume);
-    MachineTool(machine, "/sbin/vgremove -f /dev/vg1", removals.group);
-    MachineTool(machine, "/sbin/pvremove -f /dev/md2", removals.physical);
+    return {{PVS, {.szOut = szRows}}};
 }
 
-const std::vector<std::string> REMOVAL_COMMANDS = {
-    "/sbin/lvremove -f /dev/vg1/lv1", "/sbin/vgremove -f /dev/vg1", "/sbin/pvremove -f /dev/md2"};
+const STEP LV_FAILED = {"<11>lvm.cpp:# Failed to /sbin/lvremove -f /dev/vg1/lv1"};
+const STEP VG_FAILED = {"<11>lvm.cpp:# Failed to /sbin/vgremove -f /dev/vg1"};
+const STEP PV_FAILED = {"<11>lvm.cpp:# Failed to /sbin/pvremove -f /dev/md2"};
+const STEPS REMOVED = {{"/sbin/lvremove -f /dev/vg1/lv1"},
+                       {"/sbin/vgremove -f /dev/vg1"},
+                       {"/sbin/pvremove -f /dev/md2"}};
 
-// The look-up, what is given, and the three removals.
-std::string Transcript(std::vector<std::string> between)
+long long Remove()
 {
-    between.insert(between.begin(), PVS);
-    between.insert(between.end(), REMOVAL_COMMANDS.begin(), REMOVAL_COMMANDS.end());
-    return Lines(between);
+    return LVMRmLVPath("/dev/md2");
 }
 
-RUN_RESULT Remove(const MACHINE &machine, int expected = 0)
+TEST(LVMRmLVPath, WithoutAWholeRowNothingIsRun)
 {
-    return MachineCall(machine, [expected] {
-        RecordReset();
-        EXPECT_EQ(LVMRmLVPath("/dev/md2"), expected);
-        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
-    });
-}
-
-TEST(LVMRmLVPath, WithoutARowNothingIsRun)
-{
-    for (const char *const szRows :
-         {"", "  /dev/md1:vg1:lv1:\n", "  /dev/sda5:vg0:root:\n  /dev/sdb5:vg0:root:\n"}) {
-        const RUN_RESULT result = Remove(MachineWithRows(szRows));
-        EXPECT_EQ(LogText(result), "");
-        EXPECT_EQ(TranscriptText(result), std::string(PVS) + "\n");
-    }
-}
-
-TEST(LVMRmLVPath, WithABrokenRowNothingIsRun)
-{
-    const RUN_RESULT result = Remove(MachineWithRows("  /dev/md2:vg1\n"));
-    EXPECT_EQ(LogText(result), "<11>lvm.cpp:# pvg=vg1\n\n");
-    EXPECT_EQ(TranscriptText(result), std::string(PVS) + "\n");
-}
-
-TEST(LVMRmLVPath, AMissingToolMeansNoLvm)
-{
-    MACHINE machine = MachineMake();
-    machine.tools["/sbin/pvs"] = TOOL_KIND::MISSING;
-    const RUN_RESULT result = Remove(machine);
-    EXPECT_EQ(LogText(result), "");
-    EXPECT_EQ(TranscriptText(result), "");
+    ExpectCalls({{.szName = "no row", .call = Remove, .steps = Pvs("")},
+                 {.szName = "another device",
+                  .call = Remove,
+                  .steps = Pvs("  /dev/md1:vg1:lv1:\n  /dev/sdb5:vg0:root:\n")},
+                 {.szName = "a broken row",
+                  .call = Remove,
+                  .steps = Pvs("  /dev/md2:vg1\n") + STEPS{{"<11>lvm.cpp:# pvg=vg1\n"}}},
+                 {.szName = "no tool",
+                  .machine = WithTool(MachineMake(), "/sbin/pvs", TOOL_KIND::MISSING),
+                  .call = Remove},
+                 {.szName = "no mount table",
+                  .machine = Without(MachineMake(), "/proc/mounts"),
+                  .call = Remove,
+                  .result = -1,
+                  .steps = Pvs(ROW_MD2) + STEPS{{"<11>lvm.cpp:# Failed to open /proc/mounts"}}}});
 }
 
 TEST(LVMRmLVPath, RemovesVolumeGroupAndPhysicalVolume)
 {
-    MACHINE machine = MachineWithRows(ROW_MD2);
-    RemovalsExpect(machine);
-    const RUN_RESULT result = Remove(machine);
-    EXPECT_EQ(LogText(result), "");
-    EXPECT_EQ(TranscriptText(result), Transcript({}));
-}
-
-TEST(LVMRmLVPath, AGroupWithFreeSpaceHasNoVolumeInItsLastRow)
-{
-    MACHINE machine = MachineWithRows("  /dev/md2:vg1:lv1:\n  /dev/md2:vg1::\n");
-    MachineTool(machine, "/sbin/lvremove -f /dev/vg1/");
-    MachineTool(machine, "/sbin/vgremove -f /dev/vg1");
-    MachineTool(machine, "/sbin/pvremove -f /dev/md2");
-    EXPECT_EQ(LogText(Remove(machine)), "");
-}
-
-TEST(LVMRmLVPath, EmptyFieldsAreTakenAsTheyAre)
-{
-    MACHINE machine = MachineWithRows("  /dev/md2:::\n");
-    MachineFile(machine, "/proc/mounts", "/dev//s1 /volume1 ext4 rw 0 0\n");
-    MachineTool(machine, "/bin/umount -R -A -k /volume1");
-    MachineFolder(machine, "/volume1");
-    MachineTool(machine, "/sbin/lvremove -f /dev//s1");
-    MachineTool(machine, "/sbin/lvremove -f /dev//");
-    MachineTool(machine, "/sbin/vgremove -f /dev/");
-    MachineTool(machine, "/sbin/pvremove -f /dev/md2");
-    const RUN_RESULT result = Remove(machine);
-    EXPECT_EQ(LogText(result), "");
-    EXPECT_EQ(TranscriptText(result),
-              Lines({PVS, "/bin/umount -R -A -k /volume1", "sleep 1", "/sbin/lvremove -f /dev//s1",
-                     "/sbin/lvremove -f /dev//", "/sbin/vgremove -f /dev/",
-                     "/sbin/pvremove -f /dev/md2"}));
-}
-
-TEST(LVMRmLVPath, ALongerNumberIsTakenForTheDevice)
-{
-    MACHINE machine = MachineWithRows("  /dev/md20:vg20:lv20:\n");
-    MachineTool(machine, "/sbin/lvremove -f /dev/vg20/lv20");
-    MachineTool(machine, "/sbin/vgremove -f /dev/vg20");
-    MachineTool(machine, "/sbin/pvremove -f /dev/md2");
-    EXPECT_EQ(LogText(Remove(machine)), "");
+    ExpectCalls(
+        {{.szName = "a volume", .call = Remove, .steps = Pvs(ROW_MD2) + REMOVED},
+         // A group with free space has no volume in its last row.
+         {.szName = "free space",
+          .call = Remove,
+          .steps = Pvs("  /dev/md2:vg1:lv1:\n  /dev/md2:vg1::\n") +
+                   STEPS{{"/sbin/lvremove -f /dev/vg1/"},
+                         {"/sbin/vgremove -f /dev/vg1"},
+                         {"/sbin/pvremove -f /dev/md2"}}},
+         // A longer number is taken for the device.
+         {.szName = "md20",
+          .call = Remove,
+          .steps = Pvs("  /dev/md20:vg20:lv20:\n") + STEPS{{"/sbin/lvremove -f /dev/vg20/lv20"},
+                                                           {"/sbin/vgremove -f /dev/vg20"},
+                                                           {"/sbin/pvremove -f /dev/md2"}}}});
 }
 
 TEST(LVMRmLVPath, EveryFailureIsToldAndNoneEndsIt)
 {
-    MACHINE machine = MachineWithRows(ROW_MD2);
-    RemovalsExpect(machine, {{.szErr = "  in use\n", .status = 5}, {.status = 1}, {.signal = 9}});
-    const RUN_RESULT result = Remove(machine);
-    EXPECT_EQ(LogText(result), "<11>lvm.cpp:# Failed to /sbin/lvremove -f /dev/vg1/lv1\n"
-                               "<11>lvm.cpp:# Failed to /sbin/vgremove -f /dev/vg1\n"
-                               "<11>lvm.cpp:# Failed to /sbin/pvremove -f /dev/md2\n");
-    EXPECT_EQ(TranscriptText(result), Transcript({}));
-    EXPECT_EQ(OperationErrors(),
-              "<time> command=\"/sbin/lvremove -f /dev/vg1/lv1\" Error=\"  in use \"\n");
-}
-
-TEST(LVMRmLVPath, MissingToolsAreFailures)
-{
-    MACHINE machine = MachineWithRows(ROW_MD2);
+    MACHINE missing = MachineMake();
     for (const char *const szTool : {"/sbin/lvremove", "/sbin/vgremove", "/sbin/pvremove"}) {
-        machine.tools[szTool] = TOOL_KIND::MISSING;
+        missing.tools[szTool] = TOOL_KIND::MISSING;
     }
-    const RUN_RESULT result = Remove(machine);
-    EXPECT_EQ(LogText(result), "<11>lvm.cpp:# Failed to /sbin/lvremove -f /dev/vg1/lv1\n"
-                               "<11>lvm.cpp:# Failed to /sbin/vgremove -f /dev/vg1\n"
-                               "<11>lvm.cpp:# Failed to /sbin/pvremove -f /dev/md2\n");
-}
-
-// What the runner could not even start it has on record itself.
-TEST(LVMRmLVPath, AResultOfMinusOneIsNotTold)
-{
-    MACHINE machine = MachineWithRows(ROW_MD2);
-    machine.faults = {{.szFunction = "pipe2", .nCall = 2, .error = EMFILE, .fGoOn = true}};
-    const RUN_RESULT result = MachineCall(machine, [] { EXPECT_EQ(LVMRmLVPath("/dev/md2"), 0); });
-    EXPECT_EQ(LogText(result), "");
-    EXPECT_EQ(TranscriptText(result),
-              Lines({PVS, "fault pipe2 2", "fault pipe2 3", "fault pipe2 4"}));
-}
-
-TEST(LVMRmLVPath, WithoutAMountTableNothingIsRemoved)
-{
-    MACHINE machine = MachineWithRows(ROW_MD2);
-    MachineRemove(machine, "/proc/mounts");
-    const RUN_RESULT result = Remove(machine, -1);
-    EXPECT_EQ(LogText(result), "<11>lvm.cpp:# Failed to open /proc/mounts\n");
-    EXPECT_EQ(TranscriptText(result), std::string(PVS) + "\n");
+    ExpectCalls(
+        {{.szName = "missing tools",
+          .machine = missing,
+          .call = Remove,
+          .steps = Pvs(ROW_MD2) + STEPS{LV_FAILED, VG_FAILED, PV_FAILED}},
+         // What the runner could not even start it has on record itself.
+         {.szName = "no pipe",
+          .machine = WithFault(MachineMake(),
+                               {.szFunction = "pipe2", .nCall = 2, .error = EMFILE, .fGoOn = true}),
+          .call = Remove,
+          .code = ERR_BAD_PARAMETER,
+          .steps = Pvs(ROW_MD2) + STEPS{{"fault pipe2 2"}, {"fault pipe2 3"}, {"fault pipe2 4"}}},
+         {.szName = "each in its way",
+          .call = Remove,
+          .steps = Pvs(ROW_MD2) + STEPS{{REMOVED[0].szText, {.szErr = "  in use\n", .status = 5}},
+                                        LV_FAILED,
+                                        {REMOVED[1].szText, {.status = 1}},
+                                        VG_FAILED,
+                                        {REMOVED[2].szText, {.signal = 9}},
+                                        PV_FAILED}}});
+    EXPECT_EQ(OperationErrors(),
+              "Nov 05 01:02:03 command=\"/sbin/lvremove -f /dev/vg1/lv1\" Error=\"  in use \"\n");
 }
 
 // ---- mounts ------------------------------------------------------------------------------------
 
-MACHINE MachineWithMounts(const std::string &szMounts)
+// A volume that is mounted there, and its folder is empty.
+STEPS Unmounted(const std::string &szVolume, const std::string &szFolder)
 {
-    MACHINE machine = MachineWithRows(ROW_MD2);
-    MachineFile(machine, "/proc/mounts", szMounts);
-    RemovalsExpect(machine);
-    return machine;
+    return {{"/bin/umount -R -A -k " + szFolder}, {"sleep 1"}, {"/sbin/lvremove -f " + szVolume}};
+}
+
+// With these mounts, on empty folders, the volume lv1 is taken down so, and the folders are gone.
+void ExpectMounts(const char *szName, const std::string &szMounts,
+                  const std::vector<std::string> &folders, const STEPS &steps)
+{
+    MACHINE machine = WithFile(MachineMake(), "/proc/mounts", szMounts);
+    for (const std::string &szFolder : folders) {
+        MachineFolder(machine, szFolder);
+    }
+    const auto call = [&folders] {
+        const int result = LVMRmLVPath("/dev/md2");
+        for (const std::string &szFolder : folders) {
+            EXPECT_EQ(access(szFolder.c_str(), F_OK), szFolder == "/stays" ? 0 : -1) << szFolder;
+        }
+        return result;
+    };
+    (void)ExpectCall({.szName = szName,
+                      .machine = machine,
+                      .call = call,
+                      .steps = Pvs(ROW_MD2) + steps + REMOVED});
 }
 
 TEST(LVMRmLVPath, UnmountsInTheOrderOfTheTable)
 {
-    MACHINE machine = MachineWithMounts("rootfs / rootfs rw 0 0\n"
-                                        "/dev/vg1/lv1s2 /volume2 ext4 rw 0 0\n"
-                                        "/dev/sda1 /boot ext4 rw 0 0\n"
-                                        "/dev/vg1/lv1s1 /volume1 xfs rw 0 0\n");
-    MachineFolder(machine, "/volume1");
-    MachineFolder(machine, "/volume2");
-    for (const char *const szCommand :
-         {"/bin/umount -R -A -k /volume2", "/sbin/lvremove -f /dev/vg1/lv1s2",
-          "/bin/umount -R -A -k /volume1", "/sbin/lvremove -f /dev/vg1/lv1s1"}) {
-        MachineTool(machine, szCommand);
-    }
-    const RUN_RESULT result = MachineCall(machine, [] {
-        EXPECT_EQ(LVMRmLVPath("/dev/md2"), 0);
-        EXPECT_EQ(access("/volume1", F_OK), -1);
-        EXPECT_EQ(access("/volume2", F_OK), -1);
-    });
-    EXPECT_EQ(LogText(result), "");
-    EXPECT_EQ(TranscriptText(result),
-              Transcript({"/bin/umount -R -A -k /volume2", "sleep 1",
-                          "/sbin/lvremove -f /dev/vg1/lv1s2", "/bin/umount -R -A -k /volume1",
-                          "sleep 1", "/sbin/lvremove -f /dev/vg1/lv1s1"}));
+    ExpectMounts("two of four",
+                 "rootfs / rootfs rw 0 0\n"
+                 "/dev/vg1/lv1s2 /volume2 ext4 rw 0 0\n"
+                 "/dev/sda1 /boot ext4 rw 0 0\n"
+                 "/dev/vg1/lv1s1 /volume1 xfs rw 0 0\n",
+                 {"/volume1", "/volume2"},
+                 Unmounted("/dev/vg1/lv1s2", "/volume2") + Unmounted("/dev/vg1/lv1s1", "/volume1"));
 }
 
 TEST(LVMRmLVPath, MountsOfOtherDevicesAreLeftAlone)
 {
-    const RUN_RESULT result = Remove(MachineWithMounts("/dev/vg1/lv1 /volume1 ext4 rw 0 0\n"
-                                                       "/dev/vg1/lv10 /volume2 ext4 rw 0 0\n"
-                                                       "/dev/vg1/lv1-s1 /volume3 ext4 rw 0 0\n"
-                                                       "/dev/vg1/lv1S1 /volume4 ext4 rw 0 0\n"
-                                                       "/dev/vg1 /volume5 ext4 rw 0 0\n"
-                                                       "x/dev/vg1/lv1s1 /volume6 ext4 rw 0 0\n"
-                                                       "tmpfs /dev/vg1/lv1s1 tmpfs rw 0 0\n"));
-    EXPECT_EQ(LogText(result), "");
-    EXPECT_EQ(TranscriptText(result), Transcript({}));
+    ExpectMounts("none of seven",
+                 "/dev/vg1/lv1 /volume1 ext4 rw 0 0\n"
+                 "/dev/vg1/lv10 /volume2 ext4 rw 0 0\n"
+                 "/dev/vg1/lv1-s1 /volume3 ext4 rw 0 0\n"
+                 "/dev/vg1/lv1S1 /volume4 ext4 rw 0 0\n"
+                 "/dev/vg1 /volume5 ext4 rw 0 0\n"
+                 "x/dev/vg1/lv1s1 /volume6 ext4 rw 0 0\n"
+                 "tmpfs /dev/vg1/lv1s1 tmpfs rw 0 0\n",
+                 {}, {});
 }
 
 TEST(LVMRmLVPath, AufsMountsAreLeftAlone)
 {
-    MACHINE machine = MachineWithMounts("/dev/vg1/lv1s1 /union aufs rw 0 0\n"
-                                        "/dev/vg1/lv1s1 /volume1 aufs2 rw 0 0\n"
-                                        "/dev/vg1/lv1s /volume2 AUFS rw 0 0\n");
-    MachineFolder(machine, "/union");
-    MachineFolder(machine, "/volume1");
-    MachineFolder(machine, "/volume2");
-    MachineTool(machine, "/bin/umount -R -A -k /volume1");
-    MachineTool(machine, "/sbin/lvremove -f /dev/vg1/lv1s1");
-    MachineTool(machine, "/bin/umount -R -A -k /volume2");
-    MachineTool(machine, "/sbin/lvremove -f /dev/vg1/lv1s");
-    const RUN_RESULT result = MachineCall(machine, [] {
-        EXPECT_EQ(LVMRmLVPath("/dev/md2"), 0);
-        EXPECT_EQ(access("/union", F_OK), 0);
-        EXPECT_EQ(access("/volume1", F_OK), -1);
-        EXPECT_EQ(access("/volume2", F_OK), -1);
-    });
-    EXPECT_EQ(LogText(result), "");
+    ExpectMounts("one of three",
+                 "/dev/vg1/lv1s1 /stays aufs rw 0 0\n"
+                 "/dev/vg1/lv1s1 /volume1 aufs2 rw 0 0\n"
+                 "/dev/vg1/lv1s /volume2 AUFS rw 0 0\n",
+                 {"/stays", "/volume1", "/volume2"},
+                 Unmounted("/dev/vg1/lv1s1", "/volume1") + Unmounted("/dev/vg1/lv1s", "/volume2"));
 }
 
 TEST(LVMRmLVPath, EscapesOfTheTableAreRead)
 {
-    MACHINE machine = MachineWithMounts("/dev/vg1/lv1s1 /my\\040volume ext4 rw 0 0\n");
+    MACHINE machine =
+        WithFile(MachineMake(), "/proc/mounts", "/dev/vg1/lv1s1 /my\\040volume ext4 rw 0 0\n");
     MachineFolder(machine, "/my volume");
     MachineTool(machine, {"/bin/umount", "-R", "-A", "-k", "/my volume"});
-    MachineTool(machine, "/sbin/lvremove -f /dev/vg1/lv1s1");
+    StepsExpect(machine, Pvs(ROW_MD2) + STEPS{{"/sbin/lvremove -f /dev/vg1/lv1s1"}} + REMOVED);
     const RUN_RESULT result = MachineCall(machine, [] {
         EXPECT_EQ(LVMRmLVPath("/dev/md2"), 0);
         EXPECT_EQ(access("/my volume", F_OK), -1);
@@ -424,26 +347,38 @@ TEST(LVMRmLVPath, EscapesOfTheTableAreRead)
     EXPECT_EQ(LogText(result), "");
 }
 
+TEST(LVMRmLVPath, EmptyFieldsAreTakenAsTheyAre)
+{
+    MACHINE machine = WithFile(MachineMake(), "/proc/mounts", "/dev//s1 /volume1 ext4 rw 0 0\n");
+    MachineFolder(machine, "/volume1");
+    (void)ExpectCall({.szName = "no group, no volume",
+                      .machine = machine,
+                      .call = Remove,
+                      .steps = Pvs("  /dev/md2:::\n") + Unmounted("/dev//s1", "/volume1") +
+                               STEPS{{"/sbin/lvremove -f /dev//"},
+                                     {"/sbin/vgremove -f /dev/"},
+                                     {"/sbin/pvremove -f /dev/md2"}}});
+}
+
 // Of a longer path the first 255 characters are the volume, and the "s" comes behind them.
 TEST(LVMRmLVPath, AVolumePathIsCutTo255Characters)
 {
     const std::string szVolume = "/dev/vg1/" + std::string(246, 'v');
     ASSERT_EQ(szVolume.size(), 255U);
+    MACHINE machine =
+        WithFile(MachineMake(), "/proc/mounts",
+                 szVolume + "1 /volume1 ext4 rw 0 0\n" + szVolume + "s1 /volume2 ext4 rw 0 0\n");
+    MachineFolder(machine, "/volume2");
     for (const char *const szBehind : {"", "w"}) {
-        SCOPED_TRACE(szBehind);
-        MACHINE machine =
-            MachineWithRows("  /dev/md2:vg1:" + std::string(246, 'v') + szBehind + ":\n");
-        MachineFile(machine, "/proc/mounts",
-                    szVolume + "1 /volume1 ext4 rw 0 0\n" + szVolume + "s1 /volume2 ext4 rw 0 0\n");
-        MachineFolder(machine, "/volume2");
-        const std::vector<std::string> commands = {
-            "/bin/umount -R -A -k /volume2", "/sbin/lvremove -f " + szVolume + "s1",
-            "/sbin/lvremove -f " + szVolume, "/sbin/vgremove -f /dev/vg1",
-            "/sbin/pvremove -f /dev/md2"};
-        for (const std::string &szCommand : commands) {
-            MachineTool(machine, szCommand);
-        }
-        EXPECT_EQ(LogText(Remove(machine)), "");
+        (void)ExpectCall(
+            {.szName = "255 characters or more",
+             .machine = machine,
+             .call = Remove,
+             .steps = Pvs("  /dev/md2:vg1:" + std::string(246, 'v') + szBehind + ":\n") +
+                      Unmounted(szVolume + "s1", "/volume2") +
+                      STEPS{{"/sbin/lvremove -f " + szVolume},
+                            {"/sbin/vgremove -f /dev/vg1"},
+                            {"/sbin/pvremove -f /dev/md2"}}});
     }
 }
 
@@ -452,116 +387,85 @@ TEST(LVMRmLVPath, AMountEntryIsCutTo4095Characters)
 {
     const std::string szStart = "/dev/vg1/lv1s1 /volume1";
     const std::string szBlanks(4095 - szStart.size() - 4, ' ');
-    const RUN_RESULT whole = Remove(MachineWithMounts(szStart + szBlanks +
-                                                      "aufs rw 0 0\n"
-                                                      "tmpfs /tmp tmpfs rw 0 0\n"));
-    EXPECT_EQ(TranscriptText(whole), Transcript({}));
-
-    MACHINE machine = MachineWithMounts(szStart + szBlanks + " aufs rw 0 0\n");
-    MachineFolder(machine, "/volume1");
-    MachineTool(machine, "/bin/umount -R -A -k /volume1");
-    MachineTool(machine, "/sbin/lvremove -f /dev/vg1/lv1s1");
-    EXPECT_EQ(LogText(Remove(machine)), "");
+    ExpectMounts("it fits", szStart + szBlanks + "aufs rw 0 0\ntmpfs /tmp tmpfs rw 0 0\n", {}, {});
+    ExpectMounts("cut", szStart + szBlanks + " aufs rw 0 0\n", {"/volume1"},
+                 Unmounted("/dev/vg1/lv1s1", "/volume1"));
 }
 
-// A mounted volume /volume1 whose folder can go, with this answer of umount and of the removal.
-MACHINE MachineWithMount(const TOOL_ANSWER &unmount, const TOOL_ANSWER &removal)
+// ---- one mount ---------------------------------------------------------------------------------
+
+const STEP UMOUNT = {"/bin/umount -R -A -k /volume1"};
+const STEP MOUNT_LV = {"/sbin/lvremove -f /dev/vg1/lv1s1"};
+// In the old words.
+const STEP UMOUNT_FAILED = {"<11>lvm.cpp:# Failed to /bin/umount -f -k /volume1"};
+const STEP RMDIR_FAILED = {"<11>lvm.cpp:# Failed to rmdir(/volume1)"};
+const STEP MOUNT_LV_FAILED = {"<11>lvm.cpp:# Failed to /sbin/lvremove -f /dev/vg1/lv1s1"};
+const STEP PAUSE = {"sleep 1"};
+
+// A mounted volume whose folder can go.
+MACHINE MachineWithMount()
 {
-    MACHINE machine = MachineWithMounts("/dev/vg1/lv1s1 /volume1 ext4 rw 0 0\n");
+    MACHINE machine =
+        WithFile(MachineMake(), "/proc/mounts", "/dev/vg1/lv1s1 /volume1 ext4 rw 0 0\n");
     MachineFolder(machine, "/volume1");
-    MachineTool(machine, "/bin/umount -R -A -k /volume1", unmount);
-    MachineTool(machine, "/sbin/lvremove -f /dev/vg1/lv1s1", removal);
     return machine;
 }
 
-const std::vector<std::string> MOUNT_STEPS = {"/bin/umount -R -A -k /volume1", "sleep 1",
-                                              "/sbin/lvremove -f /dev/vg1/lv1s1"};
-
-TEST(LVMRmLVPath, AFailedUnmountIsToldInTheOldWords)
+void ExpectMount(const char *szName, const STEPS &steps,
+                 const MACHINE &machine = MachineWithMount(), u32 code = OLD_CODE)
 {
-    const RUN_RESULT result =
-        Remove(MachineWithMount({.szErr = "umount: busy\n", .status = 32}, {}));
-    EXPECT_EQ(LogText(result), "<11>lvm.cpp:# Failed to /bin/umount -f -k /volume1\n");
-    EXPECT_EQ(TranscriptText(result), Transcript(MOUNT_STEPS));
+    (void)ExpectCall({.szName = szName,
+                      .machine = machine,
+                      .call = Remove,
+                      .code = code,
+                      .steps = Pvs(ROW_MD2) + steps + REMOVED});
+}
+
+// Told before the pause. The mount has a second to go before its folder is taken away.
+TEST(LVMRmLVPath, EveryFailureOfAMountIsToldAndNoneEndsIt)
+{
+    ExpectMount("umount fails", {{UMOUNT.szText, {.szErr = "umount: busy\n", .status = 32}},
+                                 UMOUNT_FAILED,
+                                 PAUSE,
+                                 MOUNT_LV});
     // umount does not go through the runner that keeps the operation errors.
-    EXPECT_EQ(MachineFileRead("/var/log/space_operation_error.log"), std::nullopt);
-}
-
-TEST(LVMRmLVPath, AMissingUnmountIsAFailure)
-{
-    MACHINE machine = MachineWithMount({.nTimes = 0}, {});
-    machine.tools["/bin/umount"] = TOOL_KIND::MISSING;
-    EXPECT_EQ(LogText(Remove(machine)), "<11>lvm.cpp:# Failed to /bin/umount -f -k /volume1\n");
-}
-
-TEST(LVMRmLVPath, AnUnmountThatIsKilledIsNotTold)
-{
-    const RUN_RESULT result = MachineCall(MachineWithMount({.signal = SIGKILL}, {}), [] {
-        EXPECT_EQ(LVMRmLVPath("/dev/md2"), 0);
-        EXPECT_EQ(NLIBCErrGet(), ERR_CHILD_FAILED);
-    });
-    EXPECT_EQ(LogText(result), "");
-    EXPECT_EQ(TranscriptText(result), Transcript(MOUNT_STEPS));
+    EXPECT_EQ(OperationErrors(), "");
+    ExpectMount("no umount", {UMOUNT_FAILED, PAUSE, MOUNT_LV},
+                WithTool(MachineWithMount(), "/bin/umount", TOOL_KIND::MISSING));
+    ExpectMount("umount is killed", {{UMOUNT.szText, {.signal = SIGKILL}}, PAUSE, MOUNT_LV},
+                MachineWithMount(), ERR_CHILD_FAILED);
+    ExpectMount("a folder that stays", {UMOUNT, PAUSE, RMDIR_FAILED, MOUNT_LV},
+                WithFile(MachineWithMount(), "/volume1/file", ""));
+    EXPECT_EQ(MachineFileRead("/volume1/file"), "");
+    ExpectMount("a busy folder", {UMOUNT, PAUSE, {"fault rmdir 1"}, RMDIR_FAILED, MOUNT_LV},
+                WithFault(MachineWithMount(), {.szFunction = "rmdir", .error = EBUSY}));
+    ExpectMount("a folder that is gone",
+                {{UMOUNT.szText, {.removes = {"/volume1"}}}, PAUSE, RMDIR_FAILED, MOUNT_LV});
+    ExpectMount("the removal is killed",
+                {UMOUNT, PAUSE, {MOUNT_LV.szText, {.signal = SIGKILL}}, MOUNT_LV_FAILED});
+    ExpectMount("all three",
+                {{UMOUNT.szText, {.status = 1}},
+                 UMOUNT_FAILED,
+                 PAUSE,
+                 RMDIR_FAILED,
+                 {MOUNT_LV.szText, {.szErr = "  busy\n", .status = 5}},
+                 MOUNT_LV_FAILED},
+                WithFile(MachineWithMount(), "/volume1/file", ""));
+    EXPECT_EQ(OperationErrors(),
+              "Nov 05 01:02:03 command=\"/sbin/lvremove -f /dev/vg1/lv1s1\" Error=\"  busy \"\n");
 }
 
 TEST(LVMRmLVPath, TheUnmountHasNoStreamsAndOnlyThePath)
 {
-    MACHINE machine = MachineWithMount({}, {});
+    MACHINE machine = MachineWithMount();
     machine.environment["SECRET"] = "1";
-    const RUN_RESULT result = Remove(machine);
+    StepsExpect(machine, Pvs(ROW_MD2) + STEPS{UMOUNT, MOUNT_LV} + REMOVED);
+    const RUN_RESULT result = MachineCall(machine, [] { EXPECT_EQ(Remove(), 0); });
     ASSERT_GE(result.events.size(), 2U);
     const RUN_EVENT &unmount = result.events[1];
     EXPECT_EQ(unmount.argv[0], "/bin/umount");
     EXPECT_TRUE(unmount.fNullInput && unmount.fNullOutput && unmount.fNullError);
     EXPECT_EQ(unmount.environment, std::vector<std::string>{"PATH=/sbin:/bin"});
-}
-
-TEST(LVMRmLVPath, AFolderThatStaysIsTold)
-{
-    MACHINE machine = MachineWithMount({}, {});
-    MachineFile(machine, "/volume1/file", "");
-    const RUN_RESULT result = Remove(machine);
-    EXPECT_EQ(LogText(result), "<11>lvm.cpp:# Failed to rmdir(/volume1)\n");
-    EXPECT_EQ(TranscriptText(result), Transcript(MOUNT_STEPS));
-    EXPECT_EQ(MachineFileRead("/volume1/file"), "");
-}
-
-// The mount has a second to go before its folder is taken away.
-TEST(LVMRmLVPath, TheFolderIsRemovedBehindThePause)
-{
-    MACHINE machine = MachineWithMount({}, {});
-    machine.faults = {{.szFunction = "rmdir", .error = EBUSY}};
-    const RUN_RESULT result = Remove(machine);
-    EXPECT_EQ(LogText(result), "<11>lvm.cpp:# Failed to rmdir(/volume1)\n");
-    EXPECT_EQ(TranscriptText(result),
-              Transcript({"/bin/umount -R -A -k /volume1", "sleep 1", "fault rmdir 1",
-                          "/sbin/lvremove -f /dev/vg1/lv1s1"}));
-}
-
-TEST(LVMRmLVPath, AFolderThatIsGoneIsTold)
-{
-    const RUN_RESULT result = Remove(MachineWithMount({.removes = {"/volume1"}}, {}));
-    EXPECT_EQ(LogText(result), "<11>lvm.cpp:# Failed to rmdir(/volume1)\n");
-    EXPECT_EQ(TranscriptText(result), Transcript(MOUNT_STEPS));
-}
-
-TEST(LVMRmLVPath, EveryFailureOfAMountIsToldAndNoneEndsIt)
-{
-    MACHINE machine = MachineWithMount({.status = 1}, {.szErr = "  busy\n", .status = 5});
-    MachineFile(machine, "/volume1/file", "");
-    const RUN_RESULT result = Remove(machine);
-    EXPECT_EQ(LogText(result), "<11>lvm.cpp:# Failed to /bin/umount -f -k /volume1\n"
-                               "<11>lvm.cpp:# Failed to rmdir(/volume1)\n"
-                               "<11>lvm.cpp:# Failed to /sbin/lvremove -f /dev/vg1/lv1s1\n");
-    EXPECT_EQ(TranscriptText(result), Transcript(MOUNT_STEPS));
-    EXPECT_EQ(OperationErrors(),
-              "<time> command=\"/sbin/lvremove -f /dev/vg1/lv1s1\" Error=\"  busy \"\n");
-}
-
-TEST(LVMRmLVPath, AKilledRemovalOfAMountIsTold)
-{
-    const RUN_RESULT result = Remove(MachineWithMount({}, {.signal = SIGKILL}));
-    EXPECT_EQ(LogText(result), "<11>lvm.cpp:# Failed to /sbin/lvremove -f /dev/vg1/lv1s1\n");
 }
 
 } // namespace

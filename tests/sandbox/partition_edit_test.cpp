@@ -245,6 +245,16 @@ TEST(PartitionCreateVersion, OfADiskWithoutLayoutIsTheMachines)
     EXPECT_EQ(LogText(result), "<15>partition_layout.cpp:# /dev/sda: dont contain partition [1]\n");
 }
 
+TEST(PartitionCreateVersion, OfADiskThatFitsNoRowIsTheMachines)
+{
+    MACHINE machine = MachineWithConf(CONF_RAID);
+    PartitionedDiskAdd(machine, "sda", PLACES_FOREIGN);
+    PartitionedDiskAdd(machine, "sdb", PLACES_6);
+    SystemArrayAdd(machine, {{"sdb1"}});
+    MachineTool(machine, DataCommand("-j257040", "-tfd", "/dev/sda"));
+    EXPECT_EQ(LogText(Create(machine, "/dev/sda", 2, std::nullopt, 0)), "");
+}
+
 TEST(PartitionCreateVersion, ThatCannotBeFoundEndsIt)
 {
     MACHINE machine = MachineWithConf(CONF_RAID);
@@ -453,6 +463,10 @@ constexpr LISTED_CASE LISTED_CASES[] = {
     {"/dev/sda1\t2048\t4982527\t4980480\t83\tLinux\n", 4980480, 2048, 0x83},
     {"  /dev/sda1 \t 63   *  \t 4980087  82 \n", 4980087, 63, 0x82},
     {"/dev/sda1 2048 4982527 4980480 fd\n/dev/sda2 1 2 3 4\n", 4980480, 2048, 0xfd},
+    // Blanks and tabs end a field, and nothing else does.
+    {"/dev/sda\v1 20\v48 4982527 4980480 fd\n", 4980480, 20, 0xfd},
+    {"/dev/sda\f1 2048\f1 49\f82527 4980480 fd\n", 4980480, 2048, 0xfd},
+    {"/dev/sda\r1 2048 4982527 4980480\r7 fd\n", 4980480, 2048, 0xfd},
     {"/dev/sda~1 2048 4982527 4980480 fd\n", 4980480, 2048, 0xfd}, // no name is asked for
     {"/dev/sda1 1 2 0 f\n", 0, 1, 0xf},
     {"/dev/sda1 1 2 -7 0xee\n", -7, 1, 0xee},

@@ -246,6 +246,17 @@ TEST(PartitionStartSize, TellsAnAbsentPartitionFromAFailure)
     EXPECT_EQ(LogText(result), "");
 }
 
+// The second is not even asked for.
+TEST(PartitionStartSize, AsksForTheStartFirst)
+{
+    MACHINE machine = MachineMake();
+    PartitionedDiskAdd(machine, "sda", PLACES_8);
+    machine.faults = {{.szFunction = "open", .error = EACCES, .fGoOn = true, .szProcess = "0"}};
+    const RUN_RESULT result =
+        MachineCall(machine, [] { ExpectNoPlace("sda", 2, -1, ERR_OPEN_FAILED); });
+    EXPECT_EQ(TranscriptText(result), "fault open \"1 0 /sys/block/sda/sda2/start\"\n");
+}
+
 TEST(PartitionStartSize, RefusesNull)
 {
     MachineCall(MachineMake(), [] {

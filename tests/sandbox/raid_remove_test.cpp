@@ -4,7 +4,6 @@
 #include "removal_machine.h"
 
 #include <cerrno>
-#include <climits>
 #include <csignal>
 #include <cstring>
 #include <gtest/gtest.h>
@@ -15,25 +14,6 @@ namespace
 {
 
 constexpr int MANY_COMMANDS_MS = 60000; // fifty of them, on a machine that may be shared
-
-constexpr char STOP_MD2[] = "/sbin/mdadm -S /dev/md2";
-constexpr char STOP_TOLD[] = "<11>raid_remove.cpp:# Failed to mdadm stop '/dev/md2'\n"
-                             "<11>raid_remove.cpp:# Fail to stop [/dev/md2], try again\n";
-constexpr char LIMIT_TOLD[] = "<11>raid_remove.cpp:# Reach RAID stop retry limit\n";
-constexpr char CLEAN_TOLD[] = "<11>raid_remove.cpp:# [Info] clean RAID superblock of /dev/md2\n";
-
-std::string WipedTold(const std::string &szName)
-{
-    return "<11>raid_remove.cpp:# [Info] Clean RAID superblock on '/dev/" + szName + "'\n";
-}
-
-std::string WipeFailedTold(const std::string &szName)
-{
-    return "<11>raid_remove.cpp:# Failed to zero RAID superblock '/dev/" + szName +
-           "'\n"
-           "<11>raid_remove.cpp:# Failed to clean suerblock of '/dev/" +
-           szName + "'\n";
-}
 
 // A map as a caller makes it, in the order of the pairs.
 PNLIBHASH MapOf(const std::vector<std::pair<std::string, std::string>> &pairs)
@@ -59,12 +39,12 @@ std::string KeysOf(const NLIBHASH *pMap)
 
 // ---- one command -------------------------------------------------------------------------------
 
-struct STEP_CASE {
+struct COMMAND_CASE {
     TOOL_ANSWER answer;
     int result;
 };
 
-const STEP_CASE STEP_CASES[] = {
+const COMMAND_CASE COMMAND_CASES[] = {
     {{}, 0},
     {{.szErr = "mdadm: stopped\n"}, 0}, // only the status counts
     {{.status = 1}, -1},
@@ -72,199 +52,159 @@ const STEP_CASE STEP_CASES[] = {
     {{.signal = SIGKILL}, -1},
 };
 
-TEST(RAIDStop, IsOneCommand)
+const STEP STOP_TOLD = {"<11>raid_remove.cpp:# Failed to mdadm stop '/dev/md2'"};
+const STEP ZERO_TOLD = {"<11>raid_remove.cpp:# Failed to zero RAID superblock '/dev/sda3'"};
+
+long long Stop()
 {
-    for (const STEP_CASE &row : STEP_CASES) {
-        MACHINE machine = MachineMake();
-        MachineTool(machine, STOP_MD2, row.answer);
-        const RUN_RESULT result = MachineCall(machine, [&row] {
-            RecordReset();
-            EXPECT_EQ(RAIDStop("/dev/md2"), row.result);
-            EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
-        });
-        EXPECT_EQ(LogText(result),
-                  row.result == 0 ? "" : "<11>raid_remove.cpp:# Failed to mdadm stop '/dev/md2'\n");
+    return RAIDStop("/dev/md2");
+}
+
+long long Zero()
+{
+    return RAIDZeroSuperblock("/dev/sda3");
+}
+
+TEST(RAIDRemove, StopAndZeroAreOneCommandEach)
+{
+    for (const COMMAND_CASE &row : COMMAND_CASES) {
+        SCOPED_TRACE(testing::Message() << row.answer.status << row.answer.szErr);
+        const STEPS stop = {{STOP_MD2, row.answer}};
+        const STEPS zero = {{"/sbin/mdadm --zero-superblock /dev/sda3", row.answer}};
+        ExpectCalls({{.szName = "stop",
+                      .call = Stop,
+                      .result = row.result,
+                      .steps = row.result == 0 ? stop : stop + STEPS{STOP_TOLD}},
+                     {.szName = "zero",
+                      .call = Zero,
+                      .result = row.result,
+                      .steps = row.result == 0 ? zero : zero + STEPS{ZERO_TOLD}}});
     }
 }
 
-TEST(RAIDZeroSuperblock, IsOneCommand)
+TEST(RAIDRemove, AToolThatCannotBeRunFails)
 {
-    for (const STEP_CASE &row : STEP_CASES) {
-        MACHINE machine = MachineMake();
-        MachineTool(machine, WipeCommand("sda3"), row.answer);
-        const RUN_RESULT result = MachineCall(machine, [&row] {
-            RecordReset();
-            EXPECT_EQ(RAIDZeroSuperblock("/dev/sda3"), row.result);
-            EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
-        });
-        EXPECT_EQ(LogText(result),
-                  row.result == 0
-                      ? ""
-                      : "<11>raid_remove.cpp:# Failed to zero RAID superblock '/dev/sda3'\n");
-    }
-}
-
-TEST(RAIDStop, FailsWithTheCodeOfTheRunner)
-{
-    MACHINE machine = MachineMake();
-    machine.faults = {{.szFunction = "pipe2", .error = EMFILE}};
-    const RUN_RESULT result = MachineCall(machine, [] {
-        EXPECT_EQ(RAIDStop("/dev/md2"), -1);
-        EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER); // of the stream that is not there
-    });
-    EXPECT_EQ(LogText(result), "<11>raid_remove.cpp:# Failed to mdadm stop '/dev/md2'\n");
-    EXPECT_EQ(TranscriptText(result), "fault pipe2 1\n");
-}
-
-TEST(RAIDStop, AMissingToolFails)
-{
-    MACHINE machine = MachineMake();
-    machine.tools["/sbin/mdadm"] = TOOL_KIND::MISSING;
-    const RUN_RESULT result = MachineCall(machine, [] {
-        EXPECT_EQ(RAIDStop("/dev/md2"), -1);
-        EXPECT_EQ(RAIDZeroSuperblock("/dev/sda3"), -1);
-    });
-    EXPECT_EQ(LogText(result),
-              "<11>raid_remove.cpp:# Failed to mdadm stop '/dev/md2'\n"
-              "<11>raid_remove.cpp:# Failed to zero RAID superblock '/dev/sda3'\n");
-}
-
-TEST(RAIDRemove, BadArgumentsAreToldAndRunNothing)
-{
-    const RUN_RESULT result = MachineCall(MachineWithMirror(), [] {
-        const RAID_INFO info = RecordOf("/dev/md2");
-        RecordReset();
-        EXPECT_EQ(RAIDRemoveByInfo(nullptr), -1);
-        EXPECT_EQ(RAIDRemove(nullptr, nullptr), -1);
-        EXPECT_EQ(RAIDStop(nullptr), -1);
-        EXPECT_EQ(RAIDZeroSuperblock(nullptr), -1);
-        EXPECT_EQ(RAIDCleanSuperblock(nullptr, "uuid", nullptr), -1);
-        EXPECT_EQ(RAIDCleanSuperblock(&info, nullptr, nullptr), -1);
-        EXPECT_EQ(RAIDUUIDHashForRemoveGet(nullptr), -1);
-        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
-    });
-    std::string szExpected;
-    for (int i = 0; i < 7; i++) {
-        szExpected += "<11>raid_remove.cpp:# Bad parameters\n";
-    }
-    EXPECT_EQ(LogText(result), szExpected);
-    EXPECT_EQ(TranscriptText(result), "");
+    const MACHINE missing = WithTool(MachineMake(), "/sbin/mdadm", TOOL_KIND::MISSING);
+    ExpectCalls({{.szName = "no pipe",
+                  .machine = WithFault(MachineMake(), {.szFunction = "pipe2", .error = EMFILE}),
+                  .call = Stop,
+                  .result = -1,
+                  .code = ERR_BAD_PARAMETER, // of the stream that is not there
+                  .steps = {{"fault pipe2 1"}, STOP_TOLD}},
+                 {.szName = "nothing to stop with",
+                  .machine = missing,
+                  .call = Stop,
+                  .result = -1,
+                  .steps = {STOP_TOLD}},
+                 {.szName = "nothing to wipe with",
+                  .machine = missing,
+                  .call = Zero,
+                  .result = -1,
+                  .steps = {ZERO_TOLD}}});
 }
 
 // ---- the UUID of a running array ---------------------------------------------------------------
 
+// That of md2, in a buffer of so many bytes; what is behind them stays.
+long long UuidGet(const std::string &szExpected, int cbBuf = 64)
+{
+    char szUuid[65];
+    memset(szUuid, 'x', sizeof(szUuid));
+    const int result = RAIDUUIDGet("/dev/md2", szUuid, cbBuf);
+    EXPECT_EQ(szUuid[cbBuf], 'x');
+    szUuid[64] = '\0';
+    EXPECT_EQ(std::string(szUuid), result == 1 ? szExpected : std::string(64, 'x'));
+    return result;
+}
+
+long long UuidFail()
+{
+    return UuidGet("");
+}
+
 TEST(RAIDUUIDGet, IsThatOfTheMemberThatSortsLast)
 {
-    MACHINE machine = MachineWithMirror();
-    ExamineExpect(machine, "sdb3", UUID_MD2);
-    const RUN_RESULT result = MachineCall(machine, [] {
-        char szUuid[64] = "";
-        EXPECT_EQ(RAIDUUIDGet("/dev/md2", szUuid, sizeof(szUuid)), 1);
-        EXPECT_STREQ(szUuid, UUID_MD2);
-    });
-    EXPECT_EQ(LogText(result), "");
-    EXPECT_EQ(TranscriptText(result), "/sbin/mdadm -E /dev/sdb3\n");
+    const STEPS examined = {Examined("sdb3", UUID_MD2)};
+    ExpectCalls({{.szName = "whole",
+                  .machine = MachineWithMirror(),
+                  .call = [] { return UuidGet(UUID_MD2); },
+                  .result = 1,
+                  .steps = examined},
+                 {.szName = "cut to the buffer",
+                  .machine = MachineWithMirror(),
+                  .call = [] { return UuidGet("5b1f", 5); },
+                  .result = 1,
+                  .steps = examined},
+                 {.szName = "no room",
+                  .machine = MachineWithMirror(),
+                  .call = [] { return UuidGet("", 1); },
+                  .result = 1,
+                  .steps = examined}});
 }
 
-TEST(RAIDUUIDGet, IsCutToTheBuffer)
+TEST(RAIDUUIDGet, FailsWithoutAnArrayMembersOrASuperblock)
 {
-    MACHINE machine = MachineWithMirror();
-    ExamineExpect(machine, "sdb3", UUID_MD2, 2);
-    MachineCall(machine, [] {
-        char szUuid[8] = "xxxxxxx";
-        EXPECT_EQ(RAIDUUIDGet("/dev/md2", szUuid, 5), 1);
-        EXPECT_STREQ(szUuid, "5b1f");
-        EXPECT_EQ(szUuid[5], 'x');
-        EXPECT_EQ(RAIDUUIDGet("/dev/md2", szUuid, 1), 1);
-        EXPECT_STREQ(szUuid, "");
-    });
-}
-
-TEST(RAIDUUIDGet, BadArgumentsSetACodeAndRunNothing)
-{
-    const RUN_RESULT result = MachineCall(MachineWithMirror(), [] {
-        char szUuid[64] = "before";
-        const auto refused = [&szUuid](const char *szMd, char *szBuf, int cbBuf) {
-            RecordReset();
-            EXPECT_EQ(RAIDUUIDGet(szMd, szBuf, cbBuf), -1);
-            EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
-            EXPECT_STREQ(szUuid, "before");
-        };
-        refused(nullptr, szUuid, sizeof(szUuid));
-        refused("/dev/md2", nullptr, sizeof(szUuid));
-        refused("/dev/md2", szUuid, 0);
-        refused("/dev/md2", szUuid, -1);
-        refused("/dev/md2", szUuid, INT_MIN);
-    });
-    EXPECT_EQ(LogText(result), "");
-    EXPECT_EQ(TranscriptText(result), "");
-}
-
-TEST(RAIDUUIDGet, AnArrayThatCannotBeAskedFails)
-{
-    const RUN_RESULT result = MachineCall(MachineMake(), [] {
-        char szUuid[64] = "before";
-        EXPECT_EQ(RAIDUUIDGet("/dev/md2", szUuid, sizeof(szUuid)), -1);
-        EXPECT_EQ(NLIBCErrGet(), ERR_OPEN_FAILED);
-        EXPECT_STREQ(szUuid, "before");
-    });
-    EXPECT_EQ(LogText(result),
-              "<15>raid_info.cpp:# Failed to open /dev/md2, errno=No such file or directory\n"
-              "<11>raid_remove.cpp:# Failed to get RAID info [/dev/md2], ret = -1\n");
-}
-
-// The driver's "no such device" ends up as a plain failure.
-TEST(RAIDUUIDGet, AnArrayThatDoesNotRunFails)
-{
-    MACHINE machine = MachineWithMirror();
-    machine.arrays[0].errnoInfo = ENODEV;
-    const RUN_RESULT result = MachineCall(machine, [] {
-        char szUuid[64] = "before";
-        EXPECT_EQ(RAIDUUIDGet("/dev/md2", szUuid, sizeof(szUuid)), -1);
-        EXPECT_EQ(NLIBCErrGet(), ERR_SYSCALL_FAILED);
-    });
-    EXPECT_EQ(LogText(result),
-              "<15>raid_info.cpp:# Failed to ioctl for raid status, errno=No such device\n"
-              "<15>raid_info.cpp:# Failed to ioctl for raid status, errno=0X8000\n"
-              "<11>raid_remove.cpp:# Failed to get RAID info [/dev/md2], ret = -1\n");
-}
-
-TEST(RAIDUUIDGet, AnArrayWithoutMembersFails)
-{
-    MACHINE machine = MachineMake();
-    MachineMdAdd(machine, {.nMd = 2});
-    const RUN_RESULT result = MachineCall(machine, [] {
-        char szUuid[64] = "before";
-        EXPECT_EQ(RAIDUUIDGet("/dev/md2", szUuid, sizeof(szUuid)), -1);
-        EXPECT_EQ(NLIBCErrGet(), ERR_NO_MEMBER_DISK);
-        EXPECT_STREQ(szUuid, "before");
-    });
-    EXPECT_EQ(LogText(result), "");
-    EXPECT_EQ(TranscriptText(result), "");
-}
-
-TEST(RAIDUUIDGet, AMemberWithoutASuperblockFails)
-{
-    MACHINE machine = MachineWithMirror();
-    BlankMemberExpect(machine, "sdb3");
-    MachineTool(machine, ExamineCommand("sdb3"), {.szOut = "Version : none\n"});
-    const RUN_RESULT result = MachineCall(machine, [] {
-        char szUuid[64] = "before";
-        RecordReset();
-        EXPECT_EQ(RAIDUUIDGet("/dev/md2", szUuid, sizeof(szUuid)), -1);
-        EXPECT_EQ(RAIDUUIDGet("/dev/md2", szUuid, sizeof(szUuid)), -1);
-        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
-        EXPECT_STREQ(szUuid, "before");
-    });
-    EXPECT_EQ(LogText(result),
-              "<11>raid_remove.cpp:# Disk [/dev/sdb3] in RAID [/dev/md2] has no RAID superblock, "
-              "ret=0\n"
-              "<11>raid_superblock.cpp:# bad version format: 'none'.\n"
-              "<11>raid_remove.cpp:# Disk [/dev/sdb3] in RAID [/dev/md2] has no RAID superblock, "
-              "ret=-1\n");
+    const STEP told = {"<11>raid_remove.cpp:# Failed to get RAID info [/dev/md2], ret = -1"};
+    MACHINE inactive = MachineWithMirror();
+    inactive.arrays[0].errnoInfo = ENODEV;
+    MACHINE empty = MachineMake();
+    MachineMdAdd(empty, {.nMd = 2});
+    ExpectCalls(
+        {{.szName = "no array",
+          .call = UuidFail,
+          .result = -1,
+          .code = ERR_OPEN_FAILED,
+          .steps =
+              {{"<15>raid_info.cpp:# Failed to open /dev/md2, errno=No such file or directory"},
+               told}},
+         // The driver's "no such device" ends up as a plain failure.
+         {.szName = "inactive",
+          .machine = inactive,
+          .call = UuidFail,
+          .result = -1,
+          .code = ERR_SYSCALL_FAILED,
+          .steps = {{"<15>raid_info.cpp:# Failed to ioctl for raid status, errno=No such device"},
+                    {"<15>raid_info.cpp:# Failed to ioctl for raid status, errno=0X8000"},
+                    told}},
+         {.szName = "no members",
+          .machine = empty,
+          .call = UuidFail,
+          .result = -1,
+          .code = ERR_NO_MEMBER_DISK},
+         {.szName = "a blank member",
+          .machine = MachineWithMirror(),
+          .call = UuidFail,
+          .result = -1,
+          .steps = {ExaminedBlank("sdb3"),
+                    {"<11>raid_remove.cpp:# Disk [/dev/sdb3] in RAID [/dev/md2] has no RAID "
+                     "superblock, ret=0"}}},
+         {.szName = "a broken report",
+          .machine = MachineWithMirror(),
+          .call = UuidFail,
+          .result = -1,
+          .steps = {{"/sbin/mdadm -E /dev/sdb3", {.szOut = "Version : none\n"}},
+                    {"<11>raid_superblock.cpp:# bad version format: 'none'."},
+                    {"<11>raid_remove.cpp:# Disk [/dev/sdb3] in RAID [/dev/md2] has no RAID "
+                     "superblock, ret=-1"}}}});
 }
 
 // ---- the map -----------------------------------------------------------------------------------
+
+// Fills a fresh map, of which the body may say what is in it.
+long long MapFill(const std::function<void(const NLIBHASH *)> &body,
+                  const std::vector<std::pair<std::string, std::string>> &pairs = {})
+{
+    PNLIBHASH pMap = MapOf(pairs);
+    const int result = RAIDUUIDHashForRemoveGet(&pMap);
+    body(pMap);
+    NLIBCHashFree(pMap);
+    return result;
+}
+
+long long MapFillNothing()
+{
+    return MapFill([](const NLIBHASH *pMap) { EXPECT_EQ(pMap->nEntry, 0); });
+}
 
 TEST(RAIDUUIDHashForRemoveGet, ExaminesDataPartitionsOfSdDisksInByteOrder)
 {
@@ -277,43 +217,42 @@ TEST(RAIDUUIDHashForRemoveGet, ExaminesDataPartitionsOfSdDisksInByteOrder)
     MachineMdAdd(machine, {.nMd = 2});
     const std::vector<std::string> examined = {"isdc3", "isdc4", "sda10", "sda20",
                                                "sda3",  "sda4",  "sdb3",  "sdb4"};
-    std::string szExpected;
+    STEPS steps;
     for (const std::string &szName : examined) {
-        ExamineExpect(machine, szName, "uuid of " + szName);
-        szExpected += ExamineCommand(szName) + "\n";
+        steps.push_back(Examined(szName, "uuid of " + szName));
     }
-    const RUN_RESULT result = MachineCall(machine, [&examined] {
-        PNLIBHASH pMap = NLIBCHashAlloc(512);
-        EXPECT_EQ(RAIDUUIDHashForRemoveGet(&pMap), 0);
-        EXPECT_EQ(NLIBCHashKeyListGet(pMap, nullptr), 8);
+    const auto body = [&examined](const NLIBHASH *pMap) {
+        EXPECT_EQ(pMap->nEntry, 8);
         for (const std::string &szName : examined) {
             EXPECT_EQ(std::string(NLIBCHashGet(pMap, ("/dev/" + szName).c_str())),
                       "uuid of " + szName);
         }
-        NLIBCHashFree(pMap);
-    });
-    EXPECT_EQ(TranscriptText(result), szExpected);
-    EXPECT_EQ(LogText(result), "");
+    };
+    (void)ExpectCall({.szName = "seven disks",
+                      .machine = machine,
+                      .call = [&body] { return MapFill(body); },
+                      .steps = steps});
 }
 
 TEST(RAIDUUIDHashForRemoveGet, LeavesOutWhatHasNoSuperblock)
 {
     MACHINE machine = MachineMake();
     DiskWithPartitionsAdd(machine, "sda", 6);
-    BlankMemberExpect(machine, "sda3");
-    MachineTool(machine, ExamineCommand("sda4"),
-                {.szOut = "UUID : half read\nDevice Role : Journal\nUUID : never\n"});
-    MachineTool(machine, ExamineCommand("sda5"), {.szOut = "   MBR Magic : aa55\n"});
-    ExamineExpect(machine, "sda6", UUID_MD2);
-    const RUN_RESULT result = MachineCall(machine, [] {
-        PNLIBHASH pMap = NLIBCHashAlloc(512);
-        EXPECT_EQ(RAIDUUIDHashForRemoveGet(&pMap), 0);
+    const auto body = [](const NLIBHASH *pMap) {
         EXPECT_EQ(KeysOf(pMap), "/dev/sda6\n/dev/sda5\n"); // slots 2 and 17
         EXPECT_STREQ(NLIBCHashGet(pMap, "/dev/sda5"), ""); // a report, and no UUID in it
         EXPECT_STREQ(NLIBCHashGet(pMap, "/dev/sda6"), UUID_MD2);
-        NLIBCHashFree(pMap);
-    });
-    EXPECT_EQ(LogText(result), "<11>raid_superblock.cpp:# bad device order format: 'Journal'.\n");
+    };
+    (void)ExpectCall(
+        {.szName = "four reports",
+         .machine = machine,
+         .call = [&body] { return MapFill(body); },
+         .steps = {ExaminedBlank("sda3"),
+                   {"/sbin/mdadm -E /dev/sda4",
+                    {.szOut = "UUID : half read\nDevice Role : Journal\nUUID : never\n"}},
+                   {"<11>raid_superblock.cpp:# bad device order format: 'Journal'."},
+                   {"/sbin/mdadm -E /dev/sda5", {.szOut = "   MBR Magic : aa55\n"}},
+                   Examined("sda6", UUID_MD2)}});
 }
 
 TEST(RAIDUUIDHashForRemoveGet, AddsToTheMapAndFollowsIt)
@@ -325,99 +264,65 @@ TEST(RAIDUUIDHashForRemoveGet, AddsToTheMapAndFollowsIt)
     }
     MachineTool(machine, "/sbin/mdadm -E *", {.szOut = ReportOf(UUID_MD2), .nTimes = 30});
     MachineCall(machine, [] {
-        PNLIBHASH pMap = MapOf({{"/dev/sda3", "old"}, {"/dev/sdz3", "kept"}});
-        EXPECT_EQ(RAIDUUIDHashForRemoveGet(&pMap), 0);
-        EXPECT_EQ(pMap->nSlot, 119); // more than three quarters of 31 slots
-        EXPECT_EQ(pMap->nEntry, 31);
-        EXPECT_STREQ(NLIBCHashGet(pMap, "/dev/sda3"), UUID_MD2);
-        EXPECT_STREQ(NLIBCHashGet(pMap, "/dev/sde8"), UUID_MD2);
-        EXPECT_STREQ(NLIBCHashGet(pMap, "/dev/sdz3"), "kept");
-        NLIBCHashFree(pMap);
+        const auto body = [](const NLIBHASH *pMap) {
+            EXPECT_EQ(pMap->nSlot, 119); // more than three quarters of 31 slots
+            EXPECT_EQ(pMap->nEntry, 31);
+            EXPECT_STREQ(NLIBCHashGet(pMap, "/dev/sda3"), UUID_MD2);
+            EXPECT_STREQ(NLIBCHashGet(pMap, "/dev/sde8"), UUID_MD2);
+            EXPECT_STREQ(NLIBCHashGet(pMap, "/dev/sdz3"), "kept");
+        };
+        EXPECT_EQ(MapFill(body, {{"/dev/sda3", "old"}, {"/dev/sdz3", "kept"}}), 0);
     });
 }
 
-TEST(RAIDUUIDHashForRemoveGet, AMapThatRefusesAPairIsNoFailure)
+TEST(RAIDUUIDHashForRemoveGet, TellsAMachineWithoutPartitionsFromAFailure)
 {
-    MACHINE machine = MachineWithMirror();
-    ExamineExpect(machine, "sda3", UUID_MD2);
-    ExamineExpect(machine, "sdb3", UUID_MD2);
-    const RUN_RESULT result = MachineCall(machine, [] {
-        PNLIBHASH pMap = nullptr;
-        EXPECT_EQ(RAIDUUIDHashForRemoveGet(&pMap), 0);
-        EXPECT_EQ(pMap, nullptr);
-    });
-    EXPECT_EQ(LogText(result), "");
-}
-
-TEST(RAIDUUIDHashForRemoveGet, FailsWithoutTheKernelsList)
-{
-    MACHINE machine = MachineMake();
-    MachineRemove(machine, "/proc/partitions");
-    const RUN_RESULT result = MachineCall(machine, [] {
-        PNLIBHASH pMap = NLIBCHashAlloc(512);
-        EXPECT_EQ(RAIDUUIDHashForRemoveGet(&pMap), -1);
-        EXPECT_EQ(NLIBCErrGet(), ERR_OPEN_FAILED);
-        EXPECT_EQ(pMap->nEntry, 0);
-        NLIBCHashFree(pMap);
-    });
-    EXPECT_EQ(LogText(result),
-              "<11>partition_enum.cpp:# Failed to read line of /proc/partitions, errno=0x900\n"
-              "<11>raid_remove.cpp:# Fail to enum partition path\n");
-}
-
-TEST(RAIDUUIDHashForRemoveGet, AMachineWithoutPartitionsIsNoFailure)
-{
-    MACHINE machine = MachineMake();
-    MachineFile(machine, "/proc/partitions", "\n");
-    const RUN_RESULT result = MachineCall(machine, [] {
-        PNLIBHASH pMap = NLIBCHashAlloc(512);
-        EXPECT_EQ(RAIDUUIDHashForRemoveGet(&pMap), 0);
-        EXPECT_EQ(pMap->nEntry, 0);
-        NLIBCHashFree(pMap);
-    });
-    EXPECT_EQ(LogText(result), "");
-}
-
-TEST(RAIDUUIDHashForRemoveGet, FailsWithoutMemoryForItsList)
-{
-    MACHINE machine = MachineWithMirror();
-    machine.faults = {{.szFunction = "malloc"}};
-    PNLIBHASH pMap = NLIBCHashAlloc(512);
-    const RUN_RESULT result = MachineCall(machine, [&pMap] {
-        EXPECT_EQ(RAIDUUIDHashForRemoveGet(&pMap), -1);
-        EXPECT_EQ(NLIBCErrGet(), ERR_OUT_OF_MEMORY);
-    });
-    NLIBCHashFree(pMap);
-    EXPECT_EQ(LogText(result), "<11>raid_remove.cpp:# Fail to alloc RAID UUID list\n");
-    EXPECT_EQ(TranscriptText(result), "fault malloc 1\n");
+    ExpectCalls(
+        {{.szName = "a map that refuses a pair",
+          .machine = MachineWithMirror(),
+          .call =
+              [] {
+                  PNLIBHASH pMap = nullptr;
+                  const int result = RAIDUUIDHashForRemoveGet(&pMap);
+                  EXPECT_EQ(pMap, nullptr);
+                  return result;
+              },
+          .steps = {Examined("sda3", UUID_MD2), Examined("sdb3", UUID_MD2)}},
+         {.szName = "no partitions",
+          .machine = WithFile(MachineMake(), "/proc/partitions", "\n"),
+          .call = MapFillNothing},
+         {.szName = "no list of the kernel",
+          .machine = Without(MachineMake(), "/proc/partitions"),
+          .call = MapFillNothing,
+          .result = -1,
+          .code = ERR_OPEN_FAILED,
+          .steps = {
+              {"<11>partition_enum.cpp:# Failed to read line of /proc/partitions, errno=0x900"},
+              {"<11>raid_remove.cpp:# Fail to enum partition path"}}}});
 }
 
 // ---- cleaning ----------------------------------------------------------------------------------
+
+long long Clean(const char *szUuid = UUID_MD2, PNLIBHASH pMap = nullptr)
+{
+    const RAID_INFO info = {};
+    return RAIDCleanSuperblock(&info, szUuid, pMap);
+}
 
 // The home slots of sda3, sdb3, ... sdp3 are 16, 17, ... 31, and the last is slot 0 of 31.
 TEST(RAIDCleanSuperblock, WipesInTheOrderOfTheMap)
 {
     MACHINE machine = MachineMake();
-    for (const char *const szDisk : {"sda", "sdb", "sdo", "sdp", "sdq"}) {
+    STEPS steps;
+    for (const std::string szDisk : {"sda", "sdb", "sdo", "sdp", "sdq"}) {
         DiskWithPartitionsAdd(machine, szDisk, 3);
-        ExamineExpect(machine, std::string(szDisk) + "3", UUID_MD2);
-        MachineTool(machine, WipeCommand(std::string(szDisk) + "3"));
+        steps.push_back(Examined(szDisk + "3", UUID_MD2));
     }
-    const RUN_RESULT result = MachineCall(machine, [] {
-        const RAID_INFO info = {};
-        RecordReset();
-        EXPECT_EQ(RAIDCleanSuperblock(&info, UUID_MD2, nullptr), 0);
-        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
-    });
-    EXPECT_EQ(
-        TranscriptText(result),
-        Lines({"/sbin/mdadm -E /dev/sda3", "/sbin/mdadm -E /dev/sdb3", "/sbin/mdadm -E /dev/sdo3",
-               "/sbin/mdadm -E /dev/sdp3", "/sbin/mdadm -E /dev/sdq3",
-               "/sbin/mdadm --zero-superblock /dev/sdp3", "/sbin/mdadm --zero-superblock /dev/sdq3",
-               "/sbin/mdadm --zero-superblock /dev/sda3", "/sbin/mdadm --zero-superblock /dev/sdb3",
-               "/sbin/mdadm --zero-superblock /dev/sdo3"}));
-    EXPECT_EQ(LogText(result), WipedTold("sdp3") + WipedTold("sdq3") + WipedTold("sda3") +
-                                   WipedTold("sdb3") + WipedTold("sdo3"));
+    (void)ExpectCall({.szName = "five disks",
+                      .machine = machine,
+                      .call = [] { return Clean(); },
+                      .steps = steps + Wiped("sdp3") + Wiped("sdq3") + Wiped("sda3") +
+                               Wiped("sdb3") + Wiped("sdo3")});
 }
 
 // Twenty-five members: the table has grown to 119 slots, and the order is that of the new table.
@@ -428,363 +333,234 @@ TEST(RAIDCleanSuperblock, WipesEveryMemberOfALargeArray)
     MACHINE machine = MachineMake();
     machine.msBound = MANY_COMMANDS_MS;
     DiskWithPartitionsAdd(machine, "sda", 27);
+    // The order of the questions is told elsewhere.
     MachineTool(machine, "/sbin/mdadm -E *", {.szOut = ReportOf(UUID_MD2), .nTimes = 25});
-    std::string szExpected;
+    STEPS wiped;
     for (const int nPartition : ORDER) {
-        const std::string szName = "sda" + std::to_string(nPartition);
-        MachineTool(machine, WipeCommand(szName));
-        szExpected += WipedTold(szName);
+        wiped = wiped + Wiped("sda" + std::to_string(nPartition));
     }
-    const RUN_RESULT result = MachineCall(machine, [] {
-        const RAID_INFO info = {};
-        EXPECT_EQ(RAIDCleanSuperblock(&info, UUID_MD2, nullptr), 0);
-    });
-    EXPECT_EQ(LogText(result), szExpected);
+    StepsExpect(machine, wiped);
+    RUN_RESULT result = MachineCall(machine, [] { EXPECT_EQ(Clean(), 0); });
+    result.events.erase(result.events.begin(), result.events.begin() + 25);
+    ExpectSteps(result, wiped);
 }
 
 TEST(RAIDCleanSuperblock, ComparesWholeUuids)
 {
     MACHINE machine = MachineMake();
     DiskWithPartitionsAdd(machine, "sda", 8);
-    ExamineExpect(machine, "sda3", "aa:bb");
-    ExamineExpect(machine, "sda4", "aa:b");
-    ExamineExpect(machine, "sda5", "aa:bbb");
-    ExamineExpect(machine, "sda6", "AA:BB");
-    ExamineExpect(machine, "sda7", "");
-    ExamineExpect(machine, "sda8", "aa:bb (local to host box)");
-    MachineTool(machine, WipeCommand("sda3"));
-    MachineTool(machine, WipeCommand("sda8"));
-    const RUN_RESULT result = MachineCall(machine, [] {
-        const RAID_INFO info = {};
-        EXPECT_EQ(RAIDCleanSuperblock(&info, "aa:bb", nullptr), 0);
-    });
-    EXPECT_EQ(LogText(result), WipedTold("sda8") + WipedTold("sda3")); // slots 3 and 16
+    (void)ExpectCall(
+        {.szName = "six UUIDs",
+         .machine = machine,
+         .call = [] { return Clean("aa:bb"); },
+         .steps = STEPS{Examined("sda3", "aa:bb"), Examined("sda4", "aa:b"),
+                        Examined("sda5", "aa:bbb"), Examined("sda6", "AA:BB"), Examined("sda7", ""),
+                        Examined("sda8", "aa:bb (local to host box)")} +
+                  Wiped("sda8") + Wiped("sda3")}); // slots 3 and 16
 }
 
 TEST(RAIDCleanSuperblock, AnEmptyUuidIsAValueLikeAnyOther)
 {
     MACHINE machine = MachineMake();
     DiskWithPartitionsAdd(machine, "sda", 5);
-    ExamineExpect(machine, "sda3", UUID_MD2);
-    MachineTool(machine, ExamineCommand("sda4"), {.szOut = "   MBR Magic : aa55\n"});
-    BlankMemberExpect(machine, "sda5");
-    MachineTool(machine, WipeCommand("sda4"));
-    const RUN_RESULT result = MachineCall(machine, [] {
-        const RAID_INFO info = {};
-        EXPECT_EQ(RAIDCleanSuperblock(&info, "", nullptr), 0);
-    });
-    EXPECT_EQ(LogText(result), WipedTold("sda4"));
+    (void)ExpectCall(
+        {.szName = "no UUID",
+         .machine = machine,
+         .call = [] { return Clean(""); },
+         .steps = STEPS{Examined("sda3", UUID_MD2),
+                        {"/sbin/mdadm -E /dev/sda4", {.szOut = "   MBR Magic : aa55\n"}},
+                        ExaminedBlank("sda5")} +
+                  Wiped("sda4")});
 }
 
 TEST(RAIDCleanSuperblock, AFailedWipeLeavesTheLaterOnesUntouched)
 {
     MACHINE machine = MachineMake();
     DiskWithPartitionsAdd(machine, "sda", 5);
-    for (const char *const szName : {"sda3", "sda4", "sda5"}) {
-        ExamineExpect(machine, szName, UUID_MD2);
-    }
     // Slots 1, 16 and 17: the second of three.
-    MachineTool(machine, WipeCommand("sda4"));
-    MachineTool(machine, WipeCommand("sda3"), {.szErr = "mdadm: busy\n", .status = 1});
-    const RUN_RESULT result = MachineCall(machine, [] {
-        const RAID_INFO info = {};
-        RecordReset();
-        EXPECT_EQ(RAIDCleanSuperblock(&info, UUID_MD2, nullptr), -1);
-        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
-    });
-    EXPECT_EQ(LogText(result), WipedTold("sda4") + WipeFailedTold("sda3"));
-    EXPECT_EQ(OperationErrors(), "<time> command=\"/sbin/mdadm --zero-superblock /dev/sda3\" "
-                                 "Error=\"mdadm: busy \"\n");
+    (void)ExpectCall({.szName = "the second fails",
+                      .machine = machine,
+                      .call = [] { return Clean(); },
+                      .result = -1,
+                      .steps = STEPS{Examined("sda3", UUID_MD2), Examined("sda4", UUID_MD2),
+                                     Examined("sda5", UUID_MD2)} +
+                               Wiped("sda4") +
+                               WipeFailed("sda3", {.szErr = "mdadm: busy\n", .status = 1})});
+    EXPECT_EQ(OperationErrors(),
+              "Nov 05 01:02:03 command=\"/sbin/mdadm --zero-superblock /dev/sda3\" "
+              "Error=\"mdadm: busy \"\n");
 }
 
 TEST(RAIDCleanSuperblock, TakesTheCallersMapAndLeavesItToHim)
 {
-    MACHINE machine = MachineWithMirror();
-    MachineTool(machine, WipeCommand("sdb3"));
-    const RUN_RESULT result = MachineCall(machine, [] {
+    const auto cleanBy = [] {
         PNLIBHASH pMap = MapOf({{"/dev/sda3", UUID_MD3}, {"/dev/sdb3", UUID_MD2}});
-        const RAID_INFO info = {};
-        EXPECT_EQ(RAIDCleanSuperblock(&info, UUID_MD2, pMap), 0);
+        const long long result = Clean(UUID_MD2, pMap);
         EXPECT_EQ(KeysOf(pMap), "/dev/sda3\n/dev/sdb3\n");
         NLIBCHashFree(pMap);
-    });
-    EXPECT_EQ(TranscriptText(result), WipeCommand("sdb3") + "\n");
-}
-
-TEST(RAIDCleanSuperblock, AnEmptyMapIsNoFailure)
-{
-    const RUN_RESULT result = MachineCall(MachineWithMirror(), [] {
+        return result;
+    };
+    const auto cleanByEmpty = [] {
         PNLIBHASH pMap = NLIBCHashAlloc(512);
-        const RAID_INFO info = {};
-        EXPECT_EQ(RAIDCleanSuperblock(&info, UUID_MD2, pMap), 0);
+        const long long result = Clean(UUID_MD2, pMap);
         NLIBCHashFree(pMap);
-    });
-    EXPECT_EQ(LogText(result), "");
-    EXPECT_EQ(TranscriptText(result), "");
+        return result;
+    };
+    ExpectCalls({{.szName = "a map of two",
+                  .machine = MachineWithMirror(),
+                  .call = cleanBy,
+                  .steps = Wiped("sdb3")},
+                 {.szName = "an empty map", .machine = MachineWithMirror(), .call = cleanByEmpty}});
 }
 
-TEST(RAIDCleanSuperblock, FailsWhenTheMapCannotBeFilled)
+TEST(RAIDCleanSuperblock, FailsWhenListOrMapCannotBeMadeOrFilled)
 {
-    MACHINE machine = MachineMake();
-    MachineFile(machine, "/proc/partitions", "");
-    const RUN_RESULT result = MachineCall(machine, [] {
-        const RAID_INFO info = {};
-        RecordReset();
-        EXPECT_EQ(RAIDCleanSuperblock(&info, UUID_MD2, nullptr), -1);
-        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
-    });
-    EXPECT_EQ(LogText(result), "<11>partition_enum.cpp:# There's no line in /proc/partitions\n"
-                               "<11>raid_remove.cpp:# Fail to enum partition path\n"
-                               "<11>raid_remove.cpp:# Fail to get RAID UUID hash\n");
-    EXPECT_EQ(TranscriptText(result), "");
-}
-
-struct MEMORY_CASE {
-    const char *szFunction;
-    const char *szLog;
-};
-
-constexpr MEMORY_CASE MEMORY_CASES[] = {
-    {"malloc", "<11>raid_remove.cpp:# Fail to alloc RAID UUID list\n"},
-    {"calloc", "<11>raid_remove.cpp:# Fail to alloc RAID UUID hash\n"},
-};
-
-TEST(RAIDCleanSuperblock, FailsWithoutMemoryForListOrMap)
-{
-    for (const MEMORY_CASE &row : MEMORY_CASES) {
-        MACHINE machine = MachineWithMirror();
-        machine.faults = {{.szFunction = row.szFunction}};
-        const RUN_RESULT result = MachineCall(machine, [] {
-            const RAID_INFO info = {};
-            EXPECT_EQ(RAIDCleanSuperblock(&info, UUID_MD2, nullptr), -1);
-            EXPECT_EQ(NLIBCErrGet(), ERR_OUT_OF_MEMORY);
-        });
-        EXPECT_EQ(LogText(result), row.szLog);
-        EXPECT_EQ(TranscriptText(result), std::string("fault ") + row.szFunction + " 1\n");
-    }
-}
-
-TEST(RAIDCleanSuperblock, FailsWhenTheKeysDoNotFit)
-{
-    MACHINE machine = MachineMake();
-    machine.faults = {{.szFunction = "malloc", .nCall = 2}}; // the first is the list itself
     PNLIBHASH pMap = MapOf({{std::string(300, 'a'), UUID_MD2}, {std::string(300, 'b'), UUID_MD2}});
-    const RUN_RESULT result = MachineCall(machine, [pMap] {
-        const RAID_INFO info = {};
-        EXPECT_EQ(RAIDCleanSuperblock(&info, UUID_MD2, pMap), -1);
-        EXPECT_EQ(NLIBCErrGet(), ERR_OUT_OF_MEMORY);
-        EXPECT_EQ(pMap->nEntry, 2);
-    });
+    ExpectCalls(
+        {{.szName = "no partitions",
+          .machine = WithFile(MachineMake(), "/proc/partitions", ""),
+          .call = [] { return Clean(); },
+          .result = -1,
+          .steps = {{"<11>partition_enum.cpp:# There's no line in /proc/partitions"},
+                    {"<11>raid_remove.cpp:# Fail to enum partition path"},
+                    {"<11>raid_remove.cpp:# Fail to get RAID UUID hash"}}},
+         {.szName = "no list",
+          .machine = WithFault(MachineWithMirror(), {.szFunction = "malloc"}),
+          .call = [] { return Clean(); },
+          .result = -1,
+          .code = ERR_OUT_OF_MEMORY,
+          .steps = {{"fault malloc 1"}, {"<11>raid_remove.cpp:# Fail to alloc RAID UUID list"}}},
+         {.szName = "no map",
+          .machine = WithFault(MachineWithMirror(), {.szFunction = "calloc"}),
+          .call = [] { return Clean(); },
+          .result = -1,
+          .code = ERR_OUT_OF_MEMORY,
+          .steps = {{"fault calloc 1"}, {"<11>raid_remove.cpp:# Fail to alloc RAID UUID hash"}}},
+         {.szName = "no list of the map's own",
+          .machine = WithFault(MachineWithMirror(), {.szFunction = "malloc"}),
+          .call = [&pMap] { return RAIDUUIDHashForRemoveGet(&pMap); },
+          .result = -1,
+          .code = ERR_OUT_OF_MEMORY,
+          .steps = {{"fault malloc 1"}, {"<11>raid_remove.cpp:# Fail to alloc RAID UUID list"}}},
+         {.szName = "keys that do not fit", // the first is the list itself
+          .machine = WithFault(MachineMake(), {.szFunction = "malloc", .nCall = 2}),
+          .call = [pMap] { return Clean(UUID_MD2, pMap); },
+          .result = -1,
+          .code = ERR_OUT_OF_MEMORY,
+          .steps = {{"fault malloc 2"}, {"<11>raid_remove.cpp:# Fail to get hash key list"}}}});
+    EXPECT_EQ(pMap->nEntry, 2);
     NLIBCHashFree(pMap);
-    EXPECT_EQ(LogText(result), "<11>raid_remove.cpp:# Fail to get hash key list\n");
-    EXPECT_EQ(TranscriptText(result), "fault malloc 2\n");
 }
 
 // ---- removing ----------------------------------------------------------------------------------
 
-TEST(RAIDRemove, StopsThenCleans)
+// What a mirror's removal does, when its record has this UUID.
+void ExpectRemoval(const char *szName, const STEPS &steps, const std::string &szUuid = "",
+                   int result = 0, const MACHINE &machine = MachineWithMirror(),
+                   u32 code = OLD_CODE)
 {
-    MACHINE machine = MachineWithMirror();
-    ExamineExpect(machine, "sdb3", UUID_MD2, 2);
-    MachineTool(machine, STOP_MD2);
-    ExamineExpect(machine, "sda3", UUID_MD2);
-    MachineTool(machine, WipeCommand("sda3"));
-    MachineTool(machine, WipeCommand("sdb3"));
-    const RUN_RESULT result = MachineCall(machine, [] {
-        const RAID_INFO info = RecordOf("/dev/md2");
-        RecordReset();
-        EXPECT_EQ(RAIDRemoveByInfo(&info), 0);
-        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
-    });
-    EXPECT_EQ(TranscriptText(result), Lines({"/sbin/mdadm -E /dev/sdb3", "/sbin/mdadm -S /dev/md2",
-                                             "/sbin/mdadm -E /dev/sda3", "/sbin/mdadm -E /dev/sdb3",
-                                             "/sbin/mdadm --zero-superblock /dev/sda3",
-                                             "/sbin/mdadm --zero-superblock /dev/sdb3"}));
-    EXPECT_EQ(LogText(result), CLEAN_TOLD + WipedTold("sda3") + WipedTold("sdb3"));
+    const auto call = [&szUuid] {
+        const RAID_INFO info = RecordOf("/dev/md2", szUuid);
+        return RAIDRemoveByInfo(&info);
+    };
+    (void)ExpectCall({.szName = szName,
+                      .machine = machine,
+                      .call = call,
+                      .result = result,
+                      .code = code,
+                      .steps = steps});
 }
 
-TEST(RAIDRemove, TakesTheUuidOfTheRecord)
+TEST(RAIDRemove, StopsThenCleans)
 {
-    MACHINE machine = MachineWithMirror();
-    MachineTool(machine, STOP_MD2);
-    ExamineExpect(machine, "sda3", UUID_MD2);
-    ExamineExpect(machine, "sdb3", UUID_MD3);
-    MachineTool(machine, WipeCommand("sdb3"));
-    const RUN_RESULT result = MachineCall(machine, [] {
-        const RAID_INFO info = RecordOf("/dev/md2", UUID_MD3);
-        EXPECT_EQ(RAIDRemove(&info, nullptr), 0);
-    });
-    EXPECT_EQ(TranscriptText(result),
-              Lines({"/sbin/mdadm -S /dev/md2", "/sbin/mdadm -E /dev/sda3",
-                     "/sbin/mdadm -E /dev/sdb3", "/sbin/mdadm --zero-superblock /dev/sdb3"}));
-    EXPECT_EQ(LogText(result), CLEAN_TOLD + WipedTold("sdb3"));
+    ExpectRemoval("a mirror", STEPS{Examined("sdb3", UUID_MD2), {STOP_MD2}} + MirrorWiped());
 }
 
 // As many characters as a report's UUID can have, and all of them count.
-TEST(RAIDRemove, TakesTheWholeUuidOfTheRecord)
+TEST(RAIDRemove, TakesTheWholeUuidOfTheRecordElseOfTheMember)
 {
     const std::string szUuid = std::string(62, 'a') + "b";
-    MACHINE machine = MachineWithMirror();
-    MachineTool(machine, STOP_MD2);
-    ExamineExpect(machine, "sda3", std::string(62, 'a') + "c");
-    ExamineExpect(machine, "sdb3", szUuid);
-    MachineTool(machine, WipeCommand("sdb3"));
-    const RUN_RESULT result = MachineCall(machine, [&szUuid] {
-        const RAID_INFO info = RecordOf("/dev/md2", szUuid);
-        EXPECT_EQ(RAIDRemove(&info, nullptr), 0);
-    });
-    EXPECT_EQ(LogText(result), CLEAN_TOLD + WipedTold("sdb3"));
-}
-
-TEST(RAIDRemove, TakesTheWholeUuidOfTheMember)
-{
-    const std::string szUuid = std::string(62, 'a') + "b";
-    MACHINE machine = MachineWithMirror();
-    ExamineExpect(machine, "sda3", std::string(62, 'a') + "c");
-    ExamineExpect(machine, "sdb3", szUuid, 2);
-    MachineTool(machine, STOP_MD2);
-    MachineTool(machine, WipeCommand("sdb3"));
-    const RUN_RESULT result = MachineCall(machine, [] {
-        const RAID_INFO info = RecordOf("/dev/md2");
-        EXPECT_EQ(RAIDRemove(&info, nullptr), 0);
-    });
-    EXPECT_EQ(LogText(result), CLEAN_TOLD + WipedTold("sdb3"));
+    const std::string szOther = std::string(62, 'a') + "c";
+    const STEPS cleaned =
+        STEPS{{STOP_MD2}, CLEAN_TOLD, Examined("sda3", szOther), Examined("sdb3", szUuid)} +
+        Wiped("sdb3");
+    ExpectRemoval("of the record", cleaned, szUuid);
+    ExpectRemoval("of the member", STEPS{Examined("sdb3", szUuid)} + cleaned);
 }
 
 TEST(RAIDRemove, TakesTheCallersMapAndLeavesItToHim)
 {
-    MACHINE machine = MachineWithMirror();
-    ExamineExpect(machine, "sdb3", UUID_MD2); // for the UUID alone
-    MachineTool(machine, STOP_MD2);
-    MachineTool(machine, WipeCommand("sdz9"));
-    const RUN_RESULT result = MachineCall(machine, [] {
+    const auto call = [] {
         PNLIBHASH pMap = MapOf({{"/dev/sda3", UUID_MD3}, {"/dev/sdz9", UUID_MD2}});
         const RAID_INFO info = RecordOf("/dev/md2");
-        EXPECT_EQ(RAIDRemove(&info, pMap), 0);
+        const int result = RAIDRemove(&info, pMap);
         EXPECT_STREQ(NLIBCHashGet(pMap, "/dev/sdz9"), UUID_MD2);
         NLIBCHashFree(pMap);
-    });
-    EXPECT_EQ(LogText(result), CLEAN_TOLD + WipedTold("sdz9"));
+        return result;
+    };
+    (void)ExpectCall(
+        {.szName = "for the UUID alone",
+         .machine = MachineWithMirror(),
+         .call = call,
+         .steps = STEPS{Examined("sdb3", UUID_MD2), {STOP_MD2}, CLEAN_TOLD} + Wiped("sdz9")});
 }
 
-TEST(RAIDRemove, AStopThatFailsTwiceIsTriedAgain)
+TEST(RAIDRemove, AStopIsTriedThreeTimes)
 {
-    MACHINE machine = MachineWithMirror();
-    MachineTool(machine, STOP_MD2, {.szErr = "mdadm: busy\n", .status = 1, .nTimes = 2});
-    MachineTool(machine, STOP_MD2);
-    ExamineExpect(machine, "sda3", UUID_MD2);
-    ExamineExpect(machine, "sdb3", UUID_MD2);
-    MachineTool(machine, WipeCommand("sda3"));
-    MachineTool(machine, WipeCommand("sdb3"));
-    const RUN_RESULT result = MachineCall(machine, [] {
-        const RAID_INFO info = RecordOf("/dev/md2", UUID_MD2);
-        EXPECT_EQ(RAIDRemoveByInfo(&info), 0);
-    });
-    EXPECT_EQ(TranscriptText(result),
-              Lines({STOP_MD2, "sleep 1", STOP_MD2, "sleep 1", STOP_MD2, "/sbin/mdadm -E /dev/sda3",
-                     "/sbin/mdadm -E /dev/sdb3", "/sbin/mdadm --zero-superblock /dev/sda3",
-                     "/sbin/mdadm --zero-superblock /dev/sdb3"}));
-    EXPECT_EQ(LogText(result), std::string(STOP_TOLD) + STOP_TOLD + CLEAN_TOLD + WipedTold("sda3") +
-                                   WipedTold("sdb3"));
+    const STEPS failed = StopFailed({.szErr = "mdadm: busy\n", .status = 1});
+    ExpectRemoval("twice", 2 * failed + STEPS{{STOP_MD2}} + MirrorWiped(), UUID_MD2);
     const std::string szError =
-        "<time> command=\"/sbin/mdadm -S /dev/md2\" Error=\"mdadm: busy \"\n";
+        "Nov 05 01:02:03 command=\"/sbin/mdadm -S /dev/md2\" Error=\"mdadm: busy \"\n";
     EXPECT_EQ(OperationErrors(), szError + szError);
-}
-
-TEST(RAIDRemove, AStopThatNeverSucceedsTouchesNoSuperblock)
-{
-    MACHINE machine = MachineWithMirror();
-    ExamineExpect(machine, "sdb3", UUID_MD2);
-    MachineTool(machine, STOP_MD2, {.status = 1, .nTimes = 3});
-    const RUN_RESULT result = MachineCall(machine, [] {
-        const RAID_INFO info = RecordOf("/dev/md2");
-        RecordReset();
-        EXPECT_EQ(RAIDRemoveByInfo(&info), -1);
-        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
-    });
-    EXPECT_EQ(TranscriptText(result), Lines({"/sbin/mdadm -E /dev/sdb3", STOP_MD2, "sleep 1",
-                                             STOP_MD2, "sleep 1", STOP_MD2, "sleep 1"}));
-    EXPECT_EQ(LogText(result), std::string(STOP_TOLD) + STOP_TOLD + STOP_TOLD + LIMIT_TOLD);
-    EXPECT_EQ(MachineFileRead("/var/log/space_operation_error.log"), std::nullopt);
+    ExpectRemoval("always", 3 * StopFailed({.status = 1}) + STEPS{LIMIT_TOLD}, UUID_MD2, -1);
+    EXPECT_EQ(OperationErrors(), "");
 }
 
 TEST(RAIDRemove, WithoutAUuidItOnlyStops)
 {
-    MACHINE machine = MachineWithMirror();
-    BlankMemberExpect(machine, "sdb3");
-    MachineTool(machine, STOP_MD2);
-    const RUN_RESULT result = MachineCall(machine, [] {
-        const RAID_INFO info = RecordOf("/dev/md2");
-        EXPECT_EQ(RAIDRemoveByInfo(&info), 0);
-    });
-    EXPECT_EQ(TranscriptText(result), Lines({"/sbin/mdadm -E /dev/sdb3", STOP_MD2}));
-    EXPECT_EQ(LogText(result), "<11>raid_remove.cpp:# Disk [/dev/sdb3] in RAID [/dev/md2] has no "
-                               "RAID superblock, ret=0\n");
-}
-
-TEST(RAIDRemove, AnArrayThatDoesNotRunIsStoppedAllTheSame)
-{
+    ExpectRemoval("a blank member",
+                  {ExaminedBlank("sdb3"),
+                   {"<11>raid_remove.cpp:# Disk [/dev/sdb3] in RAID [/dev/md2] has no RAID "
+                    "superblock, ret=0"},
+                   {STOP_MD2}});
     MACHINE machine = MachineMake();
     DiskWithPartitionsAdd(machine, "sda", 3);
-    MachineTool(machine, STOP_MD2);
-    const RUN_RESULT result = MachineCall(machine, [] {
-        const RAID_INFO info = RecordOf("/dev/md2");
-        EXPECT_EQ(RAIDRemoveByInfo(&info), 0);
-    });
-    EXPECT_EQ(TranscriptText(result), Lines({STOP_MD2}));
-    EXPECT_EQ(LogText(result),
-              "<15>raid_info.cpp:# Failed to open /dev/md2, errno=No such file or directory\n"
-              "<11>raid_remove.cpp:# Failed to get RAID info [/dev/md2], ret = -1\n");
+    ExpectRemoval("an array that does not run",
+                  {{"<15>raid_info.cpp:# Failed to open /dev/md2, errno=No such file or directory"},
+                   {"<11>raid_remove.cpp:# Failed to get RAID info [/dev/md2], ret = -1"},
+                   {STOP_MD2}},
+                  "", 0, machine, ERR_OPEN_FAILED);
 }
 
 TEST(RAIDRemove, AnEmptyUuidThatWasReadIsCleanedToo)
 {
-    MACHINE machine = MachineWithMirror();
-    MachineTool(machine, ExamineCommand("sdb3"), {.szOut = "   MBR Magic : aa55\n", .nTimes = 2});
-    ExamineExpect(machine, "sda3", UUID_MD2);
-    MachineTool(machine, STOP_MD2);
-    MachineTool(machine, WipeCommand("sdb3"));
-    const RUN_RESULT result = MachineCall(machine, [] {
-        const RAID_INFO info = RecordOf("/dev/md2");
-        EXPECT_EQ(RAIDRemoveByInfo(&info), 0);
-    });
-    EXPECT_EQ(LogText(result), CLEAN_TOLD + WipedTold("sdb3"));
+    const STEP examined = {"/sbin/mdadm -E /dev/sdb3", {.szOut = "   MBR Magic : aa55\n"}};
+    ExpectRemoval("no UUID",
+                  STEPS{examined, {STOP_MD2}, CLEAN_TOLD, Examined("sda3", UUID_MD2), examined} +
+                      Wiped("sdb3"));
 }
 
 TEST(RAIDRemove, ACleaningThatFailsIsNoFailure)
 {
-    MACHINE machine = MachineWithMirror();
-    MachineTool(machine, STOP_MD2);
-    ExamineExpect(machine, "sda3", UUID_MD2);
-    ExamineExpect(machine, "sdb3", UUID_MD2);
-    MachineTool(machine, WipeCommand("sda3"), {.signal = SIGKILL});
-    const RUN_RESULT result = MachineCall(machine, [] {
-        const RAID_INFO info = RecordOf("/dev/md2", UUID_MD2);
-        EXPECT_EQ(RAIDRemoveByInfo(&info), 0);
-    });
-    EXPECT_EQ(LogText(result), CLEAN_TOLD + WipeFailedTold("sda3"));
+    ExpectRemoval(
+        "killed",
+        STEPS{{STOP_MD2}, CLEAN_TOLD, Examined("sda3", UUID_MD2), Examined("sdb3", UUID_MD2)} +
+            WipeFailed("sda3", {.signal = SIGKILL}),
+        UUID_MD2);
 }
 
 TEST(RAIDRemove, MembersOfOtherArraysAreLeftAlone)
 {
     MACHINE machine = MachineMake();
-    for (const char *const szDisk : {"sda", "sdb"}) {
+    STEPS steps = {{STOP_MD2}, CLEAN_TOLD};
+    for (const std::string szDisk : {"sda", "sdb"}) {
         DiskWithPartitionsAdd(machine, szDisk, 5);
-        for (const char *const szNumber : {"3", "4", "5"}) {
-            ExamineExpect(machine, std::string(szDisk) + szNumber,
-                          *szNumber == '4' ? UUID_MD3 : UUID_MD2);
-        }
+        steps = steps + STEPS{Examined(szDisk + "3", UUID_MD2), Examined(szDisk + "4", UUID_MD3),
+                              Examined(szDisk + "5", UUID_MD2)};
     }
-    MachineTool(machine, STOP_MD2);
-    for (const char *const szName : {"sda3", "sda5", "sdb3", "sdb5"}) {
-        MachineTool(machine, WipeCommand(szName));
-    }
-    const RUN_RESULT result = MachineCall(machine, [] {
-        const RAID_INFO info = RecordOf("/dev/md2", UUID_MD2);
-        EXPECT_EQ(RAIDRemoveByInfo(&info), 0);
-    });
-    EXPECT_EQ(LogText(result), CLEAN_TOLD + WipedTold("sda3") + WipedTold("sda5") +
-                                   WipedTold("sdb3") + WipedTold("sdb5"));
+    ExpectRemoval("two arrays",
+                  steps + Wiped("sda3") + Wiped("sda5") + Wiped("sdb3") + Wiped("sdb5"), UUID_MD2,
+                  0, machine);
 }
 
 } // namespace

@@ -1,17 +1,14 @@
 // SPDX-License-Identifier: MIT
 #include "nurostoragecore/space.h"
 
-#include "last_error.h"
 #include "nurocore/error.h"
 #include "nurocore/types.h"
-#include "sandbox.h"
+#include "steps.h"
 
-#include <algorithm>
 #include <cerrno>
 #include <climits>
 #include <csignal>
 #include <cstdio>
-#include <ctime>
 #include <gtest/gtest.h>
 #include <linux/close_range.h>
 #include <optional>
@@ -23,64 +20,39 @@ namespace
 {
 
 constexpr char LOG_PATH[] = "/var/log/space_operation_error.log";
-constexpr char OPEN_FAILED[] = "<11>space.cpp:# Fail to open /var/log/space_operation_error.log\n";
-constexpr char STAMP_FORMAT[] = "%b %d %H:%M:%S";
-constexpr size_t STAMP_LENGTH = 15;
+constexpr char OPEN_FAILED[] = "<11>space.cpp:# Fail to open /var/log/space_operation_error.log";
 constexpr size_t LINE_LENGTH = 2047;
 
-// "Nov 05 07:08:09": what is read as a time and written again is the same text.
-bool IsStamp(const std::string &text)
+// A line as long as it may be; its end is cut.
+std::string CutLine(const std::string &line)
 {
-    struct tm fields = {};
-    const char *const pEnd = strptime(text.c_str(), STAMP_FORMAT, &fields);
-    char szAgain[32] = "";
-    (void)strftime(szAgain, sizeof(szAgain), STAMP_FORMAT, &fields);
-    return pEnd != nullptr && *pEnd == '\0' && text == szAgain;
-}
-
-// The lines of the error log without their time stamps, whose shape is checked here.
-std::vector<std::string> LinesOf(const std::optional<std::string> &log)
-{
-    std::vector<std::string> lines;
-    const std::string text = log.value_or("");
-    size_t start = 0;
-    for (size_t end = text.find('\n'); end != std::string::npos; end = text.find('\n', start)) {
-        EXPECT_TRUE(IsStamp(text.substr(start, STAMP_LENGTH))) << text;
-        const std::string line = text.substr(start, end - start);
-        lines.push_back(line.size() < STAMP_LENGTH ? line : line.substr(STAMP_LENGTH));
-        start = end + 1;
-    }
-    EXPECT_EQ(start, text.size()) << "the log ends within a line";
-    return lines;
-}
-
-std::vector<std::string> LinesOfLog()
-{
-    return LinesOf(MachineFileRead(LOG_PATH));
+    return line.substr(0, LINE_LENGTH) + "\n";
 }
 
 std::string Line(const std::string &command, const std::string &error)
 {
-    return " command=\"" + command + "\" Error=\"" + error + "\"";
+    return "Nov 05 01:02:03 command=\"" + command + "\" Error=\"" + error + "\"\n";
 }
 
-using LINES = std::vector<std::string>;
-
-// The text as a stream that ends.
-FILE *StreamOf(std::string &text)
+// Logs what a stream with the text says.
+int ErrorLogOf(std::string text, const char *szCommand)
 {
-    return text.empty() ? fopen("/dev/null", "r") : fmemopen(text.data(), text.size(), "r");
+    FILE *const pStream =
+        text.empty() ? fopen("/dev/null", "r") : fmemopen(text.data(), text.size(), "r");
+    const int result = SpaceErrorLog(pStream, szCommand);
+    EXPECT_NE(feof(pStream), 0);
+    (void)fclose(pStream);
+    return result;
 }
 
-RUN_RESULT ErrorLogOf(std::string text, const char *szCommand)
+// The machine's log after that, which succeeds.
+std::optional<std::string> LogAfter(const std::string &text, const char *szCommand,
+                                    const MACHINE &machine = MachineMake())
 {
-    return MachineCall(MachineMake(), [&text, szCommand] {
-        FILE *const pStream = StreamOf(text);
-        RecordReset();
-        EXPECT_EQ(SpaceErrorLog(pStream, szCommand), 0);
-        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
-        fclose(pStream);
-    });
+    (void)ExpectCall({.szName = "the log", .machine = machine, .call = [&] {
+                          return ErrorLogOf(text, szCommand);
+                      }});
+    return MachineFileRead(LOG_PATH);
 }
 
 // ---- the log line ------------------------------------------------------------------------------
@@ -110,44 +82,20 @@ TEST(SpaceErrorLog, AppendsOneLine)
 {
     for (const LINE_CASE &row : LINE_CASES) {
         SCOPED_TRACE(row.line);
-        const RUN_RESULT result = ErrorLogOf(row.text, row.szCommand);
-        EXPECT_EQ(LinesOfLog(), LINES{row.line});
-        EXPECT_EQ(LogText(result), "");
+        EXPECT_EQ(LogAfter(row.text, row.szCommand), "Nov 05 01:02:03" + row.line + "\n");
     }
 }
 
 TEST(SpaceErrorLog, LeavesTheLogAloneWhenThereIsNothing)
 {
-    const RUN_RESULT result = ErrorLogOf("", "/sbin/x");
-    EXPECT_EQ(MachineFileRead(LOG_PATH), std::nullopt);
-    EXPECT_EQ(LogText(result), "");
-
-    MACHINE machine = MachineMake();
-    MachineFile(machine, LOG_PATH, "older");
-    (void)MachineCall(machine, [] {
-        FILE *const pStream = fopen("/dev/null", "r");
-        EXPECT_EQ(SpaceErrorLog(pStream, "/sbin/x"), 0);
-        fclose(pStream);
-    });
-    EXPECT_EQ(MachineFileRead(LOG_PATH), "older");
+    EXPECT_EQ(LogAfter("", "/sbin/x"), std::nullopt);
+    EXPECT_EQ(LogAfter("", "/sbin/x", WithFile(MachineMake(), LOG_PATH, "older")), "older");
 }
 
 TEST(SpaceErrorLog, KeepsWhatTheLogHolds)
 {
-    MACHINE machine = MachineMake();
-    const std::string older = "Jan 01 00:00:00 older\n";
-    MachineFile(machine, LOG_PATH, older);
-    const RUN_RESULT result = MachineCall(machine, [] {
-        for (std::string text : {"first\n", "second\n"}) {
-            FILE *const pStream = StreamOf(text);
-            EXPECT_EQ(SpaceErrorLog(pStream, "/sbin/x"), 0);
-            fclose(pStream);
-        }
-    });
-    EXPECT_EQ(MachineFileRead(LOG_PATH).value_or("").substr(0, older.size()), older);
-    EXPECT_EQ(LinesOfLog(),
-              (LINES{" older", Line("/sbin/x", "first "), Line("/sbin/x", "second ")}));
-    EXPECT_EQ(LogText(result), "");
+    EXPECT_EQ(LogAfter("new\n", "/sbin/x", WithFile(MachineMake(), LOG_PATH, "older\n")),
+              "older\nNov 05 01:02:03 command=\"/sbin/x\" Error=\"new \"\n");
 }
 
 // Stamp, words and quotes take 35 bytes of the 2047; what the line has no room for is cut from its
@@ -156,124 +104,97 @@ TEST(SpaceErrorLog, CutsTheLine)
 {
     for (const size_t cch : {2000U, 2008U, 2009U, 2010U, 2046U, 2047U, 2048U, 2049U, 5000U}) {
         SCOPED_TRACE(cch);
-        const RUN_RESULT result = ErrorLogOf(std::string(cch, 'e'), "cmd");
-        const std::string whole = Line("cmd", std::string(cch, 'e'));
-        EXPECT_EQ(LinesOfLog(), LINES{whole.substr(0, LINE_LENGTH - STAMP_LENGTH)});
-        EXPECT_EQ(MachineFileRead(LOG_PATH).value_or("").size(),
-                  std::min(STAMP_LENGTH + whole.size(), LINE_LENGTH) + 1);
-        EXPECT_EQ(LogText(result), "");
+        const std::string line = Line("cmd", std::string(cch, 'e'));
+        EXPECT_EQ(LogAfter(std::string(cch, 'e'), "cmd"), cch <= 2009 ? line : CutLine(line));
     }
-}
-
-TEST(SpaceErrorLog, CutsTheLineWithinTheCommandToo)
-{
     const std::string command(3000, 'c');
-    (void)ErrorLogOf("error\n", command.c_str());
-    EXPECT_EQ(LinesOfLog(), LINES{Line(command, "").substr(0, LINE_LENGTH - STAMP_LENGTH)});
+    EXPECT_EQ(LogAfter("error\n", command.c_str()), CutLine(Line(command, "")));
 }
 
 TEST(SpaceErrorLog, ReadsTheStreamToItsEnd)
 {
-    std::string text(100000, 'e');
-    (void)MachineCall(MachineMake(), [&text] {
-        FILE *const pStream = StreamOf(text);
-        EXPECT_EQ(SpaceErrorLog(pStream, "/sbin/x"), 0);
-        EXPECT_EQ(ftell(pStream), 100000);
-        EXPECT_NE(feof(pStream), 0);
-        fclose(pStream);
-    });
-    EXPECT_EQ(LinesOfLog().size(), 1U);
-}
-
-TEST(SpaceErrorLog, RefusesNoStream)
-{
-    const RUN_RESULT result = MachineCall(MachineMake(), [] {
-        RecordReset();
-        EXPECT_EQ(SpaceErrorLog(nullptr, "/sbin/x"), -1);
-        EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
-        EXPECT_STREQ(NLIBCErrGetFile(), "space.cpp");
-    });
-    EXPECT_EQ(MachineFileRead(LOG_PATH), std::nullopt);
-    EXPECT_EQ(LogText(result), "");
+    EXPECT_EQ(LogAfter(std::string(100000, 'e'), "").value_or("").size(), LINE_LENGTH + 1);
 }
 
 // Why the log cannot be opened.
 std::vector<MACHINE> MachinesWithoutLog()
 {
-    MACHINE noFolder = MachineMake();
-    MachineRemove(noFolder, "/var/log");
-    MACHINE isFolder = MachineMake();
-    MachineFolder(isFolder, LOG_PATH);
-    MACHINE refused = MachineMake();
-    refused.faults = {{.szFunction = "fopen", .error = EACCES}};
-    return {noFolder, isFolder, refused};
+    const MACHINE machine = MachineMake();
+    return {Without(machine, "/var/log"), WithFile(machine, std::string(LOG_PATH) + "/file", ""),
+            WithFault(machine, {.szFunction = "fopen", .error = EACCES})};
+}
+
+// The fault is told where it is one.
+STEPS OpenFailed(const MACHINE &machine)
+{
+    return (machine.faults.empty() ? STEPS{} : STEPS{{"fault fopen 1"}}) + STEPS{{OPEN_FAILED}};
 }
 
 TEST(SpaceErrorLog, FailsWithoutACodeWhenTheLogDoesNotOpen)
 {
     for (const MACHINE &machine : MachinesWithoutLog()) {
-        std::string text = "error\n";
-        const RUN_RESULT result = MachineCall(machine, [&text] {
-            FILE *const pStream = StreamOf(text);
-            RecordReset();
-            EXPECT_EQ(SpaceErrorLog(pStream, "/sbin/x"), -1);
-            EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
-            EXPECT_NE(feof(pStream), 0);
-            fclose(pStream);
-        });
-        EXPECT_EQ(LogText(result), OPEN_FAILED);
+        (void)ExpectCall({.szName = "no log",
+                          .machine = machine,
+                          .call = [] { return ErrorLogOf("error\n", "/sbin/x"); },
+                          .result = -1,
+                          .steps = OpenFailed(machine)});
     }
 }
 
 // ---- the time stamp ----------------------------------------------------------------------------
 
-std::string StampAt(time_t when, int minutesEast)
-{
-    const time_t shifted = when + minutesEast * 60;
-    struct tm fields = {};
-    gmtime_r(&shifted, &fields);
-    char szStamp[32] = "";
-    (void)strftime(szStamp, sizeof(szStamp), STAMP_FORMAT, &fields);
-    return szStamp;
-}
-
-struct ZONE_CASE {
+struct STAMP_CASE {
+    std::int64_t when;
     const char *szZone;
-    int minutesEast;
+    const char *szLog;
 };
 
-constexpr ZONE_CASE ZONE_CASES[] = {{"UTC0", 0}, {"WST+11:30", -690}, {"EST-13:45", 825}};
+// A day has two digits on every day, and the place of the machine counts.
+constexpr STAMP_CASE STAMP_CASES[] = {
+    {1793840523, "UTC0", "Nov 05 01:02:03 command=\"x\" Error=\"e\"\n"},
+    {1793840523, "WST+11:30", "Nov 04 13:32:03 command=\"x\" Error=\"e\"\n"},
+    {1793840523, "EST-13:45", "Nov 05 14:47:03 command=\"x\" Error=\"e\"\n"},
+    {1772323199, "UTC0", "Feb 28 23:59:59 command=\"x\" Error=\"e\"\n"},
+    {1767225600, "UTC0", "Jan 01 00:00:00 command=\"x\" Error=\"e\"\n"},
+    {1781049600, "UTC0", "Jun 10 00:00:00 command=\"x\" Error=\"e\"\n"},
+};
 
 TEST(SpaceErrorLog, StampsTheLineWithTheLocalTime)
 {
-    for (const ZONE_CASE &row : ZONE_CASES) {
-        SCOPED_TRACE(row.szZone);
+    for (const STAMP_CASE &row : STAMP_CASES) {
+        SCOPED_TRACE(row.szLog);
         MACHINE machine = MachineMake();
+        machine.when = row.when;
         machine.environment["TZ"] = row.szZone;
-        std::string text = "error";
-        const time_t before = time(nullptr);
-        (void)MachineCall(machine, [&text] {
-            tzset();
-            FILE *const pStream = StreamOf(text);
-            EXPECT_EQ(SpaceErrorLog(pStream, "/sbin/x"), 0);
-            fclose(pStream);
-        });
-        const time_t after = time(nullptr);
-        bool fLocal = false;
-        const std::string log = MachineFileRead(LOG_PATH).value_or("");
-        for (time_t when = before; when <= after; when++) {
-            fLocal = fLocal || log.starts_with(StampAt(when, row.minutesEast) + " command=");
-        }
-        EXPECT_TRUE(fLocal) << log << "expected " << StampAt(before, row.minutesEast);
+        EXPECT_EQ(LogAfter("e", "x", machine), row.szLog);
+    }
+}
+
+// The time stamp is for people; without one the line is there all the same.
+TEST(SpaceErrorLog, LogsWithoutATimeToo)
+{
+    for (const std::string szFunction : {"localtime_r", "strftime"}) {
+        (void)ExpectCall({.szName = szFunction.c_str(),
+                          .machine = WithFault(MachineMake(), {.szFunction = szFunction}),
+                          .call = [] { return ErrorLogOf("e", "x"); },
+                          .steps = {{"fault " + szFunction + " 1"}}});
+        EXPECT_EQ(MachineFileRead(LOG_PATH), " command=\"x\" Error=\"e\"\n");
     }
 }
 
 // ---- running a tool ----------------------------------------------------------------------------
 
+constexpr char STOP[] = "/sbin/mdadm -S /dev/md2";
+
+long long Stop()
+{
+    return SpaceExecl("/sbin/mdadm", "-S", "/dev/md2", NULL);
+}
+
 struct STATUS_CASE {
     TOOL_ANSWER answer;
     int status; // as wait gives it
-    LINES lines;
+    std::optional<std::string> log;
 };
 
 const STATUS_CASE STATUS_CASES[] = {
@@ -286,36 +207,22 @@ const STATUS_CASE STATUS_CASES[] = {
     // What goes to standard output is nobody's.
     {{.szOut = "stopped /dev/md2\n"}, 0, {}},
     // What goes to standard error is logged, whatever the status.
-    {{.szErr = "mdadm: fail to stop\n", .status = 1},
-     256,
-     {Line("/sbin/mdadm -S /dev/md2", "mdadm: fail to stop ")}},
-    {{.szErr = "mdadm: stopped /dev/md2\n"},
-     0,
-     {Line("/sbin/mdadm -S /dev/md2", "mdadm: stopped /dev/md2 ")}},
-    {{.szOut = "out\n", .szErr = "one\ntwo\n", .status = 3},
-     768,
-     {Line("/sbin/mdadm -S /dev/md2", "one two ")}},
-    {{.szErr = "going down", .signal = SIGKILL},
-     SIGKILL,
-     {Line("/sbin/mdadm -S /dev/md2", "going down")}},
-    {{.szErr = "late\n", .msDelay = 50}, 0, {Line("/sbin/mdadm -S /dev/md2", "late ")}},
+    {{.szErr = "fail to stop\n", .status = 1}, 256, Line(STOP, "fail to stop ")},
+    {{.szErr = "stopped /dev/md2\n"}, 0, Line(STOP, "stopped /dev/md2 ")},
+    {{.szOut = "out\n", .szErr = "one\ntwo\n", .status = 3}, 768, Line(STOP, "one two ")},
+    {{.szErr = "going down", .signal = SIGKILL}, SIGKILL, Line(STOP, "going down")},
+    {{.szErr = "late\n", .msDelay = 50}, 0, Line(STOP, "late ")},
+    // However much it is, and nobody waits.
+    {{.status = 1, .cbFlood = 10485760}, 256, CutLine(Line(STOP, std::string(2047, 'x')))},
 };
 
 TEST(SpaceExecl, ReturnsTheRawStatusAndLogsStandardError)
 {
     for (const STATUS_CASE &row : STATUS_CASES) {
         SCOPED_TRACE(testing::Message() << row.status << ' ' << row.answer.szErr);
-        MACHINE machine = MachineMake();
-        MachineTool(machine, "/sbin/mdadm -S /dev/md2", row.answer);
-        const RUN_RESULT result = MachineCall(machine, [&row] {
-            RecordReset();
-            EXPECT_EQ(SpaceExecl("/sbin/mdadm", "-S", "/dev/md2", NULL), row.status);
-            EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
-        });
-        EXPECT_EQ(LinesOfLog(), row.lines);
-        EXPECT_EQ(MachineFileRead(LOG_PATH).has_value(), !row.lines.empty());
-        EXPECT_EQ(TranscriptText(result), "/sbin/mdadm -S /dev/md2\n");
-        EXPECT_EQ(LogText(result), "");
+        const RUN_RESULT result = ExpectCall(
+            {.szName = "stop", .call = Stop, .result = row.status, .steps = {{STOP, row.answer}}});
+        EXPECT_EQ(MachineFileRead(LOG_PATH), row.log);
         EXPECT_EQ(result.szOut, "");
         EXPECT_EQ(result.szErr, "");
     }
@@ -379,7 +286,7 @@ void ExpectLoggedWithBlanksAndRunAsItIs(const COMMAND_CASE &row)
     MachineTool(machine, row.argv, {.szErr = "x"});
     const RUN_RESULT result =
         MachineCall(machine, [&row] { EXPECT_EQ(SpaceExeclOf(row.argv), 0); });
-    EXPECT_EQ(LinesOfLog(), LINES{Line(row.text, "x")});
+    EXPECT_EQ(MachineFileRead(LOG_PATH), Line(row.text, "x"));
     ASSERT_EQ(result.events.size(), 1U);
     EXPECT_EQ(result.events[0].argv, row.argv);
 }
@@ -398,34 +305,24 @@ TEST(SpaceExecl, CutsLongCommandAndLongErrorInOneLine)
     MACHINE machine = MachineMake();
     MachineTool(machine, argv, {.szErr = std::string(4000, 'e') + "\n", .status = 1});
     (void)MachineCall(machine, [&argv] { EXPECT_EQ(SpaceExeclOf(argv), 256); });
-    const std::string whole = Line("/sbin/mdadm " + std::string(1011, 'a'), std::string(2047, 'e'));
-    EXPECT_EQ(LinesOfLog(), LINES{whole.substr(0, LINE_LENGTH - STAMP_LENGTH)});
-}
-
-TEST(SpaceExecl, ReadsAFloodWithoutBlockingTheTool)
-{
-    MACHINE machine = MachineMake();
-    MachineTool(machine, "/sbin/mdadm -S", {.status = 1, .cbFlood = 10485760});
-    const RUN_RESULT result =
-        MachineCall(machine, [] { EXPECT_EQ(SpaceExecl("/sbin/mdadm", "-S", NULL), 256); });
-    const std::string whole = Line("/sbin/mdadm -S", std::string(2047, 'x'));
-    EXPECT_EQ(LinesOfLog(), LINES{whole.substr(0, LINE_LENGTH - STAMP_LENGTH)});
-    EXPECT_EQ(LogText(result), "");
+    EXPECT_EQ(MachineFileRead(LOG_PATH),
+              CutLine(Line("/sbin/mdadm " + std::string(1011, 'a'), std::string(2047, 'e'))));
 }
 
 TEST(SpaceExecl, LogsALineForEachToolThatWroteAnError)
 {
-    MACHINE machine = MachineMake();
-    MachineTool(machine, "/sbin/vgremove -f vg1", {.szErr = "first\n", .status = 5});
-    MachineTool(machine, "/sbin/pvremove /dev/md2", {.status = 5});
-    MachineTool(machine, "/sbin/mdadm -S /dev/md2", {.szErr = "third\n"});
-    (void)MachineCall(machine, [] {
-        EXPECT_EQ(SpaceExecl("/sbin/vgremove", "-f", "vg1", NULL), 1280);
-        EXPECT_EQ(SpaceExecl("/sbin/pvremove", "/dev/md2", NULL), 1280);
-        EXPECT_EQ(SpaceExecl("/sbin/mdadm", "-S", "/dev/md2", NULL), 0);
-    });
-    EXPECT_EQ(LinesOfLog(), (LINES{Line("/sbin/vgremove -f vg1", "first "),
-                                   Line("/sbin/mdadm -S /dev/md2", "third ")}));
+    (void)ExpectCall({.szName = "three tools",
+                      .call =
+                          [] {
+                              EXPECT_EQ(SpaceExecl("/sbin/vgremove", "-f", "vg1", NULL), 1280);
+                              EXPECT_EQ(SpaceExecl("/sbin/pvremove", "/dev/md2", NULL), 1280);
+                              return Stop();
+                          },
+                      .steps = {{"/sbin/vgremove -f vg1", {.szErr = "first\n", .status = 5}},
+                                {"/sbin/pvremove /dev/md2", {.status = 5}},
+                                {STOP, {.szErr = "third\n"}}}});
+    EXPECT_EQ(MachineFileRead(LOG_PATH),
+              Line("/sbin/vgremove -f vg1", "first ") + Line(STOP, "third "));
 }
 
 TEST(SpaceExecl, GivesStatus127OfAToolThatCannotRun)
@@ -433,44 +330,38 @@ TEST(SpaceExecl, GivesStatus127OfAToolThatCannotRun)
     for (const TOOL_KIND kind :
          {TOOL_KIND::MISSING, TOOL_KIND::FOLDER, TOOL_KIND::NOT_EXECUTABLE}) {
         SCOPED_TRACE(static_cast<int>(kind));
-        MACHINE machine = MachineMake();
-        machine.tools["/sbin/mdadm"] = kind;
-        const RUN_RESULT result = MachineCall(machine, [] {
-            RecordReset();
-            EXPECT_EQ(SpaceExecl("/sbin/mdadm", "-S", "/dev/md2", NULL), 32512);
-            EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
-        });
+        (void)ExpectCall({.szName = "no tool",
+                          .machine = WithTool(MachineMake(), "/sbin/mdadm", kind),
+                          .call = Stop,
+                          .result = 32512});
         EXPECT_EQ(MachineFileRead(LOG_PATH), std::nullopt);
-        EXPECT_EQ(LogText(result), "");
     }
 }
 
 TEST(SpaceExecl, JudgesByTheToolWhenTheLogDoesNotOpen)
 {
-    for (MACHINE machine : MachinesWithoutLog()) {
+    for (const MACHINE &machine : MachinesWithoutLog()) {
         for (const int status : {0, 1}) {
-            machine.rows.clear();
-            MachineTool(machine, "/sbin/mdadm -S", {.szErr = "error\n", .status = status});
-            const RUN_RESULT result = MachineCall(machine, [status] {
-                RecordReset();
-                EXPECT_EQ(SpaceExecl("/sbin/mdadm", "-S", NULL), status * 256);
-                EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
-            });
-            EXPECT_EQ(LogText(result), OPEN_FAILED);
+            (void)ExpectCall({.szName = "no log",
+                              .machine = machine,
+                              .call = Stop,
+                              .result = status * 256,
+                              .steps = STEPS{{STOP, {.szErr = "error\n", .status = status}}} +
+                                       OpenFailed(machine)});
         }
     }
 }
 
-TEST(SpaceExecl, RefusesNull)
+TEST(Space, RefusesNull)
 {
-    const RUN_RESULT result = MachineCall(MachineMake(), [] {
-        RecordReset();
-        EXPECT_EQ(SpaceExecl(nullptr, "-S", NULL), -1);
-        EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
-        EXPECT_STREQ(NLIBCErrGetFile(), "space.cpp");
-    });
-    EXPECT_EQ(LogText(result), "");
-    EXPECT_EQ(TranscriptText(result), "");
+    ExpectCalls({{.szName = "no stream",
+                  .call = [] { return SpaceErrorLog(nullptr, "/sbin/x"); },
+                  .result = -1,
+                  .code = ERR_BAD_PARAMETER},
+                 {.szName = "no tool",
+                  .call = [] { return SpaceExecl(nullptr, "-S", NULL); },
+                  .result = -1,
+                  .code = ERR_BAD_PARAMETER}});
 }
 
 struct FAULT_CASE {
@@ -492,13 +383,13 @@ TEST(SpaceExecl, FailsWhenTheToolCannotBeStartedOrWaitedFor)
 {
     for (const FAULT_CASE &row : FAULT_CASES) {
         SCOPED_TRACE(testing::Message() << row.szFunction << ' ' << row.error);
-        MACHINE machine = MachineMake();
-        MachineTool(machine, "/sbin/mdadm -S", {.status = 1, .nTimes = ANY_TIMES});
-        machine.faults = {{.szFunction = row.szFunction, .error = row.error}};
+        MACHINE machine =
+            WithFault(MachineMake(), {.szFunction = row.szFunction, .error = row.error});
+        MachineTool(machine, STOP, {.status = 1, .nTimes = ANY_TIMES});
         machine.fMayLeaveChildren = true;
         const RUN_RESULT result = MachineCall(machine, [&row] {
             RecordReset();
-            EXPECT_EQ(SpaceExecl("/sbin/mdadm", "-S", NULL), row.result);
+            EXPECT_EQ(Stop(), row.result);
             EXPECT_EQ(NLIBCErrGet(), row.code);
         });
         EXPECT_EQ(MachineFileRead(LOG_PATH), std::nullopt);

@@ -97,6 +97,7 @@ FAULT g_faults[FAULTS];
 size_t g_nFault = 0;
 bool g_fActive = false;
 bool g_fRealSleep = false;
+std::int64_t g_when = 0;
 bool g_fCallsTold = false;
 STREAM_NAME g_streamNames[STREAM_NAMES];
 size_t g_nStreamName = 0;
@@ -205,6 +206,8 @@ bool DriverRead()
             DeviceTake(record);
         } else if (strcmp(szKind, "fault") == 0) {
             FaultTake(record);
+        } else if (strcmp(szKind, "time") == 0) {
+            g_when = static_cast<std::int64_t>(NumberNext(record));
         } else if (strcmp(szKind, "calls") == 0) {
             g_fCallsTold = true;
         } else {
@@ -214,25 +217,14 @@ bool DriverRead()
     return true;
 }
 
-// ---- records of the transcript -----------------------------------------------------------------
-
-void FileAppend(const char *szFile, const char *pch, int cb)
-{
-    const long fd = syscall(SYS_openat, AT_FDCWD, szFile, O_WRONLY | O_APPEND | O_CLOEXEC);
-    if (fd >= 0) {
-        (void)syscall(SYS_write, fd, pch, static_cast<size_t>(cb));
-        (void)syscall(SYS_close, fd);
-    }
-}
+// ---- records of what happened ------------------------------------------------------------------
 
 void EventRecord(const char *szKind, const char *szWord, const char *szMore)
 {
     char ach[256] = "";
     const int cb = snprintf(ach, sizeof(ach), "%zu:%s%zu:%s%zu:%s", strlen(szKind), szKind,
                             strlen(szWord), szWord, strlen(szMore), szMore);
-    char achRecord[320] = "";
-    const int cbRecord = snprintf(achRecord, sizeof(achRecord), "%d:%s", cb, ach);
-    FileAppend(WIRE_TRANSCRIPT, achRecord, cbRecord);
+    WireSend(ach, static_cast<size_t>(cb));
 }
 
 // A fault of one process alone tells what its call was about, too.
@@ -254,7 +246,9 @@ void CallTell(const char *szFunction, const char *szObject)
     char szLine[192] = "";
     const int cb =
         snprintf(szLine, sizeof(szLine), "%s %s %s\n", g_szProcess, szFunction, szObject);
-    FileAppend(WIRE_CALLS, szLine, cb);
+    const long fd = syscall(SYS_openat, AT_FDCWD, WIRE_CALLS, O_WRONLY | O_APPEND | O_CLOEXEC);
+    (void)syscall(SYS_write, fd, szLine, static_cast<size_t>(cb));
+    (void)syscall(SYS_close, fd);
 }
 
 // What has begun to fail goes on in the processes that are forked later.
@@ -555,6 +549,22 @@ VISIBLE int Wrap_usleep(unsigned int microseconds)
                : Next(pReal, "usleep")(microseconds);
 }
 
+#define WRAP_TIME(symbol, TIME)                                                                    \
+    VISIBLE TIME Wrap_##symbol(TIME *pTime) __asm__(#symbol);                                      \
+    VISIBLE TIME Wrap_##symbol(TIME *pTime)                                                        \
+    {                                                                                              \
+        static TIME (*pReal)(TIME *) = nullptr;                                                    \
+        if (!g_fActive) {                                                                          \
+            return Next(pReal, #symbol)(pTime);                                                    \
+        }                                                                                          \
+        const auto now = static_cast<TIME>(g_when);                                                \
+        if (pTime != nullptr) {                                                                    \
+            *pTime = now;                                                                          \
+        }                                                                                          \
+        return now;                                                                                \
+    }
+
+WRAP_TIME(time, time_t)
 WRAP_IOCTL(ioctl)
 WRAP_FSTAT(fstat, struct stat)
 WRAP_FSTAT(fstat64, struct stat64)
@@ -576,6 +586,7 @@ struct STAT_TIME_64 {
     __gid_t st_gid;
     __dev_t st_rdev;
 };
+WRAP_TIME(__time64, std::int64_t)
 WRAP_IOCTL(__ioctl_time64)
 WRAP_FSTAT(__fstat64_time64, STAT_TIME_64)
 WRAP_NANOSLEEP(__nanosleep64, TIMESPEC_64)

@@ -240,11 +240,11 @@ std::string LogSocketMake()
 {
     struct sockaddr_un address = {};
     address.sun_family = AF_UNIX;
-    snprintf(address.sun_path, sizeof(address.sun_path), "%s", Inside("/dev/log").c_str());
+    snprintf(address.sun_path, sizeof(address.sun_path), "%s", Inside(WIRE_LOG).c_str());
     g_fdLog = socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0);
     if (g_fdLog < 0 ||
         bind(g_fdLog, reinterpret_cast<const struct sockaddr *>(&address), sizeof(address)) != 0) {
-        return Refused("/dev/log");
+        return Refused(WIRE_LOG);
     }
     return "";
 }
@@ -363,8 +363,8 @@ void ToolsLayOut(const MACHINE &machine)
 
 void LogLayOut(bool fNoLog)
 {
-    const std::string szHere = Inside("/dev/log");
-    const std::string szAway = Inside("/dev/log.away");
+    const std::string szHere = Inside(WIRE_LOG);
+    const std::string szAway = Inside(WIRE_LOG_AWAY);
     (void)(fNoLog ? rename(szHere.c_str(), szAway.c_str())
                   : rename(szAway.c_str(), szHere.c_str()));
 }
@@ -510,6 +510,10 @@ std::string DriverText(const MACHINE &machine)
     for (const MACHINE_FAULT &fault : machine.faults) {
         FieldAdd(szText, FaultRecord(fault));
     }
+    std::string szTime;
+    FieldAdd(szTime, "time ");
+    NumberAdd(szTime, machine.when);
+    FieldAdd(szText, szTime);
     if (machine.fCallsTold) {
         std::string szRecord;
         FieldAdd(szRecord, "calls ");
@@ -555,7 +559,6 @@ void RoomAnswersWrite(const MACHINE &machine)
     TextWrite(Inside(WIRE_USED), std::string(machine.rows.size() * sizeof(std::uint32_t), '\0'),
               0644);
     TextWrite(Inside(WIRE_DRIVER), DriverText(machine), 0644);
-    TextWrite(Inside(WIRE_TRANSCRIPT), "", 0666);
     TextWrite(Inside(WIRE_CALLS), "", 0666);
     LogLayOut(machine.fNoLog);
 }

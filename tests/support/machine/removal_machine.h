@@ -3,17 +3,12 @@
 
 // What the cases of taking an array down share: disks, reports of superblocks, the commands.
 
-#include "last_error.h"
-#include "sandbox.h"
+#include "steps.h"
 
 #include "nurostoragecore/raid_info.h"
 
-#include <cstddef>
 #include <cstdio>
-#include <ctime>
-#include <sstream>
 #include <string>
-#include <vector>
 
 inline constexpr char UUID_MD2[] = "5b1f2c3d:4e5f6071:8293a4b5:00000002";
 inline constexpr char UUID_MD3[] = "5b1f2c3d:4e5f6071:8293a4b5:00000003";
@@ -24,28 +19,49 @@ inline std::string ReportOf(const std::string &szUuid)
     return "/dev/sdx3:\n          Magic : a92b4efc\n     Array UUID : " + szUuid + "\n";
 }
 
-inline std::string ExamineCommand(const std::string &szName)
+inline constexpr char STOP_MD2[] = "/sbin/mdadm -S /dev/md2";
+
+inline STEP Examined(const std::string &szName, const std::string &szUuid)
 {
-    return "/sbin/mdadm -E /dev/" + szName;
+    return {"/sbin/mdadm -E /dev/" + szName, {.szOut = ReportOf(szUuid)}};
 }
 
-inline std::string WipeCommand(const std::string &szName)
+inline STEP ExaminedBlank(const std::string &szName)
 {
-    return "/sbin/mdadm --zero-superblock /dev/" + szName;
+    return {"/sbin/mdadm -E /dev/" + szName,
+            {.szErr = "mdadm: No md superblock detected on /dev/" + szName + ".\n", .status = 1}};
 }
 
-inline void ExamineExpect(MACHINE &machine, const std::string &szName, const std::string &szUuid,
-                          int nTimes = 1)
+inline STEPS Wiped(const std::string &szName)
 {
-    MachineTool(machine, ExamineCommand(szName), {.szOut = ReportOf(szUuid), .nTimes = nTimes});
+    return {{"/sbin/mdadm --zero-superblock /dev/" + szName},
+            {"<11>raid_remove.cpp:# [Info] Clean RAID superblock on '/dev/" + szName + "'"}};
 }
 
-inline void BlankMemberExpect(MACHINE &machine, const std::string &szName, int nTimes = 1)
+inline STEPS WipeFailed(const std::string &szName, const TOOL_ANSWER &answer)
 {
-    MachineTool(machine, ExamineCommand(szName),
-                {.szErr = "mdadm: No md superblock detected on /dev/" + szName + ".\n",
-                 .status = 1,
-                 .nTimes = nTimes});
+    return {{"/sbin/mdadm --zero-superblock /dev/" + szName, answer},
+            {"<11>raid_remove.cpp:# Failed to zero RAID superblock '/dev/" + szName + "'"},
+            {"<11>raid_remove.cpp:# Failed to clean suerblock of '/dev/" + szName + "'"}};
+}
+
+// One try that fails, and the second until the next.
+inline STEPS StopFailed(const TOOL_ANSWER &answer)
+{
+    return {{STOP_MD2, answer},
+            {"<11>raid_remove.cpp:# Failed to mdadm stop '/dev/md2'"},
+            {"<11>raid_remove.cpp:# Fail to stop [/dev/md2], try again"},
+            {"sleep 1"}};
+}
+
+inline const STEP LIMIT_TOLD = {"<11>raid_remove.cpp:# Reach RAID stop retry limit"};
+inline const STEP CLEAN_TOLD = {"<11>raid_remove.cpp:# [Info] clean RAID superblock of /dev/md2"};
+
+// What is left of a mirror of sda3 and sdb3 that has been stopped.
+inline STEPS MirrorWiped()
+{
+    return STEPS{CLEAN_TOLD, Examined("sda3", UUID_MD2), Examined("sdb3", UUID_MD2)} +
+           Wiped("sda3") + Wiped("sdb3");
 }
 
 // Partitions 1 to nPartition.
@@ -77,23 +93,7 @@ inline RAID_INFO RecordOf(const std::string &szPath, const std::string &szUuid =
     return info;
 }
 
-inline constexpr size_t STAMP_SIZE = sizeof("Nov 05 01:02:03 ") - 1;
-
-// Such a stamp stands at the start of the line.
-inline bool IsStamped(const std::string &szLine)
-{
-    struct tm time = {};
-    const char *const pchEnd = strptime(szLine.c_str(), "%b %d %H:%M:%S ", &time);
-    return pchEnd == szLine.c_str() + STAMP_SIZE && szLine[4] != ' ';
-}
-
-// The operation error log with its time stamps masked; one that is not of the form stays.
 inline std::string OperationErrors()
 {
-    std::istringstream log(MachineFileRead("/var/log/space_operation_error.log").value_or(""));
-    std::string szText;
-    for (std::string szLine; std::getline(log, szLine);) {
-        szText += (IsStamped(szLine) ? "<time> " + szLine.substr(STAMP_SIZE) : szLine) + "\n";
-    }
-    return szText;
+    return MachineFileRead("/var/log/space_operation_error.log").value_or("");
 }

@@ -218,7 +218,7 @@ void LogTake(RUN_RESULT &result)
 {
     static char ach[LOG_LINE_SIZE];
     for (ssize_t cb = 0; (cb = recv(RoomLogSocket(), ach, sizeof(ach), MSG_DONTWAIT)) > 0;) {
-        result.log.push_back(LogLineParse({ach, static_cast<size_t>(cb)}));
+        DatagramTake({ach, static_cast<size_t>(cb)}, result);
     }
 }
 
@@ -297,9 +297,9 @@ pid_t NamespaceFork()
 
 RUN_RESULT Watch(const MACHINE &machine, const BODY &body, std::string &szFailures)
 {
+    RUN_RESULT leftBehind;
+    LogTake(leftBehind);
     RUN_RESULT result;
-    LogTake(result);
-    result.log.clear();
     RUN_STREAMS streams = {};
     streams.fdIn = MemoryFile("in", machine.szInput);
     streams.fdOut = MemoryFile("out");
@@ -330,7 +330,7 @@ RUN_RESULT Watch(const MACHINE &machine, const BODY &body, std::string &szFailur
     if (fReported) {
         StatusTake(report, result);
     }
-    TranscriptTake(machine, result);
+    RowsCompare(machine, result);
     RunProblemsAdd(machine, fReported, result);
     TranscriptKeep(machine, result);
     return result;

@@ -136,6 +136,7 @@ struct MACHINE {
     std::map<std::string, TOOL_KIND> tools = {}; // only those that are not plain stand-ins
     std::vector<MACHINE_FAULT> faults = {};
     std::map<std::string, std::string> environment = {{"PATH", "/sbin:/bin"}};
+    std::int64_t when = 1793840523;         // what time() says: Nov 05 01:02:03 in UTC
     std::string szInput = "the terminal\n"; // standard input of the program: never /dev/null
     bool fRealSleep = false;                // sleeps are told in the transcript and slept too
     bool fCallsTold = false;                // calls that can be made to fail, see MachineCalls
@@ -199,7 +200,8 @@ struct RUN_EVENT {
     bool fNullInput = false;  // standard input is /dev/null
     bool fNullOutput = false; // standard output is /dev/null
     bool fNullError = false;
-    int nDescriptors = 0; // open descriptors above 2
+    int nDescriptors = 0;  // open descriptors above 2
+    size_t nLogBefore = 0; // syslog lines that came before
     std::vector<std::string> environment = {};
 };
 
@@ -224,7 +226,10 @@ std::string LogText(const RUN_RESULT &result);
 // that is empty or holds blanks or quotes stands in double quotes.
 std::string TranscriptText(const RUN_RESULT &result);
 
-// What is expected of either, one line each.
+// Both in the order in which they came; of processes that run side by side, in any.
+std::string OrderText(const RUN_RESULT &result);
+
+// What is expected of these, one line each.
 std::string Lines(const std::vector<std::string> &lines);
 
 // ---- running -----------------------------------------------------------------------------------

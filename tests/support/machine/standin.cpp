@@ -175,17 +175,6 @@ long DescriptorsCount()
     return nOpen;
 }
 
-void RecordSend(RECORD &record)
-{
-    static RECORD whole;
-    RecordAdd(whole, record.ach);
-    const int fd = open(WIRE_TRANSCRIPT, O_WRONLY | O_APPEND | O_CLOEXEC);
-    if (fd >= 0) {
-        (void)!write(fd, whole.ach, whole.cb);
-        close(fd);
-    }
-}
-
 void CallRecord(bool fExpected, long nDescriptors, int nArgument, char *const argv[])
 {
     static RECORD record;
@@ -202,7 +191,7 @@ void CallRecord(bool fExpected, long nDescriptors, int nArgument, char *const ar
     for (char **psz = environ; *psz != nullptr; psz++) {
         RecordAdd(record, *psz);
     }
-    RecordSend(record);
+    WireSend(record.ach, record.cb);
 }
 
 void BytesWrite(int fd, const char *pch, size_t cb)

@@ -31,6 +31,30 @@ std::string LineMasked(std::string_view szText)
     return std::string(szText.substr(0, iColon)) + ":#" + std::string(szText.substr(iEnd));
 }
 
+LOG_LINE LogLineParse(std::string_view szDatagram)
+{
+    LOG_LINE line;
+    const size_t iEnd = szDatagram.find('>');
+    if (iEnd == std::string_view::npos) {
+        line.szText = szDatagram;
+        return line;
+    }
+    line.priority = atoi(std::string(szDatagram.substr(1, iEnd - 1)).c_str());
+    szDatagram.remove_prefix(std::min(iEnd + 1 + TIME_STAMP_SIZE, szDatagram.size()));
+    const size_t iTagEnd = szDatagram.find(": ");
+    if (iTagEnd != std::string_view::npos) {
+        line.szTag = szDatagram.substr(0, iTagEnd);
+        szDatagram.remove_prefix(iTagEnd + 2);
+    }
+    line.szText = LineMasked(szDatagram);
+    return line;
+}
+
+std::string LogLineText(const LOG_LINE &line)
+{
+    return "<" + std::to_string(line.priority) + ">" + line.szText + "\n";
+}
+
 // False at the end, and when what is there is no field.
 bool FieldTake(std::string_view &szRecord, std::string &szField)
 {
@@ -53,7 +77,7 @@ int NumberTake(std::string_view &szRecord)
     return FieldTake(szRecord, szField) ? atoi(szField.c_str()) : -1;
 }
 
-void CommandParse(std::string_view szRecord, RUN_EVENT &event)
+void CommandParse(std::string_view &szRecord, RUN_EVENT &event)
 {
     (void)FieldTake(szRecord, event.szExecuted);
     event.fNullInput = NumberTake(szRecord) == 1;
@@ -69,7 +93,7 @@ void CommandParse(std::string_view szRecord, RUN_EVENT &event)
     }
 }
 
-void EventParse(std::string_view szRecord, RUN_EVENT &event)
+void EventParse(std::string_view &szRecord, RUN_EVENT &event)
 {
     std::string szKind;
     (void)FieldTake(szRecord, szKind);
@@ -81,8 +105,10 @@ void EventParse(std::string_view szRecord, RUN_EVENT &event)
     event.kind = szKind == WIRE_SLEEP ? EVENT_KIND::SLEEP : EVENT_KIND::FAULT;
     event.argv.push_back(szKind);
     std::string szField;
-    while (FieldTake(szRecord, szField) && !szField.empty()) {
-        event.argv.push_back(szField);
+    while (FieldTake(szRecord, szField)) {
+        if (!szField.empty()) {
+            event.argv.push_back(szField);
+        }
     }
 }
 
@@ -112,23 +138,6 @@ std::string WordsText(const std::vector<std::string> &words)
         szText += (szText.empty() ? "" : " ") + WordQuoted(szWord);
     }
     return szText;
-}
-
-void RowProblemsAdd(const MACHINE &machine, RUN_RESULT &result)
-{
-    const std::string szUsed = MachineFileRead(WIRE_USED).value_or("");
-    for (size_t i = 0; i < machine.rows.size(); i++) {
-        std::uint32_t nUsed = 0;
-        if (szUsed.size() >= (i + 1) * sizeof(nUsed)) {
-            memcpy(&nUsed, szUsed.data() + i * sizeof(nUsed), sizeof(nUsed));
-        }
-        const TOOL_ROW &row = machine.rows[i];
-        if (row.answer.nTimes >= 0 && nUsed != static_cast<std::uint32_t>(row.answer.nTimes)) {
-            result.problems.push_back("expected " + std::to_string(row.answer.nTimes) +
-                                      " times, run " + std::to_string(nUsed) +
-                                      " times: " + WordsText(row.argv));
-        }
-    }
 }
 
 void EventProblemsAdd(const RUN_EVENT &event, RUN_RESULT &result)
@@ -216,40 +225,37 @@ void TranscriptKeep(const MACHINE &machine, const RUN_RESULT &result)
     }
 }
 
-LOG_LINE LogLineParse(std::string_view szDatagram)
+void DatagramTake(std::string_view szDatagram, RUN_RESULT &result)
 {
-    LOG_LINE line;
-    const size_t iEnd = szDatagram.find('>');
-    if (szDatagram.empty() || szDatagram[0] != '<' || iEnd == std::string_view::npos) {
-        line.szText = szDatagram;
-        return line;
+    if (szDatagram.starts_with('<')) {
+        result.log.push_back(LogLineParse(szDatagram));
+        return;
     }
-    line.priority = atoi(std::string(szDatagram.substr(1, iEnd - 1)).c_str());
-    szDatagram.remove_prefix(std::min(iEnd + 1 + TIME_STAMP_SIZE, szDatagram.size()));
-    const size_t iTagEnd = szDatagram.find(": ");
-    if (iTagEnd != std::string_view::npos) {
-        line.szTag = szDatagram.substr(0, iTagEnd);
-        szDatagram.remove_prefix(iTagEnd + 2);
+    RUN_EVENT event;
+    event.nLogBefore = result.log.size();
+    EventParse(szDatagram, event);
+    if (!szDatagram.empty()) {
+        result.problems.emplace_back("what happened cannot be read");
     }
-    line.szText = LineMasked(szDatagram);
-    return line;
+    EventProblemsAdd(event, result);
+    result.events.push_back(std::move(event));
 }
 
-void TranscriptTake(const MACHINE &machine, RUN_RESULT &result)
+void RowsCompare(const MACHINE &machine, RUN_RESULT &result)
 {
-    const std::string szAll = MachineFileRead(WIRE_TRANSCRIPT).value_or("");
-    std::string_view szRest = szAll;
-    std::string szRecord;
-    while (FieldTake(szRest, szRecord)) {
-        RUN_EVENT event;
-        EventParse(szRecord, event);
-        EventProblemsAdd(event, result);
-        result.events.push_back(std::move(event));
+    const std::string szUsed = MachineFileRead(WIRE_USED).value_or("");
+    for (size_t i = 0; i < machine.rows.size(); i++) {
+        std::uint32_t nUsed = 0;
+        if (szUsed.size() >= (i + 1) * sizeof(nUsed)) {
+            memcpy(&nUsed, szUsed.data() + i * sizeof(nUsed), sizeof(nUsed));
+        }
+        const TOOL_ROW &row = machine.rows[i];
+        if (row.answer.nTimes >= 0 && nUsed != static_cast<std::uint32_t>(row.answer.nTimes)) {
+            result.problems.push_back("expected " + std::to_string(row.answer.nTimes) +
+                                      " times, run " + std::to_string(nUsed) +
+                                      " times: " + WordsText(row.argv));
+        }
     }
-    if (!szRest.empty()) {
-        result.problems.emplace_back("the transcript cannot be read");
-    }
-    RowProblemsAdd(machine, result);
 }
 
 std::string Lines(const std::vector<std::string> &lines)
@@ -265,7 +271,7 @@ std::string LogText(const RUN_RESULT &result)
 {
     std::string szText;
     for (const LOG_LINE &line : result.log) {
-        szText += "<" + std::to_string(line.priority) + ">" + line.szText + "\n";
+        szText += LogLineText(line);
     }
     return szText;
 }
@@ -275,6 +281,22 @@ std::string TranscriptText(const RUN_RESULT &result)
     std::string szText;
     for (const RUN_EVENT &event : result.events) {
         szText += WordsText(event.argv) + "\n";
+    }
+    return szText;
+}
+
+std::string OrderText(const RUN_RESULT &result)
+{
+    std::string szText;
+    size_t iLine = 0;
+    for (const RUN_EVENT &event : result.events) {
+        for (; iLine < event.nLogBefore; iLine++) {
+            szText += LogLineText(result.log[iLine]);
+        }
+        szText += WordsText(event.argv) + "\n";
+    }
+    for (; iLine < result.log.size(); iLine++) {
+        szText += LogLineText(result.log[iLine]);
     }
     return szText;
 }

@@ -5,10 +5,11 @@
 
 #include "sandbox.h"
 
-LOG_LINE LogLineParse(std::string_view szDatagram);
+// Adds one datagram of the run to the result: a syslog line, or a record of what happened.
+void DatagramTake(std::string_view szDatagram, RUN_RESULT &result);
 
-// Reads the records of the last run into the result, and compares them with the machine's rows.
-void TranscriptTake(const MACHINE &machine, RUN_RESULT &result);
+// Compares what the last run did with the machine's rows.
+void RowsCompare(const MACHINE &machine, RUN_RESULT &result);
 
 // "Suite.Test" of the test that runs; "" outside of tests.
 std::string TestName();
