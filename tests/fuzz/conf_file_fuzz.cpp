@@ -5,12 +5,11 @@
 #include "nurocore/file.h"
 #include "nurocore/keyvalue.h"
 
-#include "conf_model.h"
+#include "conf.h"
+#include "fuzz.h"
 #include "outside.h"
 
 #include <algorithm>
-#include <strings.h>
-#include <vector>
 
 namespace
 {
@@ -24,7 +23,7 @@ void LookupTells(std::string_view file, const char *szKey, int cbValue, int flag
     std::vector<char> value(static_cast<size_t>(std::max(cbValue, 0)) + 1, UNTOUCHED);
     const int result = NLIBCFileGetKeyValue(
         NUROINFO_CONF_PATH, szKey, fMeasure ? nullptr : value.data(), std::max(cbValue, 0), flags);
-    const MODEL_LOOKUP expected = ModelLookup(file, szKey, cbValue, flags == KEYVALUE_LAST_MATCH);
+    const CONF_LOOKUP expected = ConfLookup(file, szKey, cbValue, flags == KEYVALUE_LAST_MATCH);
     Claim(result == expected.result, "the lookup's result");
     Claim(value.back() == UNTOUCHED, "nothing behind the buffer");
     if (cbValue > 0 && result > 0 && value.front() != UNTOUCHED) {
@@ -34,12 +33,14 @@ void LookupTells(std::string_view file, const char *szKey, int cbValue, int flag
 
 void AnswersTell(std::string_view file)
 {
-    const MODEL_LOOKUP raid = ModelLookup(file, "supportraid", 5, false);
-    const bool fYes = raid.result > 0 && strcasecmp(raid.text.c_str(), "yes") == 0;
-    Claim(NLIBCConfKeyIsYes("supportraid") == (fYes ? 1 : 0), "yes or no");
-    Claim(ModelLookup(file, "maxdisks", 64, false).result > 0 || NLIBCConfMaxDisksGet() == 0,
-          "no count without its key");
-    (void)NLIBCConfMaxSysRaidDisksGet();
+    const bool fRaid = ConfLookup(file, "supportraid", 5).IsYes();
+    Claim(NLIBCConfKeyIsYes("supportraid") == (fRaid ? 1 : 0), "yes or no");
+    const CONF_LOOKUP disks = ConfLookup(file, "maxdisks", 64);
+    const int nDisks = disks.result > 0 ? Number32(disks.text) : 0;
+    Claim(NLIBCConfMaxDisksGet() == nDisks, "the number of disks");
+    const CONF_LOOKUP slots = ConfLookup(file, "max_sys_raid_disks", 64);
+    const int nSlots = slots.result > 0 ? Number32(slots.text) : nDisks;
+    Claim(NLIBCConfMaxSysRaidDisksGet() == nSlots, "the number of slots");
     const int checked = NLIBCFileCheckKeyValue(NUROINFO_CONF_PATH, "no_disk_swap", "yes", 1);
     Claim(checked == 0 || checked == 1, "a check is yes or no");
 }
@@ -49,11 +50,10 @@ void LinesTell(std::string_view file)
     PNLIBSZLIST pLines = NLIBCSzListAlloc(1024);
     Claim(NLIBCFileReadLines(NUROINFO_CONF_PATH, &pLines) == 0, "every line is read");
     int index = 0;
-    ForEachLine(file, 1024, [&](const std::string &line) {
+    for (const std::string &line : Lines(file, 1024)) {
         const char *const szLine = NLIBCSzListGet(pLines, index++);
         Claim(szLine != nullptr && szLine == line, "the same lines");
-        return true;
-    });
+    }
     Claim(pLines->nItem == index, "as many lines");
     NLIBCSzListFree(pLines);
 }

@@ -4,10 +4,10 @@
 #include "nurocore/keyvalue.h"
 #include "nurocore/text.h"
 
-#include "conf_model.h"
+#include "conf.h"
 #include "fuzz.h"
 
-#include <vector>
+#include <cstring>
 
 namespace
 {
@@ -41,11 +41,11 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *pInput, size_t cbInput
     const std::string line = CString(rest);
 
     const bool fMatch = NLIBCFileLineKeyMatch(line.c_str(), key.c_str()) == 1;
-    Claim(fMatch == ModelKeyMatch(line, key), "the key matches as the model's does");
-    Claim(TrimmedInPlace(line) == ModelTrim(line), "trimmed in place");
+    Claim(fMatch == ConfKeyMatches(line, key), "the key matches or not");
+    Claim(TrimmedInPlace(line) == Trimmed(line), "trimmed in place");
     std::string trimmed(line.size() + 1, '#');
     Claim(NLIBCStrTrimSpace(std::string(line).data(), trimmed.data()) >= 0 &&
-              trimmed.c_str() == ModelTrim(line),
+              trimmed.c_str() == Trimmed(line),
           "trimmed into another buffer");
     TokensTell(line);
     return 0;

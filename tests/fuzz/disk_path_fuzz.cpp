@@ -2,57 +2,58 @@
 //
 // The first line is the list of disks that an expansion unit reports, the rest a disk's path on a
 // machine with every kind of port.
-#include "hwcontrol/disk_name.h"
 #include "hwcontrol/disk_path.h"
 
+#include "conf.h"
 #include "fuzz.h"
 #include "outside.h"
+#include "port.h"
 
 namespace
 {
 
 constexpr char CONF[] = "usbportcfg=0x30\nesataportcfg=0x40\ninternalportcfg=0x0f\n"
                         "cacheportcfg=0x80\nsupportsas=yes\n";
+constexpr PORT_MASKS MASKS = {0x30, 0x40, 0x0f, 0x80};
+constexpr size_t LONGEST_NAME = 31;
 
-u32 ModelContainer(DISK_PORT_TYPE type)
+void PortTells(const std::string &path, DISK_PORT_TYPE type, std::string_view report)
 {
-    switch (type) {
-    case ESATA_DEVICE:
-        return 8;
-    case EUNIT_DEVICE:
-        return 2;
-    case USB_DEVICE:
-    case OTHER_DEVICE:
-    case MMC_DEVICE:
-        return 4;
-    case CACHE_DEVICE:
-        return 32;
-    default:
-        return 1;
+    const size_t devices = path.find("/dev", 1); // one in the middle is nobody's
+    if (path.size() > LONGEST_NAME || devices != std::string::npos || path == "/dev") {
+        return;
     }
+    std::string units;
+    for (const std::string &name : UnitNames(ConfLookup(report, "nuro_device_list", 256).text)) {
+        units += name + " ";
+    }
+    Claim(type == static_cast<int>(PortOfPath(MASKS, path, units)), "the type of port");
 }
 
-void ParseTells(const std::string &path)
+void ParseTells(const std::string &path, std::string_view report)
 {
     const DISK_PORT_TYPE type = ExternalDiskPortCheck(path.c_str());
     Claim(type >= UNKNOWN_DEVICE && type <= MMC_DEVICE, "a type of port");
+    PortTells(path, type, report);
     DISK_PATH_INFO info = {};
     const int result = DiskPathParse(path.c_str(), &info);
     Claim(result == (type == UNKNOWN_DEVICE ? -1 : 0), "a known device or not");
     if (result != 0) {
         return;
     }
-    Claim(info.container == ModelContainer(type), "the container");
+    const bool fRefused = type == BOOT_DEVICE || type == ISD_DEVICE || type == MMC_DEVICE;
+    const u32 container = ContainerOf(static_cast<PORT>(type));
+    const u32 parsed = type == MMC_DEVICE ? 4 : 1;
+    Claim(info.container == (fRefused ? parsed : container), "the container");
     Claim(type == EUNIT_DEVICE ||
-              (info.unitIndex == 0 && static_cast<u32>(info.diskIndex) ==
-                                          static_cast<u32>(DiskIndexGet(path.c_str())) + 1U),
+              (info.unitIndex == 0 &&
+               static_cast<u32>(info.diskIndex) == static_cast<u32>(DiskIndex(path)) + 1U),
           "the disk's number");
 
     u32 mask = 0x5555;
     const int contained = DiskContainerGet(path.c_str(), &mask);
-    const bool fRefused = type == BOOT_DEVICE || type == ISD_DEVICE || type == MMC_DEVICE;
     Claim(contained == (fRefused ? -1 : 0), "a container or none");
-    Claim(mask == (fRefused ? 0x5555 : ModelContainer(type)), "the container's mask");
+    Claim(mask == (fRefused ? 0x5555 : container), "the container's mask");
 }
 
 } // namespace
@@ -64,7 +65,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *pInput, size_t cbInput
     OutsideClear();
     OutsideFile("/etc.defaults/nuroinfo.conf", CONF);
     OutsideFile("/sys/class/scsi_host/host0/nuro_pm_info", report);
-    ParseTells(CString(rest));
+    ParseTells(CString(rest), report);
     Claim(IsSupportSas() == 1, "the machine has SAS");
     return 0;
 }

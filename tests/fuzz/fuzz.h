@@ -8,7 +8,6 @@
 #include <cstdio>
 #include <string>
 #include <string_view>
-#include <vector>
 
 inline void Claim(bool fHolds, const char *szClaim)
 {
@@ -37,37 +36,4 @@ inline std::string_view TakeUntil(std::string_view &rest, char separator)
     const std::string_view taken = rest.substr(0, rest.find(separator));
     rest.remove_prefix(taken.size() < rest.size() ? taken.size() + 1 : taken.size());
     return taken;
-}
-
-// The words of a text between any of the separators.
-inline std::vector<std::string> Words(std::string_view text, std::string_view separators)
-{
-    std::vector<std::string> words;
-    for (size_t i = text.find_first_not_of(separators); i != std::string_view::npos;
-         i = text.find_first_not_of(separators, i)) {
-        words.emplace_back(text.substr(i, text.find_first_of(separators, i) - i));
-        i += words.back().size();
-    }
-    return words;
-}
-
-// What a function of the C library sees of a text: nothing behind a NUL.
-inline std::string CString(std::string_view text)
-{
-    return std::string(text.substr(0, text.find('\0')));
-}
-
-// The lines as fgets hands them out with a buffer of cbLine bytes.
-template <typename TAKE>
-void ForEachLine(std::string_view text, size_t cbLine, TAKE take)
-{
-    while (!text.empty()) {
-        const size_t cchToEnd = text.find('\n');
-        const size_t cchLine = cchToEnd == std::string_view::npos ? text.size() : cchToEnd + 1;
-        const std::string_view line = text.substr(0, cchLine < cbLine ? cchLine : cbLine - 1);
-        text.remove_prefix(line.size());
-        if (!take(CString(line))) {
-            return;
-        }
-    }
 }

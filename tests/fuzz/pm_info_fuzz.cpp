@@ -4,33 +4,16 @@
 // of the expansion unit behind it. A second host always reports sdz.
 #include "hwcontrol/disk_port.h"
 
-#include "conf_model.h"
+#include "conf.h"
+#include "fuzz.h"
 #include "outside.h"
-
-#include <vector>
+#include "port.h"
 
 namespace
 {
 
 constexpr char KEY[] = "nuro_device_list";
 constexpr char SECOND_HOST[] = "nuro_device_list=/dev/sdz\n";
-
-// The names of one list, read with scanf.
-std::vector<std::string> ModelNames(const std::string &list)
-{
-    std::vector<std::string> names;
-    const char *pch = list.c_str();
-    char szName[16];
-    int cch = 0;
-    while (sscanf(pch, "/dev/%15[a-zA-Z]%n", szName, &cch) == 1) {
-        names.emplace_back(szName);
-        pch += cch;
-        if (*pch++ != ',') {
-            break;
-        }
-    }
-    return names;
-}
 
 } // namespace
 
@@ -47,9 +30,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *pInput, size_t cbInput
     std::vector<char> out(cbOut, '#');
     const int result = ExternalDiskPortEnumEunit(0, out.data(), static_cast<int>(cbOut));
 
-    const MODEL_LOOKUP lookup = ModelLookup(file, KEY, 256, false);
-    std::vector<std::string> names =
-        lookup.result > 0 ? ModelNames(lookup.text) : std::vector<std::string>();
+    std::vector<std::string> names = UnitNames(ConfLookup(file, KEY, 256).text);
     names.emplace_back("sdz");
     std::string expected;
     bool fFits = true;

@@ -5,9 +5,7 @@
 
 #include "fuzz.h"
 #include "outside.h"
-
-#include <algorithm>
-#include <vector>
+#include "text.h"
 
 namespace
 {
@@ -17,7 +15,7 @@ using PATHS = std::vector<std::string>;
 PATHS ModelPaths(std::string_view file, std::string_view prefix)
 {
     PATHS paths;
-    ForEachLine(file, 1024, [&](const std::string &line) {
+    for (const std::string &line : Lines(file, 1024)) {
         const std::vector<std::string> fields = Words(line, " \t");
         if (fields.size() == 4) {
             const std::string name = fields[3].substr(0, fields[3].size() - 1);
@@ -25,8 +23,7 @@ PATHS ModelPaths(std::string_view file, std::string_view prefix)
                 paths.push_back(("/dev/" + name).substr(0, 63));
             }
         }
-        return true;
-    });
+    }
     std::sort(paths.begin(), paths.end());
     return paths;
 }

@@ -5,6 +5,7 @@
 
 #include "fuzz.h"
 #include "outside.h"
+#include "text.h"
 
 #include <array>
 #include <optional>
@@ -18,10 +19,9 @@ constexpr size_t PATH_SIZE = 256;
 std::optional<std::string> ModelPath(std::string_view rows)
 {
     std::optional<std::string> row;
-    ForEachLine(rows, 1024, [&](const std::string &line) {
+    for (const std::string &line : Lines(rows, 1024)) {
         row = line.find("/dev/md2") != std::string::npos ? line : row;
-        return true;
-    });
+    }
     const size_t group = row.has_value() ? row->find(':') : std::string::npos;
     const size_t volume = group == std::string::npos ? group : row->find(':', group + 1);
     const size_t origin = volume == std::string::npos ? volume : row->find(':', volume + 1);

@@ -2,15 +2,14 @@
 //
 // Two attributes, with a '|' between: "state" and "slot" of a member, "start" and "size" of a
 // partition; the first one is the array's "sync_action" and "component_size", too.
-#include "nurocore/text.h"
 #include "nurostoragecore/partition_layout.h"
 #include "nurostoragecore/raid_disk.h"
 #include "nurostoragecore/raid_info.h"
 
 #include "fuzz.h"
+#include "listing.h"
 #include "outside.h"
 
-#include <cstdlib>
 #include <fcntl.h>
 #include <memory>
 #include <sys/mman.h>
@@ -19,16 +18,6 @@ namespace
 {
 
 constexpr char MEMBER[] = "/sys/block/md0/md/dev-sda1";
-
-std::string FirstLine(std::string_view file, size_t cbLine)
-{
-    std::string first;
-    ForEachLine(file, cbLine, [&](const std::string &line) {
-        first = line;
-        return false;
-    });
-    return first;
-}
 
 bool Holds(const std::string &text, const char *szWord)
 {
@@ -62,7 +51,7 @@ void MemberTells(std::string_view state, std::string_view slot)
         std::string number = FirstLine(slot, 64);
         number = number.substr(0, number.find('\n'));
         Claim(pDisk->state == ModelState(state, slot), "the member's state");
-        Claim(pDisk->slot == (number == "none" ? -1 : NLIBCStrToI32(number.c_str())), "its slot");
+        Claim(pDisk->slot == (number == "none" ? -1 : Number32(number)), "its slot");
     }
     RAIDDiskListFree(pDisk);
 }
@@ -102,13 +91,10 @@ void StartSizeTells(std::string_view startFile, std::string_view sizeFile)
     u64 start = 0;
     u64 size = 0;
     const int result = PartitionStartSizeGet("/dev/sda", 1, &start, &size);
-    const std::string startLine = FirstLine(startFile, 129);
-    const std::string sizeLine = FirstLine(sizeFile, 129);
-    Claim(result == 1 || result == -1, "a partition that is there");
-    Claim(!(startFile.empty() || sizeFile.empty()) || result == -1, "nothing read is a failure");
-    Claim(result != 1 || (start == strtoull(startLine.c_str(), nullptr, 10) &&
-                          size == strtoull(sizeLine.c_str(), nullptr, 10)),
-          "start and size");
+    const auto expectedStart = SectorsRead(startFile);
+    const auto expectedSize = SectorsRead(sizeFile);
+    Claim(result == (expectedStart && expectedSize ? 1 : -1), "two numbers or a failure");
+    Claim(result != 1 || (start == *expectedStart && size == *expectedSize), "start and size");
 }
 
 } // namespace

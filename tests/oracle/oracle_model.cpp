@@ -1,13 +1,15 @@
 // SPDX-License-Identifier: MIT
 #include "oracle_model.h"
 
+#include "conf.h"
+#include "examine.h"
+#include "listing.h"
+#include "port.h"
+
 #include <algorithm>
 #include <array>
-#include <climits>
 #include <cstdlib>
 #include <regex>
-#include <sstream>
-#include <strings.h>
 
 namespace
 {
@@ -33,20 +35,7 @@ constexpr int CREATE_PAUSE = 3;
 constexpr size_t NURODD_ROOM = 511;
 constexpr size_t MISSING_ROOM = 255;
 
-enum PORT {
-    PORT_UNKNOWN = 0,
-    PORT_INTERNAL = 1,
-    PORT_ESATA = 2,
-    PORT_EUNIT = 3,
-    PORT_USB = 4,
-    PORT_CACHE = 7,
-    PORT_OTHER = 8
-};
-enum MASK { MASK_USB, MASK_ESATA, MASK_INTERNAL, MASK_CACHE, MASK_COUNT };
 enum TYPE { TYPE_NONE = 0, TYPE_WIPE = 1, TYPE_RENEW = 2, TYPE_FOREIGN = 4 };
-
-constexpr const char *MASK_KEYS[MASK_COUNT] = {"usbportcfg", "esataportcfg", "internalportcfg",
-                                               "cacheportcfg"};
 
 constexpr const char USAGE[] =
     "usage:\n\tarrayctl destroy <RAID ID> \n\tarrayctl status <RAID ID> "
@@ -59,21 +48,11 @@ struct PROCESS {
     ORACLE_STRAND *pStrand = nullptr;
     std::set<string> markers{};
     std::map<string, size_t> calls{};
-    std::array<u64, MASK_COUNT> masks{};
+    PORT_MASKS masks{};
     u32 code = 0;
     int fDualHead = -1;
     int fRaid = -1;
     bool fKilled = false;
-};
-
-struct FOUND {
-    int result = 0; // bytes needed, 0 absent, -1 failure
-    string szValue{};
-};
-
-struct SUPERBLOCK {
-    int result = 0; // 1 read, 0 nothing there, -1 failure
-    string szMdPath{};
 };
 
 struct MEMBERSHIP {
@@ -82,11 +61,6 @@ struct MEMBERSHIP {
 };
 
 // ---------------------------------------------------------------------------------------- text
-
-bool StartsWith(const string &szText, const string &szHead)
-{
-    return szText.compare(0, szHead.size(), szHead) == 0;
-}
 
 // "0x" and the value in upper-case digits, at least `width` of them.
 string Hex(u32 value, size_t width)
@@ -98,39 +72,6 @@ string Hex(u32 value, size_t width)
     return "0x" + digits;
 }
 
-string Trimmed(const string &szText)
-{
-    constexpr const char WHITE[] = " \t\r\n";
-    const size_t first = szText.find_first_not_of(WHITE);
-    if (first == string::npos) {
-        return "";
-    }
-    string text = szText.substr(first, szText.find_last_not_of(WHITE) - first + 1);
-    if (text.size() > 1 && text.front() == '"' && text.back() == '"') {
-        text = text.substr(1, text.size() - 2);
-    }
-    return text;
-}
-
-// Lines with their ends, the last one even without.
-vector<string> Lines(const string &szText)
-{
-    vector<string> lines;
-    size_t at = 0;
-    while (at < szText.size()) {
-        const size_t end = std::min(szText.find('\n', at), szText.size() - 1);
-        lines.push_back(szText.substr(at, end - at + 1));
-        at = end + 1;
-    }
-    return lines;
-}
-
-int Number32(const string &szText)
-{
-    const long value = strtol(szText.c_str(), nullptr, 10);
-    return static_cast<int>(std::clamp<long>(value, INT_MIN, INT_MAX));
-}
-
 string Joined(const ORACLE_WORDS &words)
 {
     string text;
@@ -138,11 +79,6 @@ string Joined(const ORACLE_WORDS &words)
         text += (i == 0 ? "" : " ") + words[i];
     }
     return text;
-}
-
-string WithoutDev(const string &szPath)
-{
-    return StartsWith(szPath, "/dev/") ? szPath.substr(5) : szPath;
 }
 
 // ------------------------------------------------------------------------- what a process does
@@ -225,70 +161,29 @@ int RunShell(PROCESS &process, const string &szText)
 
 // ------------------------------------------------------------------------------- configuration
 
-struct CONF_LINE {
-    bool fMatch = false;
-    optional<string> szValue{};
-};
-
-CONF_LINE ConfLineRead(const string &szLine, const string &szKey)
-{
-    if (szLine[0] == '#' || szLine[0] == ';') {
-        return {};
-    }
-    const size_t start = szLine.find_first_not_of('=');
-    if (start == string::npos) {
-        return {};
-    }
-    const size_t end = szLine.find('=', start);
-    if (Trimmed(szLine.substr(start, end - start)) != szKey) {
-        return {};
-    }
-    if (end == string::npos) {
-        return {true, {}};
-    }
-    const string szRest = szLine.substr(end + 1);
-    if (szRest.empty() || szRest == "\n") {
-        return {true, {}};
-    }
-    return {true, Trimmed(szRest)};
-}
-
-// The first line with the key decides.
-FOUND KeyValueGet(PROCESS &process, const optional<string> &szFile, const string &szKey,
-                  int cbValue)
+// A file that is not there fails the look into it.
+CONF_LOOKUP KeyValueGet(PROCESS &process, const optional<string> &szFile, const string &szKey,
+                        int cbValue)
 {
     if (!szFile) {
         process.code = CODE_OPEN;
         return {-1, ""};
     }
-    for (const string &szLine : Lines(*szFile)) {
-        const CONF_LINE line = ConfLineRead(szLine, szKey);
-        if (!line.fMatch) {
-            continue;
-        }
-        if (!line.szValue) {
-            break;
-        }
-        const int needed = static_cast<int>(line.szValue->size()) + 1;
-        if (needed > cbValue) {
-            process.code = CODE_TOO_SMALL;
-            return {-1, ""};
-        }
-        return {needed, *line.szValue};
+    const CONF_LOOKUP found = ConfLookup(*szFile, szKey, cbValue);
+    if (found.result < 1) {
+        process.code = found.result < 0 ? CODE_TOO_SMALL : CODE_NOT_FOUND;
     }
-    process.code = CODE_NOT_FOUND;
-    return {0, ""};
+    return found;
 }
 
-FOUND ConfGet(PROCESS &process, const string &szKey, int cbValue)
+CONF_LOOKUP ConfGet(PROCESS &process, const string &szKey, int cbValue)
 {
     return KeyValueGet(process, process.pMachine->szConf, szKey, cbValue);
 }
 
 bool ConfIsYes(PROCESS &process, const string &szKey)
 {
-    const FOUND found = ConfGet(process, szKey, 5);
-    return found.result > 0 && strcasecmp(found.szValue.c_str(), "yes") == 0;
+    return ConfGet(process, szKey, 5).IsYes();
 }
 
 bool SupportRaid(PROCESS &process)
@@ -313,14 +208,13 @@ bool DualHeadAsk(PROCESS &process)
         return false;
     }
     constexpr const char KEY[] = "support_dual_head";
-    const FOUND found = ConfGet(process, KEY, 512);
+    const CONF_LOOKUP found = ConfGet(process, KEY, 512);
     if (found.result < 0) {
         Log(process, PRIORITY_DEBUG,
             string("NLIBCFileGetKeyValue(") + KEY + ") failed [" + Hex(process.code, 4) + " *]");
     }
-    const bool fDual = found.result > 0 && strcasecmp(found.szValue.c_str(), "yes") == 0;
-    process.markers.insert(fDual ? ORACLE_MARKER_DUAL : ORACLE_MARKER_SINGLE);
-    return fDual;
+    process.markers.insert(found.IsYes() ? ORACLE_MARKER_DUAL : ORACLE_MARKER_SINGLE);
+    return found.IsYes();
 }
 
 bool DualHead(PROCESS &process)
@@ -333,13 +227,13 @@ bool DualHead(PROCESS &process)
 
 int SlotCount(PROCESS &process)
 {
-    const FOUND own = ConfGet(process, "max_sys_raid_disks", 64);
+    const CONF_LOOKUP own = ConfGet(process, "max_sys_raid_disks", 64);
     if (own.result >= 1) {
-        return Number32(own.szValue);
+        return Number32(own.text);
     }
-    const FOUND disks = ConfGet(process, "maxdisks", 64);
+    const CONF_LOOKUP disks = ConfGet(process, "maxdisks", 64);
     if (disks.result >= 1) {
-        return Number32(disks.szValue);
+        return Number32(disks.text);
     }
     LogError(process, string("Failed to NLIBCFileGetKeyValue(") + ORACLE_CONF_PATH + ",maxdisks)");
     return 0;
@@ -347,60 +241,11 @@ int SlotCount(PROCESS &process)
 
 int SplitUnits(PROCESS &process)
 {
-    const FOUND found = ConfGet(process, "raidgroup_split_units", 16);
-    return found.result < 1 ? 12 : Number32(found.szValue);
+    const CONF_LOOKUP found = ConfGet(process, "raidgroup_split_units", 16);
+    return found.result < 1 ? 12 : Number32(found.text);
 }
 
-// ------------------------------------------------------------------------------ names and ports
-
-// Letters as digits, wrapping at 32 bits.
-int DiskIndex(const string &szName)
-{
-    string name = WithoutDev(szName);
-    name = StartsWith(name, "sd") ? name.substr(2) : name;
-    u32 value = 0xffffffffU;
-    for (const char letter : name) {
-        if (letter < 'a' || letter > 'z') {
-            break;
-        }
-        value = (value + 1) * 26 + static_cast<u32>(letter - 'a');
-    }
-    return static_cast<int>(value);
-}
-
-string PartitionName(const string &szDisk, int number)
-{
-    return WithoutDev(szDisk) + to_string(number);
-}
-
-string PartitionPath(const string &szDisk, int number)
-{
-    return "/dev/" + PartitionName(szDisk, number);
-}
-
-// The names of one host's list, each with a blank behind it.
-string UnitNames(const string &szList)
-{
-    constexpr size_t LETTERS = 15;
-    string names;
-    size_t at = 0;
-    while (szList.compare(at, 5, "/dev/") == 0) {
-        at += 5;
-        size_t end = at;
-        while (end < szList.size() && end - at < LETTERS && isalpha(szList[end]) != 0) {
-            end++;
-        }
-        if (end == at) {
-            break;
-        }
-        names += szList.substr(at, end - at) + " ";
-        if (end >= szList.size() || szList[end] != ',') {
-            break;
-        }
-        at = end + 1;
-    }
-    return names;
-}
+// --------------------------------------------------------------------------------------- ports
 
 // The names that expansion units report; empty when there is none.
 string UnitNamesAll(PROCESS &process)
@@ -410,12 +255,12 @@ string UnitNamesAll(PROCESS &process)
         return names;
     }
     for (const auto &[szHost, szInfo] : process.pMachine->hosts) {
-        if (!StartsWith(szHost, "host")) {
+        if (!szHost.starts_with("host")) {
             continue;
         }
-        const FOUND found = KeyValueGet(process, szInfo, "nuro_device_list", 256);
-        if (found.result > 0) {
-            names += UnitNames(found.szValue);
+        for (const string &szName :
+             UnitNames(KeyValueGet(process, szInfo, "nuro_device_list", 256).text)) {
+            names += szName + " ";
         }
     }
     return names;
@@ -427,9 +272,9 @@ bool MasksLoad(PROCESS &process)
         return true;
     }
     for (int mask = MASK_USB; mask < MASK_COUNT; mask++) {
-        const FOUND found = ConfGet(process, MASK_KEYS[mask], 65);
+        const CONF_LOOKUP found = ConfGet(process, MASK_KEYS[mask], 65);
         if (found.result > 0) {
-            process.masks[static_cast<size_t>(mask)] = strtoull(found.szValue.c_str(), nullptr, 16);
+            process.masks[static_cast<size_t>(mask)] = strtoull(found.text.c_str(), nullptr, 16);
         } else if (mask == MASK_USB) {
             LogError(process, string("Get usbportcfg key from ") + ORACLE_CONF_PATH + " Error");
             return false;
@@ -438,31 +283,13 @@ bool MasksLoad(PROCESS &process)
     return true;
 }
 
-u32 Bit32(int shift)
-{
-    return shift < 0 || shift > 31 ? 0 : u32{1} << shift;
-}
-
 PORT PortOf(PROCESS &process, const string &szName)
 {
     if (!MasksLoad(process)) {
         return PORT_UNKNOWN;
     }
-    const int index = DiskIndex(szName);
-    const u32 unitBit = Bit32(index <= 25 ? index : index / 26 - 1);
-    if ((static_cast<u32>(process.masks[MASK_ESATA]) & unitBit) != 0) {
-        const string szNames = UnitNamesAll(process);
-        return szNames.find(szName) != string::npos ? PORT_EUNIT : PORT_ESATA;
-    }
-    // The bit is a signed 32-bit value: the last one spreads over the upper half.
-    const u64 bit = static_cast<u64>(static_cast<std::int64_t>(static_cast<int>(Bit32(index))));
-    if ((process.masks[MASK_INTERNAL] & bit) != 0) {
-        return PORT_INTERNAL;
-    }
-    if ((process.masks[MASK_USB] & bit) != 0) {
-        return PORT_USB;
-    }
-    return (process.masks[MASK_CACHE] & bit) != 0 ? PORT_CACHE : PORT_OTHER;
+    const bool fAsk = IsOnEsata(process.masks, szName);
+    return PortOfName(process.masks, szName, fAsk ? UnitNamesAll(process) : "");
 }
 
 // The disks that the commands work on, in byte order.
@@ -471,7 +298,7 @@ vector<string> DisksEnum(PROCESS &process)
     const PORT wanted = DualHead(process) ? PORT_EUNIT : PORT_INTERNAL;
     vector<string> names;
     for (const auto &[szName, partitions] : process.pMachine->disks) {
-        if (StartsWith(szName, "sd") && PortOf(process, szName) == wanted) {
+        if (szName.starts_with("sd") && PortOf(process, szName) == wanted) {
             names.push_back(szName);
         }
     }
@@ -480,73 +307,38 @@ vector<string> DisksEnum(PROCESS &process)
 
 // ------------------------------------------------------------------------- superblocks, arrays
 
-// One "key : value" line of a report; false ends the reading.
-bool ReportLineTake(PROCESS &process, const string &szLine, SUPERBLOCK &block)
+EXAMINED Examine(PROCESS &process, const string &szDevice)
 {
-    const size_t colon = szLine.find(':');
-    if (colon == string::npos) {
-        return true;
+    const EXAMINED examined = ReportRead(Run(process, {ORACLE_MDADM, "-E", szDevice}).szOut);
+    if (!examined.problem.empty()) {
+        LogError(process, examined.problem);
     }
-    const string szKey = Trimmed(szLine.substr(0, colon));
-    const string szValue = Trimmed(szLine.substr(colon + 1));
-    if (szKey == "Version" && szValue.find('.') == string::npos) {
-        LogError(process, "bad version format: '" + szValue + "'.");
-        return false;
-    }
-    if (szKey == "Device Role" && !StartsWith(szValue, "Active device ") &&
-        !StartsWith(szValue, "spare")) {
-        LogError(process, "bad device order format: '" + szValue + "'.");
-        return false;
-    }
-    if (szKey == "Name" || szKey == "Preferred Minor") {
-        const size_t last = szValue.rfind(':');
-        const string szNumber = last == string::npos ? szValue : szValue.substr(last + 1);
-        block.szMdPath = "/dev/md" + to_string(Number32(szNumber));
-    }
-    return true;
-}
-
-SUPERBLOCK Examine(PROCESS &process, const string &szDevice)
-{
-    const ORACLE_REPLY reply = Run(process, {ORACLE_MDADM, "-E", szDevice});
-    SUPERBLOCK block;
-    for (const string &szLine : Lines(reply.szOut)) {
-        block.result = 1;
-        if (!ReportLineTake(process, szLine, block)) {
-            block.result = -1;
-            break;
-        }
-    }
-    return block;
+    return examined;
 }
 
 MEMBERSHIP SuperblockMd(PROCESS &process, const string &szDevice)
 {
-    const SUPERBLOCK block = Examine(process, szDevice);
+    const EXAMINED block = Examine(process, szDevice);
     if (block.result != 1) {
         return {};
     }
-    if (block.szMdPath.empty()) {
+    if (block.mdPath.empty()) {
         LogError(process, "Failed to sscanf [], errno=*");
         return {};
     }
-    return {true, Number32(block.szMdPath.substr(sizeof("/dev/md") - 1))};
+    return {true, Number32(block.mdPath.substr(sizeof("/dev/md") - 1))};
 }
 
 // --------------------------------------------------------------------------------- partitions
 
-// A start or size file: its first line as a number.
-optional<u64> SectorsRead(PROCESS &process, const optional<string> &szFile)
+// A start or size file.
+optional<u64> FileSectors(PROCESS &process, const optional<string> &szFile)
 {
-    if (!szFile) {
-        process.code = CODE_OPEN;
-        return {};
+    const optional<u64> sectors = szFile ? SectorsRead(*szFile) : optional<u64>{};
+    if (!sectors) {
+        process.code = szFile ? CODE_READ : CODE_OPEN;
     }
-    if (szFile->empty() || isdigit((*szFile)[0]) == 0) {
-        process.code = CODE_READ;
-        return {};
-    }
-    return strtoull(szFile->c_str(), nullptr, 10);
+    return sectors;
 }
 
 // Start and size of a partition, or nothing.
@@ -557,8 +349,8 @@ optional<std::pair<u64, u64>> PartitionSectors(PROCESS &process, const string &s
         return {};
     }
     const ORACLE_PARTITION &partition = disk->second.at(number);
-    const optional<u64> start = SectorsRead(process, partition.szStart);
-    const optional<u64> size = start ? SectorsRead(process, partition.szSize) : optional<u64>{};
+    const optional<u64> start = FileSectors(process, partition.szStart);
+    const optional<u64> size = start ? FileSectors(process, partition.szSize) : optional<u64>{};
     return size ? optional(std::pair(*start, *size)) : std::nullopt;
 }
 
@@ -735,26 +527,13 @@ bool SystemCreate(PROCESS &process, const string &szDisk, u32 version)
                          NumberOption("-z", pRow->size2), fRaid ? "-tfd" : "-t82", "-F", szDisk});
 }
 
-// Whether the partitioner lists the partition: a line of five fields whose fourth is not all ones.
+// Whether the partitioner lists the partition, with a size that is not all ones.
 bool Listed(PROCESS &process, const string &szDisk, int number)
 {
     const ORACLE_REPLY reply = Run(process, {ORACLE_SFDISK, "-l", "-uS",
                                              NumberOption("-N", static_cast<u64>(number)), szDisk});
-    const vector<string> lines = Lines(reply.szOut);
-    if (lines.empty()) {
-        return false;
-    }
-    vector<string> fields;
-    string field;
-    for (const char letter : lines[0] + " ") {
-        if (letter != ' ' && letter != '\t') {
-            field += letter;
-        } else if (!field.empty()) {
-            fields.push_back(field);
-            field.clear();
-        }
-    }
-    return fields.size() >= 5 && strtoll(fields[3].c_str(), nullptr, 10) != -1;
+    const optional<LISTED> listed = ListingRead(reply.szOut);
+    return listed && listed->nSectors != -1;
 }
 
 // ---------------------------------------------------------------------- what becomes of a disk
@@ -879,8 +658,7 @@ ACCEPTED PrepareAll(ORACLE_ANSWER &answer, PROCESS &parent, const vector<string>
 int MembersTake(const string &szMembers, size_t room, string &szText)
 {
     int nLeftOut = 0;
-    std::istringstream members(szMembers);
-    for (string szPartition; members >> szPartition;) {
+    for (const string &szPartition : Words(szMembers, " ")) {
         if (szText.size() + szPartition.size() + 1 > room) {
             nLeftOut++;
         } else {
@@ -1066,7 +844,7 @@ std::string OracleReplyKey(const ORACLE_WORDS &words)
     if (words.size() > 3 && words[1] == "-C") {
         return Joined({words[0], words[1], words[2]});
     }
-    if (words.size() > 2 && StartsWith(words[1], "-N")) {
+    if (words.size() > 2 && words[1].starts_with("-N")) {
         return Joined({words[0], words[1], words.back()});
     }
     return Joined(words);
@@ -1074,23 +852,7 @@ std::string OracleReplyKey(const ORACLE_WORDS &words)
 
 ORACLE_WORDS OracleShellWords(const std::string &szText)
 {
-    ORACLE_WORDS words;
-    string word;
-    for (const char letter : szText + " ") {
-        if (letter == '>') {
-            break;
-        }
-        if (letter != ' ') {
-            word += letter;
-        } else if (!word.empty()) {
-            words.push_back(word);
-            word.clear();
-        }
-    }
-    if (!word.empty()) {
-        words.push_back(word);
-    }
-    return words;
+    return Words(szText.substr(0, szText.find('>')), " ");
 }
 
 ORACLE_ANSWER OracleAnswer(const ORACLE_MACHINE &machine, const ORACLE_WORDS &words)
