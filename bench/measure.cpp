@@ -3,12 +3,8 @@
 //   measure calls STATUS COMMAND [ARGUMENT]...     prints "CALLS CHILDREN" of one run
 //   measure runs N STATUS COMMAND [ARGUMENT]...    prints "MINOR_FAULTS PEAK_KIB MICROSECONDS",
 //                                                  the medians of N runs
-//   measure answer STATUS COMMAND [ARGUMENT]...    just runs it
 //
-// The appliance's md driver has two requests that a stock one lacks. Here they are answered from
-// outside, as by a driver whose arrays are in good health: the program runs as it is installed,
-// with nothing preloaded that would be counted as part of it. The command's output goes where
-// measure's error output goes, and its exit status must be STATUS.
+// The command's output goes where measure's error output goes, and its exit status must be STATUS.
 //
 // Linked statically: a program that starts another one lends it its own peak memory.
 #include <algorithm>
@@ -19,17 +15,8 @@
 #include <cstdlib>
 #include <cstring>
 #include <ctime>
-#include <linux/audit.h>
-#include <linux/filter.h>
-#include <linux/major.h>
-#include <linux/seccomp.h>
-#include <sys/ioctl.h>
-#include <sys/prctl.h>
 #include <sys/ptrace.h>
 #include <sys/resource.h>
-#include <sys/syscall.h>
-#include <sys/uio.h>
-#include <sys/user.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -39,22 +26,6 @@ namespace
 constexpr int EXIT_BROKEN = 125; // not a status of the command
 constexpr int RUNS_MAX = 1000;
 constexpr long NANOSECONDS = 1000000000;
-
-struct ANSWER {
-    unsigned long request;
-    size_t cb; // so many bytes of 0: no rebuild runs, the array is normal
-};
-
-struct SYNC_STATUS {
-    std::uint64_t activity;
-    std::uint64_t done;
-    std::uint64_t total;
-};
-
-constexpr ANSWER ANSWERS[] = {
-    {_IOR(MD_MAJOR, 0x60, SYNC_STATUS), sizeof(SYNC_STATUS)},
-    {_IOR(MD_MAJOR, 0x61, std::int32_t), sizeof(std::int32_t)},
-};
 
 struct COUNTS {
     long nCalls;
@@ -67,25 +38,6 @@ struct COUNTS {
 {
     (void)fprintf(stderr, "measure: %s: %s\n", szWhat, strerror(errno));
     exit(EXIT_BROKEN);
-}
-
-// Stops the program at the two requests and nowhere else, so that the rest runs at its own speed.
-void RequestsWatch()
-{
-    static sock_filter steps[] = {
-        BPF_STMT(BPF_LD | BPF_W | BPF_ABS, offsetof(seccomp_data, nr)),
-        BPF_JUMP(BPF_JMP | BPF_JEQ | BPF_K, SYS_ioctl, 0, 3),
-        BPF_STMT(BPF_LD | BPF_W | BPF_ABS, offsetof(seccomp_data, args[1])),
-        BPF_JUMP(BPF_JMP | BPF_JEQ | BPF_K, static_cast<std::uint32_t>(ANSWERS[0].request), 2, 0),
-        BPF_JUMP(BPF_JMP | BPF_JEQ | BPF_K, static_cast<std::uint32_t>(ANSWERS[1].request), 1, 0),
-        BPF_STMT(BPF_RET | BPF_K, SECCOMP_RET_ALLOW),
-        BPF_STMT(BPF_RET | BPF_K, SECCOMP_RET_TRACE),
-    };
-    const sock_fprog filter = {.len = sizeof(steps) / sizeof(*steps), .filter = steps};
-    if (prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0) != 0 ||
-        prctl(PR_SET_SECCOMP, SECCOMP_MODE_FILTER, &filter) != 0) {
-        Die("the filter for requests");
-    }
 }
 
 pid_t Launch(char **argv)
@@ -101,7 +53,6 @@ pid_t Launch(char **argv)
         Die("the launch");
     }
     (void)raise(SIGSTOP);
-    RequestsWatch();
     (void)execv(argv[0], argv);
     Die(argv[0]);
 }
@@ -125,31 +76,6 @@ long MinorFaults(pid_t pid)
     return nFaults;
 }
 
-void RequestAnswer(pid_t pid)
-{
-    user_regs_struct registers = {};
-    if (ptrace(PTRACE_GETREGS, pid, nullptr, &registers) != 0) {
-        Die("registers");
-    }
-    for (const ANSWER &answer : ANSWERS) {
-        if (answer.request != registers.rsi) {
-            continue;
-        }
-        char zeros[sizeof(SYNC_STATUS)] = {};
-        const iovec here = {.iov_base = zeros, .iov_len = answer.cb};
-        const iovec there = {.iov_base = reinterpret_cast<void *>(registers.rdx),
-                             .iov_len = answer.cb};
-        if (process_vm_writev(pid, &here, 1, &there, 1, 0) < 0) {
-            Die("the answer");
-        }
-    }
-    registers.orig_rax = ~0ULL; // the driver does not get to see it
-    registers.rax = 0;
-    if (ptrace(PTRACE_SETREGS, pid, nullptr, &registers) != 0) {
-        Die("registers");
-    }
-}
-
 // What a stopped process is told when it goes on: the signal that it was stopped by, if it was one.
 int StopHandle(pid_t pid, int status, COUNTS &counts)
 {
@@ -162,9 +88,6 @@ int StopHandle(pid_t pid, int status, COUNTS &counts)
         return 0;
     }
     switch (event) {
-    case PTRACE_EVENT_SECCOMP:
-        RequestAnswer(pid);
-        return 0;
     case PTRACE_EVENT_EXEC:
         if (!counts.fStarted) {
             counts.nCalls = 1; // the execve that started the command
@@ -196,9 +119,8 @@ void Run(char **argv, bool fCalls, COUNTS &counts, rusage &usage)
         Die("the launch");
     }
     (void)ptrace(PTRACE_SETOPTIONS, pidFirst, 0,
-                 PTRACE_O_TRACESECCOMP | PTRACE_O_TRACEEXEC | PTRACE_O_TRACEFORK |
-                     PTRACE_O_TRACEVFORK | PTRACE_O_TRACECLONE | PTRACE_O_TRACESYSGOOD |
-                     PTRACE_O_EXITKILL);
+                 PTRACE_O_TRACEEXEC | PTRACE_O_TRACEFORK | PTRACE_O_TRACEVFORK |
+                     PTRACE_O_TRACECLONE | PTRACE_O_TRACESYSGOOD | PTRACE_O_EXITKILL);
     (void)ptrace(how, pidFirst, 0, 0);
     for (;;) {
         const pid_t pid = wait4(-1, &status, __WALL, &usage);
@@ -264,12 +186,10 @@ int main(int argc, char **argv)
     if (strcmp(szWhat, "calls") == 0) {
         Run(argv + 2, true, counts, usage);
         (void)printf("%ld %ld\n", counts.nCalls, counts.nChildren);
-    } else if (strcmp(szWhat, "answer") == 0) {
-        Run(argv + 2, false, counts, usage);
     } else if (strcmp(szWhat, "runs") == 0 && argc > 4) {
         RunsMeasure(atoi(argv[2]), argv + 3);
     } else {
-        (void)fputs("usage: measure calls|answer|runs N STATUS COMMAND [ARGUMENT]...\n", stderr);
+        (void)fputs("usage: measure calls|runs N STATUS COMMAND [ARGUMENT]...\n", stderr);
         return EXIT_BROKEN;
     }
     return 0;
