@@ -2,7 +2,8 @@
 #pragma once
 
 // Changing a disk's partition table with the system's partitioner. Nothing here sets a code of its
-// own; a failed command leaves that of the runner.
+// own: a program that ran and failed leaves the last-error record as it was, one that could not be
+// started what SpaceExecl says.
 
 #include "nurocore/types.h"
 

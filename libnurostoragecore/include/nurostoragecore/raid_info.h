@@ -52,18 +52,30 @@ struct RAID_INFO {
     RAID_DISK *pDisks; // owned by the record
 };
 
-// The array behind "/dev/md%d". Returns 1 with a record that the caller frees with RAIDInfoFree, 0
-// when the array is absent, -1 on failure: ERR_BAD_PARAMETER, ERR_BAD_FORMAT for another path,
-// ERR_OUT_OF_MEMORY, ERR_OPEN_FAILED, or the code of the request that failed. An inactive array
-// gives -1 with ERR_SYSCALL_FAILED.
+// The array behind "/dev/md%d". Returns 1 with a record that the caller frees with RAIDInfoFree, or
+// -1: ERR_BAD_PARAMETER, ERR_BAD_FORMAT for another path, ERR_OUT_OF_MEMORY, ERR_OPEN_FAILED, or
+// the code of the request that failed. 0 is reserved for an absent array, and callers are ready for
+// it, but it does not happen: a node without a running array gives -1 with ERR_SYSCALL_FAILED,
+// because RAIDIoctlInfo never leaves ERR_DEVICE_ABSENT.
 int RAIDInfoGet(const char *szMd, RAID_INFO **ppInfo);
 
 // NULL is ignored.
 void RAIDInfoFree(RAID_INFO *pInfo);
 
-// One request each to the open array. They return 0, or -1 with ERR_BAD_PARAMETER for NULL,
-// ERR_DEVICE_ABSENT for ENODEV, ERR_INTERRUPTED for EINTR and ERR_SYSCALL_FAILED otherwise, save
-// that RAIDIoctlInfo never leaves ERR_DEVICE_ABSENT and that size and rebuild know no EINTR.
+// One request each to the open array. They return 0, or -1 with a code in the last-error record:
+// ERR_BAD_PARAMETER for NULL (in RAIDRebuildStatusGet for a negative descriptor, too), else by
+// errno:
+//
+//                          | ENODEV             | EINTR              | any other
+//     RAIDIoctlInfo        | SYSCALL_FAILED (!) | INTERRUPTED        | SYSCALL_FAILED
+//     RAIDIoctlSize        | DEVICE_ABSENT      | SYSCALL_FAILED (!) | SYSCALL_FAILED
+//     RAIDIoctlStatus      | DEVICE_ABSENT      | INTERRUPTED        | SYSCALL_FAILED
+//     RAIDRebuildStatusGet | DEVICE_ABSENT      | SYSCALL_FAILED (!) | SYSCALL_FAILED
+//
+// (!) The two exceptions: RAIDIoctlInfo overwrites ERR_DEVICE_ABSENT, and neither size nor rebuild
+// tells an interruption from other failures. RAIDIoctlStatus gives ERR_SYSCALL_FAILED, too, for a
+// health that is none of the three. After a failure the size is 0 bytes, any other result
+// untouched.
 int RAIDIoctlInfo(int fd, mdu_array_info_t *pInfo);
 int RAIDIoctlSize(int fd, u64 *pcbArray);
 int RAIDIoctlStatus(int fd, u32 *pStatus);
