@@ -2,7 +2,6 @@
 //
 // The command line: words in, words out. What is meant for people goes to standard output, what is
 // meant for developers to syslog, nothing to standard error.
-#include "hwcontrol/device_path.h"
 #include "hwcontrol/disk_name.h"
 #include "hwcontrol/disk_path.h"
 #include "hwcontrol/disk_port.h"
@@ -174,6 +173,9 @@ constexpr int FORMAT_WIPE = 1;         // all partitions go
 constexpr int FORMAT_KEEP_DATA = 2;    // the system partitions are renewed
 constexpr int FORMAT_UNRECOGNISED = 4; // as KEEP_DATA, unless some other disk keeps its data
 
+constexpr int PARTITION_SYSTEM = 1;
+constexpr int PARTITION_SWAP = 2;
+
 constexpr char FORCE_CLEAN_MARKER[] = "/.force_clean_all_disk";
 
 // The one pair of versions between which an upgrade keeps the data partitions.
@@ -227,44 +229,38 @@ DISK_CHILD *ChildrenAlloc(int nDisk)
     return pChildren;
 }
 
-bool HasPartition(int partNum, const char *szDisk)
-{
-    u64 start = 0;
-    u32 type = 0;
-    return PartitionGeometryGet(partNum, szDisk, &start, &type) != PARTITION_ABSENT;
-}
-
-int TypeOfOtherLayout(const char *szDisk, u32 version, u32 wanted)
-{
-    if (wanted == UPGRADE_TO_VERSION && version == UPGRADE_FROM_VERSION) {
-        return FORMAT_KEEP_DATA;
-    }
-    return RAIDDiskIsUsedByRAID(szDisk, nullptr) == 1 ? FORMAT_NONE : FORMAT_WIPE;
-}
-
 // What a disk needs to carry the system partitions of the wanted layout.
-int DiskFormatTypeGet(const char *szName, u32 wanted)
+int DiskFormatTypeGet(const char *szDisk, u32 wanted)
 {
     constexpr int RAID_MACHINE = 1;
-    if (szName == nullptr) {
+    if (szDisk == nullptr) {
         NLIBCLog(LOG_ERR, "Null List Error");
         return FORMAT_NONE;
     }
-    const DEVICE_PATH disk = DevicePathOf(szName);
+    const DEVICE_PATH disk = DevicePathOf(szDisk);
     if (access(FORCE_CLEAN_MARKER, F_OK) == 0) {
         return FORMAT_WIPE;
     }
-    const bool fSystem = HasPartition(1, disk.sz);
-    const bool fSwap = HasPartition(2, disk.sz);
-    if (!fSystem && !fSwap) {
+    bool fSystem = false;
+    for (const int partNum : {PARTITION_SYSTEM, PARTITION_SWAP}) {
+        u64 start = 0;
+        u32 type = 0;
+        // Both are asked for, whatever the first answer is.
+        fSystem =
+            PartitionGeometryGet(partNum, disk.sz, &start, &type) != PARTITION_ABSENT || fSystem;
+    }
+    if (!fSystem) {
         return FORMAT_WIPE;
     }
     u32 version = 0;
     if (PartitionCheckLayout(disk.sz, RAID_MACHINE, &version) != 1) {
         return FORMAT_UNRECOGNISED;
     }
+    if (wanted == UPGRADE_TO_VERSION && version == UPGRADE_FROM_VERSION) {
+        return FORMAT_KEEP_DATA;
+    }
     if (version != wanted) {
-        return TypeOfOtherLayout(disk.sz, version, wanted);
+        return RAIDDiskIsUsedByRAID(disk.sz, nullptr) == 1 ? FORMAT_NONE : FORMAT_WIPE;
     }
     return wanted == ALWAYS_WIPED_VERSION ? FORMAT_WIPE : FORMAT_KEEP_DATA;
 }
@@ -355,8 +351,6 @@ void LeftOutTell(int nLeftOut, int nPartition)
 // --- initsys, initsys-dd -----------------------------------------------------------------------
 
 constexpr int CHILD_PARTITIONED = 1;
-constexpr int PARTITION_SYSTEM = 1;
-constexpr int PARTITION_SWAP = 2;
 // Whoever looks at new devices may still hold the fresh partitions; mdadm wants them free.
 constexpr unsigned int ARRAY_PAUSE_SECONDS = 3;
 constexpr size_t MISSING_TEXT_SIZE = 256;

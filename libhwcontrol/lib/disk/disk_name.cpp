@@ -1,7 +1,6 @@
 // SPDX-License-Identifier: MIT
 #include "hwcontrol/disk_name.h"
 
-#include "hwcontrol/device_path.h"
 #include "nurocore/error.h"
 #include "nurocore/handle.h"
 #include "nurocore/log.h"
@@ -20,6 +19,8 @@
 namespace
 {
 
+constexpr char DEVICE_DIRECTORY[] = "/dev/";
+constexpr char DEVICE_DIRECTORY_NAME[] = "/dev";
 constexpr char SD_PREFIX[] = "sd";
 constexpr char MMC_NAME[] = "mmcblk";
 constexpr char BOOT_NAME[] = "nuroboot";
@@ -63,7 +64,45 @@ bool IsPartitionRequestValid(const char *szDisk, int partNum, const char *szOut,
     return true;
 }
 
+// Kept: what begins with "/dev" loses five characters, whatever the fifth is; partitions have
+// always been named so.
+const char *DeviceNameBehindDev(const char *szDevice)
+{
+    const bool fPath = std::string_view(szDevice).starts_with(DEVICE_DIRECTORY_NAME);
+    return fPath ? szDevice + std::min(strlen(szDevice), strlen(DEVICE_DIRECTORY)) : szDevice;
+}
+
 } // namespace
+
+void DevicePathBuild(const char *szDevice, char *szPath, size_t cbPath)
+{
+    if (snprintf(szPath, cbPath, "%s%s", DEVICE_DIRECTORY, szDevice) < 0) {
+        szPath[0] = '\0';
+    }
+}
+
+DEVICE_PATH DevicePathOf(const char *szDevice)
+{
+    DEVICE_PATH path;
+    DevicePathBuild(szDevice, path.sz, sizeof(path.sz));
+    return path;
+}
+
+const char *DeviceNameOf(const char *szDevice)
+{
+    const bool fPath = std::string_view(szDevice).starts_with(DEVICE_DIRECTORY);
+    return fPath ? szDevice + strlen(DEVICE_DIRECTORY) : szDevice;
+}
+
+const char *DeviceNameWithin(const char *szDevice)
+{
+    const char *const pchDirectory = strstr(szDevice, DEVICE_DIRECTORY_NAME);
+    if (pchDirectory == nullptr) {
+        return szDevice;
+    }
+    const char *const pchSlash = strchr(pchDirectory + 1, '/');
+    return pchSlash == nullptr ? szDevice : pchSlash + 1;
+}
 
 int DiskIndexGet(const char *szName)
 {
@@ -89,8 +128,8 @@ int DiskPartitionNumGet(const char *szName, char *szDisk, int cbDisk)
     const bool fMmc = IsMmc(szName);
     const size_t cchDisk =
         std::min(strcspn(szName, fMmc ? "p" : "123456789"), static_cast<size_t>(cbDisk) - 1);
+    memset(szDisk, 0, static_cast<size_t>(cbDisk));
     memcpy(szDisk, szName, cchDisk);
-    szDisk[cchDisk] = '\0';
     if (cchDisk == 0) {
         return -1;
     }

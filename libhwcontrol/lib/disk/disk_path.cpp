@@ -1,7 +1,6 @@
 // SPDX-License-Identifier: MIT
 #include "hwcontrol/disk_path.h"
 
-#include "hwcontrol/device_path.h"
 #include "hwcontrol/disk_name.h"
 #include "nurocore/error.h"
 #include "nurocore/log.h"

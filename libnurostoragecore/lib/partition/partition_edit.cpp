@@ -1,7 +1,6 @@
 // SPDX-License-Identifier: MIT
 #include "nurostoragecore/partition_edit.h"
 
-#include "hwcontrol/device_path.h"
 #include "hwcontrol/disk_name.h"
 #include "nurocore/io.h"
 #include "nurocore/log.h"

@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: MIT
 #include "nurostoragecore/partition_enum.h"
 
-#include "hwcontrol/device_path.h"
+#include "hwcontrol/disk_name.h"
 #include "hwcontrol/disk_path.h"
 #include "nurocore/error.h"
 #include "nurocore/file.h"

@@ -2,7 +2,6 @@
 #include "nurostoragecore/partition_layout.h"
 
 #include "attribute/attribute.h"
-#include "hwcontrol/device_path.h"
 #include "hwcontrol/disk_name.h"
 #include "nurocore/conf.h"
 #include "nurocore/error.h"

@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: MIT
 #include "nurostoragecore/partition_version.h"
 
-#include "hwcontrol/device_path.h"
+#include "hwcontrol/disk_name.h"
 #include "hwcontrol/disk_port.h"
 #include "nurocore/error.h"
 #include "nurocore/handle.h"

@@ -2,7 +2,6 @@
 #include "nurostoragecore/raid_disk.h"
 
 #include "attribute/attribute.h"
-#include "hwcontrol/device_path.h"
 #include "hwcontrol/disk_name.h"
 #include "nurocore/error.h"
 #include "nurocore/handle.h"

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: MIT
-#include "hwcontrol/device_path.h"
+#include "hwcontrol/disk_name.h"
 
 #include <gtest/gtest.h>
 
@@ -32,23 +32,22 @@ TEST(DevicePath, IsCutToTheCallersBuffer)
 
 struct NAME_CASE {
     const char *szPath;
-    const char *szLeading;   // behind a leading "/dev/"
-    const char *szBehindDev; // behind "/dev" and one more character
-    const char *szWithin;    // behind "/dev" and a "/", wherever
+    const char *szLeading; // behind a leading "/dev/"
+    const char *szWithin;  // behind "/dev" and a "/", wherever
 };
 
 constexpr NAME_CASE NAME_CASES[] = {
-    {"sda", "sda", "sda", "sda"},
-    {"/dev/sda3", "sda3", "sda3", "sda3"},
-    {"/dev/", "", "", ""},
-    {"/dev", "/dev", "", "/dev"},
-    {"/devsda", "/devsda", "da", "/devsda"},
-    {"/devices/sda", "/devices/sda", "ces/sda", "sda"},
-    {"/tmp/dev/sda", "/tmp/dev/sda", "/tmp/dev/sda", "sda"},
-    {"dev/sda", "dev/sda", "dev/sda", "dev/sda"},
-    {"/dev/mapper/sda", "mapper/sda", "mapper/sda", "mapper/sda"},
-    {"/dev//dev/sda", "/dev/sda", "/dev/sda", "/dev/sda"},
-    {"", "", "", ""},
+    {"sda", "sda", "sda"},
+    {"/dev/sda3", "sda3", "sda3"},
+    {"/dev/", "", ""},
+    {"/dev", "/dev", "/dev"},
+    {"/devsda", "/devsda", "/devsda"},
+    {"/devices/sda", "/devices/sda", "sda"},
+    {"/tmp/dev/sda", "/tmp/dev/sda", "sda"},
+    {"dev/sda", "dev/sda", "dev/sda"},
+    {"/dev/mapper/sda", "mapper/sda", "mapper/sda"},
+    {"/dev//dev/sda", "/dev/sda", "/dev/sda"},
+    {"", "", ""},
 };
 
 TEST(DeviceName, IsWhatStandsBehindTheDirectory)
@@ -56,8 +55,29 @@ TEST(DeviceName, IsWhatStandsBehindTheDirectory)
     for (const NAME_CASE &row : NAME_CASES) {
         SCOPED_TRACE(row.szPath);
         EXPECT_STREQ(DeviceNameOf(row.szPath), row.szLeading);
-        EXPECT_STREQ(DeviceNameBehindDev(row.szPath), row.szBehindDev);
         EXPECT_STREQ(DeviceNameWithin(row.szPath), row.szWithin);
+    }
+}
+
+struct CLEARED_CASE {
+    const char *szName;
+    int result;
+    const char *szDisk;
+};
+
+TEST(DiskPartitionNumGet, ClearsTheWholeBuffer)
+{
+    for (const CLEARED_CASE &row : {CLEARED_CASE{"sda12", 12, "sda"},
+                                    {"sdb", 0, "sdb"},
+                                    {"mmcblk0p3", 3, "mmcblk0"},
+                                    {"", -1, ""},
+                                    {"12", -1, ""}}) {
+        SCOPED_TRACE(row.szName);
+        std::string buffer(24, '~');
+        EXPECT_EQ(DiskPartitionNumGet(row.szName, buffer.data(), 16), row.result);
+        std::string expected = row.szDisk;
+        expected.resize(16, '\0');
+        EXPECT_EQ(buffer, expected + "~~~~~~~~");
     }
 }
 
