@@ -2,16 +2,17 @@
 //
 // Makes every call into the C library that can fail, fail in turn: once only, and from the n-th on.
 //
-//     fault_tests [--all] [--every N] [--thin N] [--jobs J] [--only TEXT] [--minimum FILE] [--show]
+//     fault_tests [--all] [--every N] [--thin N] [--minimum FILE] [--show] [FILTER]
 //
 // Without --all, each call of each process of each situation fails once, with one of its error
 // numbers, and of the rest a part is run: one in N. --thin takes one in N of all that would be run,
-// for a tool that is slow to start, as one with sanitizers is. --only takes the situations whose
-// name holds the text. --show tells every run that differs from the undisturbed one.
+// for a tool that is slow to start, as one with sanitizers is. --show tells every run that differs
+// from the undisturbed one.
 #include "judge.h"
 #include "sandbox.h"
 #include "situations.h"
 #include "suite.h"
+#include "verdict.h"
 
 #include <algorithm>
 #include <cerrno>
@@ -30,14 +31,14 @@ using STRINGS = std::vector<string>;
 
 constexpr int CALLS_MAX = 2000; // a call that fails for ever ends the loop here
 constexpr char EVERY_CALL[] = "*";
+constexpr char MINIMUM_OF[] = "minimum of ";
 
 struct OPTIONS {
     bool fAll = false;
     bool fShow = false;
     std::uint64_t every = 8;
     std::uint64_t thin = 1;
-    std::uint64_t jobs = 2;
-    string szOnly = {};
+    string szFilter = {};
     string szMinimum = {};
 };
 
@@ -180,7 +181,7 @@ bool IsDue(SWEEP &sweep, bool fAlways)
     }
     const size_t point = sweep.nPoint++;
     return point % sweep.options.thin == 0 &&
-           point / sweep.options.thin % sweep.options.jobs == sweep.worker;
+           point / sweep.options.thin % VerdictWorkers() == sweep.worker;
 }
 
 // One function of one process, all its calls. With --all the loop goes on until nothing fails.
@@ -246,23 +247,30 @@ TALLY SituationSweep(const OPTIONS &options, const SITUATION &situation, size_t 
 
 // ---- the suite ---------------------------------------------------------------------------------
 
+// A minimum is about all situations.
+bool IsWhole(const OPTIONS &options)
+{
+    return options.szFilter.empty() || options.szFilter.starts_with(MINIMUM_OF);
+}
+
 // Lines "COMMAND NUMBER": no fewer injections than were once reached.
-void MinimumCheck(const OPTIONS &options, std::map<string, std::uint64_t> &byCommand,
-                  COUNTS &counts)
+void MinimumCheck(const OPTIONS &options, std::map<string, std::uint64_t> &byCommand)
 {
     std::ifstream file(options.szMinimum);
     string szCommand;
     std::uint64_t minimum = 0;
-    VerdictTell(counts, file.good(), "minimum: " + options.szMinimum);
+    VerdictTell(string(MINIMUM_OF) + "all", file.good() ? "" : "cannot read " + options.szMinimum);
     while (file >> szCommand >> minimum) {
-        VerdictTell(counts, byCommand[szCommand] >= minimum,
-                    "minimum: " + szCommand + " has " + to_string(byCommand[szCommand]) +
-                        " injections, it had " + to_string(minimum));
+        const string szReached = to_string(byCommand[szCommand]) + " injections";
+        VerdictTell(string(MINIMUM_OF) + szCommand,
+                    byCommand[szCommand] >= minimum ? ""
+                                                    : szReached + ", it had " + to_string(minimum),
+                    szReached);
     }
 }
 
 void TotalsTell(const OPTIONS &options, const std::vector<SITUATION> &situations,
-                const std::vector<TEST_TOTAL> &totals, COUNTS &counts)
+                const std::vector<TEST_TOTAL> &totals)
 {
     std::map<string, std::uint64_t> allowed;
     std::map<string, std::uint64_t> byCommand;
@@ -279,8 +287,8 @@ void TotalsTell(const OPTIONS &options, const std::vector<SITUATION> &situations
         const string szReason = AllowanceText(row);
         printf("allowed %s times: %s\n", to_string(allowed[szReason]).c_str(), szReason.c_str());
     }
-    if (!options.szMinimum.empty()) {
-        MinimumCheck(options, byCommand, counts);
+    if (!options.szMinimum.empty() && IsWhole(options)) {
+        MinimumCheck(options, byCommand);
     }
     printf("fault: %s injections\n", to_string(injections).c_str());
 }
@@ -289,20 +297,16 @@ int SituationsTry(const OPTIONS &options)
 {
     std::vector<SITUATION> situations = SituationsMake();
     std::erase_if(situations, [&](const SITUATION &situation) {
-        return situation.szName.find(options.szOnly) == string::npos;
+        return !IsWhole(options) && !VerdictWanted(situation.szName, options.szFilter);
     });
-    SUITE suite = {.szDone = "injections",
-                   .szAgain = "fault_tests --only",
-                   .nWorker = options.jobs,
-                   .work = [&](size_t test, size_t worker) {
+    SUITE suite = {.szDone = "injections", .work = [&](size_t test, size_t worker) {
                        return SituationSweep(options, situations[test], worker);
                    }};
     for (const SITUATION &situation : situations) {
         suite.names.push_back(situation.szName);
     }
-    COUNTS counts;
-    TotalsTell(options, situations, SuiteRun(suite, counts), counts);
-    return CountsTell(counts);
+    TotalsTell(options, situations, SuiteRun(suite));
+    return EXIT_SUCCESS;
 }
 
 } // namespace
@@ -314,8 +318,7 @@ int main(int argc, char *argv[])
                                     {{"--all", &options.fAll},
                                      {"--every", &options.every},
                                      {"--thin", &options.thin},
-                                     {"--jobs", &options.jobs},
-                                     {"--only", &options.szOnly},
+                                     {"", &options.szFilter},
                                      {"--minimum", &options.szMinimum},
                                      {"--show", &options.fShow}});
     return fTaken ? SituationsTry(options) : EXIT_FAILURE;

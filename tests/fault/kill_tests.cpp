@@ -3,7 +3,7 @@
 // Kills the tool at every system call of every command that changes something, runs the command
 // again, and compares what the machine is like with what an undisturbed run makes of it.
 //
-//     kill_tests [--all] [--every N] [--jobs J] [--only TEXT]
+//     kill_tests [--all] [--every N] [FILTER]
 //
 // The tool is killed alone, so that what it has started comes to its own end, or with all of that
 // at any system call of its own processes. Without --all, one in N points is tried.
@@ -12,6 +12,7 @@
 #include "sandbox.h"
 #include "storage_machine.h"
 #include "suite.h"
+#include "verdict.h"
 
 #include <algorithm>
 #include <cstdio>
@@ -33,6 +34,7 @@ using STRINGS = std::vector<string>;
 namespace fs = std::filesystem;
 
 constexpr std::uint64_t MINIMUM = 1000;
+constexpr char MINIMUM_NAME[] = "minimum of kills";
 constexpr int RUN_BOUND = 30000; // milliseconds; the machine may be busy with something else
 constexpr char RUNNER[] = "ARRAYCTL_RUNNER";
 
@@ -43,8 +45,7 @@ constexpr const char *TOOLS[] = {"/sbin/mdadm",    "/sbin/sfdisk",   "/sbin/pvs"
 struct OPTIONS {
     bool fAll = false;
     std::uint64_t every = 3; // odd, so that both kinds of killing get their turn
-    std::uint64_t jobs = 2;
-    string szOnly = {};
+    string szFilter = {};
 };
 
 // ---- machines that remember --------------------------------------------------------------------
@@ -304,7 +305,7 @@ TALLY CaseRun(const OPTIONS &options, const KILL_CASE &subject, size_t worker)
     }
     size_t due = 0;
     for (size_t i = 0; i < points.size(); i++) {
-        if ((options.fAll || i % options.every == 0) && due++ % options.jobs == worker) {
+        if ((options.fAll || i % options.every == 0) && due++ % VerdictWorkers() == worker) {
             PointTry(subject, points[i], expected, tally);
         }
     }
@@ -313,8 +314,13 @@ TALLY CaseRun(const OPTIONS &options, const KILL_CASE &subject, size_t worker)
 
 // ---- the suite ---------------------------------------------------------------------------------
 
-void TotalsTell(const OPTIONS &options, const SUITE &suite, const std::vector<TEST_TOTAL> &totals,
-                COUNTS &counts)
+// The minimum is about all cases.
+bool IsWhole(const OPTIONS &options)
+{
+    return options.szFilter.empty() || options.szFilter == MINIMUM_NAME;
+}
+
+void TotalsTell(const OPTIONS &options, const SUITE &suite, const std::vector<TEST_TOTAL> &totals)
 {
     std::uint64_t kills = 0;
     for (size_t i = 0; i < totals.size(); i++) {
@@ -324,30 +330,27 @@ void TotalsTell(const OPTIONS &options, const SUITE &suite, const std::vector<TE
                    szReason.c_str());
         }
     }
-    if (options.szOnly.empty()) {
-        VerdictTell(counts, kills >= MINIMUM, "minimum: " + to_string(MINIMUM) + " kills");
+    if (IsWhole(options)) {
+        VerdictTell(MINIMUM_NAME, kills >= MINIMUM ? "" : "it was " + to_string(MINIMUM),
+                    to_string(kills) + " kills");
     }
-    printf("kill: %s points\n", to_string(kills).c_str());
 }
 
 int CasesTry(const OPTIONS &options)
 {
     std::vector<KILL_CASE> cases = CasesMake();
     std::erase_if(cases, [&](const KILL_CASE &subject) {
-        return subject.szName.find(options.szOnly) == string::npos;
+        return !IsWhole(options) && !VerdictWanted(subject.szName, options.szFilter);
     });
-    SUITE suite = {
-        .szDone = "kills",
-        .szAgain = "kill_tests --only",
-        .nWorker = options.jobs,
-        .work = [&](size_t test, size_t worker) { return CaseRun(options, cases[test], worker); }};
+    SUITE suite = {.szDone = "kills", .work = [&](size_t test, size_t worker) {
+                       return CaseRun(options, cases[test], worker);
+                   }};
     for (KILL_CASE &subject : cases) {
         suite.names.push_back(subject.szName);
         subject.machine = Remembering(std::move(subject.machine));
     }
-    COUNTS counts;
-    TotalsTell(options, suite, SuiteRun(suite, counts), counts);
-    return CountsTell(counts);
+    TotalsTell(options, suite, SuiteRun(suite));
+    return EXIT_SUCCESS;
 }
 
 } // namespace
@@ -355,10 +358,8 @@ int CasesTry(const OPTIONS &options)
 int main(int argc, char *argv[])
 {
     OPTIONS options;
-    const bool fTaken = OptionsTake(argc, argv,
-                                    {{"--all", &options.fAll},
-                                     {"--every", &options.every},
-                                     {"--jobs", &options.jobs},
-                                     {"--only", &options.szOnly}});
+    const bool fTaken = OptionsTake(
+        argc, argv,
+        {{"--all", &options.fAll}, {"--every", &options.every}, {"", &options.szFilter}});
     return fTaken ? CasesTry(options) : EXIT_FAILURE;
 }

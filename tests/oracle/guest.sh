@@ -17,7 +17,6 @@ RECORDS=$ORACLE/records
 DUPLICATOR=/bin/nurodd
 LETTERS='a b c d e f g h i j'
 MARKERS='/.force_clean_all_disk /tmp/.dualhead /tmp/.not.dualhead /tmp/raid.0 /tmp/raid.1 /tmp/raid.5'
-RUN_SECONDS=100
 
 # --- the tools ---------------------------------------------------------------------------------
 
@@ -217,7 +216,7 @@ log_is_complete() {
 run() {
     record_machine >"$CURRENT/machine"
     : >"$SYSLOG"
-    timeout "$RUN_SECONDS" strace -A -q -o "$CURRENT/calls" -e signal=none \
+    strace -A -q -o "$CURRENT/calls" -e signal=none \
         -e trace=clock_nanosleep -e inject=clock_nanosleep:retval=0 \
         arrayctl "$@" >"$CURRENT/out" 2>"$CURRENT/err"
     echo $? >"$CURRENT/status"

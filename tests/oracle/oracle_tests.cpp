@@ -2,20 +2,22 @@
 //
 // Runs the finished program on random machines in the sandbox and asks the model what it must do.
 //
-//     oracle_tests [--machines N] [--seed S] [--jobs J] [--show]
+//     oracle_tests [--machines N] [--seed S] [--show] [SEED]
 //
 // Machine i is made from seed S + i (S is the environment's ORACLE_SEED unless given), so a failing
-// one comes back with "--machines 1 --seed" and its seed. --show prints machines and answers.
+// one comes back with its seed alone. --show prints machines and answers.
 #include "oracle_compare.h"
 #include "oracle_machine.h"
 #include "oracle_model.h"
 #include "sandbox.h"
 #include "suite.h"
+#include "verdict.h"
 #include "wire.h"
 
 #include <algorithm>
 #include <cstdio>
 #include <cstdlib>
+#include <cstring>
 
 namespace
 {
@@ -25,7 +27,7 @@ using std::to_string;
 using std::vector;
 using u64 = std::uint64_t;
 
-constexpr u64 MACHINES_OF_TEST = 250;
+constexpr char SEED_OF[] = "seed ";
 constexpr int BOUND = 60000; // milliseconds; the machine may be busy with something else
 constexpr const char SHELL[] = "/bin/sh";
 constexpr const char MD0_MEMBER[] = "/sys/block/md0/md/dev-";
@@ -33,7 +35,6 @@ constexpr const char MD0_MEMBER[] = "/sys/block/md0/md/dev-";
 struct OPTIONS {
     u64 machines = 2000;
     u64 seed = 1;
-    u64 jobs = 2;
     bool fShow = false;
 };
 
@@ -305,46 +306,41 @@ string CaseRun(const OPTIONS &options, u64 seed)
     if (differences.empty()) {
         return "";
     }
-    string text = "seed " + to_string(seed) + ": tool and model differ on this machine\n" +
-                  OracleCaseText(subject);
+    string text = "tool and model differ on this machine\n" + OracleCaseText(subject);
     for (const string &szDifference : differences) {
         text += "difference in " + szDifference;
     }
-    return text + "again with: oracle_tests --machines 1 --seed " + to_string(seed) + "\n";
+    return text;
 }
 
-TALLY CasesRun(const OPTIONS &options, size_t test, size_t worker)
+void MachinesTry(const OPTIONS &options)
 {
-    TALLY tally;
-    const u64 first = test * MACHINES_OF_TEST;
-    const u64 end = std::min(first + MACHINES_OF_TEST, options.machines);
-    for (u64 i = first + worker; i < end; i += options.jobs) {
-        const string szWrong = CaseRun(options, options.seed + i);
-        tally.done++;
-        if (!szWrong.empty()) {
-            tally.wrong.push_back(szWrong);
-        }
+    // Each machine is one worker's.
+    SUITE suite = {.szDone = "", .work = [&](size_t test, size_t worker) {
+                       TALLY tally;
+                       const string szWrong = test % VerdictWorkers() == worker
+                                                  ? CaseRun(options, options.seed + test)
+                                                  : "";
+                       if (!szWrong.empty()) {
+                           tally.wrong.push_back(szWrong);
+                       }
+                       return tally;
+                   }};
+    for (u64 i = 0; i < options.machines; i++) {
+        suite.names.push_back(SEED_OF + to_string(options.seed + i));
     }
-    return tally;
+    (void)SuiteRun(suite);
 }
 
-int MachinesTry(const OPTIONS &options)
+// One seed is one machine.
+bool FilterTake(OPTIONS &options, const string &szFilter)
 {
-    SUITE suite = {
-        .szDone = "machines",
-        .szAgain = "",
-        .nWorker = options.jobs,
-        .work = [&](size_t test, size_t worker) { return CasesRun(options, test, worker); }};
-    for (u64 i = 0; i < options.machines; i += MACHINES_OF_TEST) {
-        suite.names.push_back("machines from seed " + to_string(options.seed + i));
+    if (szFilter.empty()) {
+        return true;
     }
-    COUNTS counts;
-    u64 machines = 0;
-    for (const TEST_TOTAL &total : SuiteRun(suite, counts)) {
-        machines += total.done;
-    }
-    printf("oracle: %s machines\n", to_string(machines).c_str());
-    return CountsTell(counts);
+    options.machines = 1;
+    const size_t cbPrefix = szFilter.starts_with(SEED_OF) ? strlen(SEED_OF) : 0;
+    return NumberTake(szFilter.c_str() + cbPrefix, options.seed);
 }
 
 } // namespace
@@ -352,12 +348,18 @@ int MachinesTry(const OPTIONS &options)
 int main(int argc, char *argv[])
 {
     OPTIONS options;
+    string szFilter;
     const char *const szSeed = getenv("ORACLE_SEED");
     const bool fSeed = szSeed == nullptr || NumberTake(szSeed, options.seed);
-    const bool fTaken = fSeed && OptionsTake(argc, argv,
-                                             {{"--machines", &options.machines},
-                                              {"--seed", &options.seed},
-                                              {"--jobs", &options.jobs},
-                                              {"--show", &options.fShow}});
-    return fTaken ? MachinesTry(options) : EXIT_FAILURE;
+    if (!fSeed ||
+        !OptionsTake(argc, argv,
+                     {{"--machines", &options.machines},
+                      {"--seed", &options.seed},
+                      {"--show", &options.fShow},
+                      {"", &szFilter}}) ||
+        !FilterTake(options, szFilter)) {
+        return EXIT_FAILURE;
+    }
+    MachinesTry(options);
+    return EXIT_SUCCESS;
 }

@@ -7,12 +7,14 @@ usage: compare_transcripts.py FOLDER FOLDER
 Each file is one run: output, exit status, syslog lines, commands. Two of them are the same when
 every byte is. Workers that run side by side come in any order on one processor already; of such a
 run the commands about one disk must be the same in the same order, and so must its log lines.
-Ends with 'N passed, M failed'.
 """
 import difflib
 import os
 import re
 import sys
+
+sys.path.insert(0, os.path.join(os.path.dirname(__file__), "../support/verdict"))
+import verdict  # noqa: E402
 
 LOG = "== log\n"
 EVENTS = "== events\n"
@@ -43,38 +45,25 @@ def without_order(text):
         line for _, lines in grouped for line in lines)
 
 
-def show(name, here, there):
-    print(f"DIFFERENT: {name}")
-    sys.stdout.writelines(
-        line if line.endswith("\n") else line + "\n"
-        for line in difflib.unified_diff(
-            here.splitlines(keepends=True), there.splitlines(keepends=True), "here", "there"))
+def difference(here, there):
+    """What is wrong, None when nothing is, and a remark."""
+    if here == there:
+        return None, ""
+    here, there = without_order(here), without_order(there)
+    if here == there:
+        return None, "workers in another order"
+    lines = (text.splitlines() for text in (here, there))
+    return "\n".join(difflib.unified_diff(*lines, "here", "there", lineterm="")), ""
 
 
 def main():
-    here, there = sys.argv[1:3]
-    names = sorted(set(os.listdir(here)) | set(os.listdir(there)))
-    passed, failed, reordered = 0, 0, 0
-    for name in names:
-        paths = [os.path.join(folder, name) for folder in (here, there)]
+    folders = sys.argv[1:3]
+    for name in sorted(set(os.listdir(folders[0])) | set(os.listdir(folders[1]))):
+        paths = [os.path.join(folder, name) for folder in folders]
         missing = [path for path in paths if not os.path.exists(path)]
-        if missing:
-            print(f"MISSING: {missing[0]}")
-            failed += 1
-            continue
-        texts = [read(path) for path in paths]
-        if texts[0] == texts[1]:
-            passed += 1
-        elif without_order(texts[0]) == without_order(texts[1]):
-            passed += 1
-            reordered += 1
-        else:
-            failed += 1
-            show(name, *map(without_order, texts))
-    print(f"{len(names)} runs, {reordered} of them with workers in another order")
-    print(f"{passed} passed, {failed} failed")
-    return 1 if failed or not names else 0
+        wrong, note = (f"no {missing[0]}", "") if missing else difference(*map(read, paths))
+        verdict.tell(f"transcript: {name}", wrong, note)
 
 
 if __name__ == "__main__":
-    sys.exit(main())
+    main()

@@ -101,6 +101,6 @@ machine_qemu() {
     exec "$POWERPC_QEMU" -nodefaults -no-user-config -display none -no-reboot \
         -machine ppce500 -cpu e500v2 -m "$POWERPC_MEMORY_MB" \
         -kernel "$szBaseDir/vmlinux" -initrd "$szWorkDir/initrd" \
-        -append "console=ttyS0 panic=-1 oops=panic scsi_mod.scan=manual DISKS=$nDisks $szKernelLine" \
+        -append "console=ttyS0 panic=-1 oops=panic scsi_mod.scan=manual DISKS=$nDisks SILENCE=$((nSilence / 2)) $szKernelLine" \
         -device virtio-scsi-pci,id=scsi "${diskArguments[@]}" "$@"
 }

@@ -13,8 +13,9 @@ import subprocess
 import sys
 import tempfile
 
-import calls
-import cases
+sys.path.insert(0, os.path.join(os.path.dirname(__file__), "../support/verdict"))
+import calls  # noqa: E402
+import verdict  # noqa: E402
 
 ROOT = os.path.abspath(os.path.join(os.path.dirname(__file__), "../.."))
 PROGRAM = os.path.join(os.path.abspath(sys.argv[1]), "tool/arrayctl")
@@ -77,17 +78,17 @@ def run(*arguments):
 
 
 def case_the_page_has_the_commands_of_the_program():
-    cases.same(re.findall(r"^     arrayctl (\S+)", section("SYNOPSIS"), re.M), words_of("COMMANDS"), "SYNOPSIS")
-    cases.same(re.findall(r"^   (\S+)", section("DESCRIPTION"), re.M), words_of("COMMANDS"), "DESCRIPTION")
+    verdict.same(re.findall(r"^     arrayctl (\S+)", section("SYNOPSIS"), re.M), words_of("COMMANDS"), "SYNOPSIS")
+    verdict.same(re.findall(r"^   (\S+)", section("DESCRIPTION"), re.M), words_of("COMMANDS"), "DESCRIPTION")
 
 
 def case_the_completion_has_the_commands_of_the_program():
     listed = re.search(r"words=\((status.*?)\)", read("tool/completion/arrayctl"), re.S).group(1)
-    cases.same(listed.split(), words_of("COMMANDS"), "completion")
+    verdict.same(listed.split(), words_of("COMMANDS"), "completion")
 
 
 def case_the_program_knows_these_commands_and_no_other():
-    cases.same(words_of("COMMANDS"), COMMANDS, "program")
+    verdict.same(words_of("COMMANDS"), COMMANDS, "program")
     for word in COMMANDS:
         assert "command not recognized" not in run(word, "7")[0], word
     assert run("stop")[0].startswith("command not recognized\nusage:\n")
@@ -96,7 +97,7 @@ def case_the_program_knows_these_commands_and_no_other():
 def case_the_usage_has_the_first_five_commands():
     text, status = run()
     assert status == 1
-    cases.same(re.findall(r"^\tarrayctl (\S+)", text, re.M), COMMANDS[:5], "usage")
+    verdict.same(re.findall(r"^\tarrayctl (\S+)", text, re.M), COMMANDS[:5], "usage")
     assert "it leaves out the two enumerations" in page()
 
 
@@ -119,7 +120,7 @@ def case_the_page_has_every_message():
 
 def case_the_page_has_the_exit_statuses():
     statuses = section("EXIT STATUS")
-    cases.same(re.findall(r"^     (\d+|number of disks)\b", statuses, re.M), ("0", "1", "number of disks", "255"),
+    verdict.same(re.findall(r"^     (\d+|number of disks)\b", statuses, re.M), ("0", "1", "number of disks", "255"),
                "EXIT STATUS")
     expected = {"status": 1, "destroy": 0, "newvol": 1, "initsys": 1, "initsys-dd": 1, "enumformatalldisks": 0,
                 "enumformatalldisks_indualhead_install": 0}
@@ -184,7 +185,7 @@ def case_the_log_page_has_every_line_that_ends_an_operation():
 def case_the_architecture_page_has_the_functions_that_no_command_calls():
     listed = re.search(r"## Functions that no command calls\n(.*?)\n## ", read("docs/architecture.md"), re.S).group(1)
     rows = re.findall(r"^\| `(\w+)` \| (.*?) \| .*? \|$", listed, re.M)
-    cases.same([name for _, names in rows for name in re.findall(r"`(\w+)`", names)], calls.uncalled(), "architecture.md")
+    verdict.same([name for _, names in rows for name in re.findall(r"`(\w+)`", names)], calls.uncalled(), "architecture.md")
     tests = "".join(read(path) for path in glob.glob("tests/*/*_test.cpp", root_dir=ROOT))
     for module, names in rows:
         header = read(*glob.glob(f"lib*/include/*/{module}.h", root_dir=ROOT))
@@ -201,7 +202,7 @@ def case_the_log_page_tells_which_lines_no_command_can_write():
         (by_commands if node in reached else by_others).update(literal(text) for text in found)
     told = re.search(r"### Never by a command\n(.*?)\n## ", read("docs/log.md"), re.S).group(1)
     told = re.sub(r"\[.*?\]\(.*?\)", "", told).replace("\n", " ")
-    cases.same(re.findall(r"`([^`]+)`", told), by_others - by_commands, "log.md")
+    verdict.same(re.findall(r"`([^`]+)`", told), by_others - by_commands, "log.md")
 
 
-cases.run(sys.modules[__name__])
+verdict.cases(globals(), "".join(sys.argv[2:3]))

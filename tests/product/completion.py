@@ -9,23 +9,20 @@ import pty
 import re
 import select
 import sys
-import time
 
-import cases
+sys.path.insert(0, os.path.join(os.path.dirname(__file__), "../support/verdict"))
+import verdict  # noqa: E402
 
 ROOT = os.path.abspath(os.path.join(os.path.dirname(__file__), "../.."))
 ARRAYS = "mount -t tmpfs none /sys/block && mkdir /sys/block/md0 /sys/block/md12 /sys/block/md127 " \
          "/sys/block/md_d0 /sys/block/sda"
 PROMPT = "ready> "
-PATIENCE_SECONDS = 20
 
 
 def wait_for(terminal, pattern, seen=""):
-    deadline = time.monotonic() + PATIENCE_SECONDS
     while not re.search(pattern, seen):
-        assert time.monotonic() < deadline, f"no {pattern!r} in {seen!r}"
-        if select.select([terminal], [], [], 0.1)[0]:
-            seen += os.read(terminal, 4096).decode()
+        assert select.select([terminal], [], [], verdict.silence())[0], f"no {pattern!r} in {seen!r}"
+        seen += os.read(terminal, 4096).decode()
     return seen
 
 
@@ -76,4 +73,4 @@ def case_nothing_else_is_offered():
         assert typed(keys) == keys.replace("\t", "").rstrip(" ") + (" " if keys[-2] == " " else "") + "=end", keys
 
 
-cases.run(sys.modules[__name__])
+verdict.cases(globals(), "".join(sys.argv[1:2]))

@@ -16,7 +16,8 @@ import subprocess
 import sys
 import tempfile
 
-import cases
+sys.path.insert(0, os.path.join(os.path.dirname(__file__), "../support/verdict"))
+import verdict  # noqa: E402
 
 ROOT = os.path.abspath(os.path.join(os.path.dirname(__file__), "../.."))
 PROMPT = "appliance# "
@@ -51,7 +52,7 @@ def blocks():
             before = line if line.strip() and not line.startswith("    ") else before if line.strip() else ""
 
 
-STARTS = ("./", "cmake ", "ctest ", "packaging/", "tests/", "appliance/", "bench/", "docs/pictures/", "build/",
+STARTS = ("./", "cmake ", "packaging/", "tests/", "appliance/", "bench/", "docs/pictures/", "build/",
           "DESTDIR=", "mdrequests ", "ln ", "git ", PROMPT)
 
 
@@ -75,22 +76,33 @@ def by_check(command):
         assert re.search(rf"(^|\s){re.escape(word)}(\s|$)", known), f"./check knows no {word}"
 
 
+def names_of(kind):
+    return [row["name"] for row in json.loads(read("CMakePresets.json"))[kind]]
+
+
+def suites():
+    return re.findall(r"^([\w-]+) \|", read("tests/suites"), re.M)
+
+
 def by_preset(command):
     """Presets are built by ./check; here they only have to exist, and targets, too."""
     words = command.split()
     if "--preset" in words:
         preset = words[words.index("--preset") + 1]
-        kind = {"ctest": "testPresets"}.get(words[0], "buildPresets" if "--build" in words else "configurePresets")
-        names = [row["name"] for row in json.loads(read("CMakePresets.json"))[kind]]
-        assert preset in names, f"no {kind} {preset}"
+        kind = "buildPresets" if "--build" in words else "configurePresets"
+        assert preset in names_of(kind), f"no {kind} {preset}"
     if "--target" in words:
         target = words[words.index("--target") + 1]
         assert re.search(rf"\b{target}\b", run("cmake", "--build", BUILD, "--target", "help")), target
 
 
-def by_test_program(command):
-    program, *arguments = command.replace("build/release", BUILD).replace("'", "").split()
-    assert "[  PASSED  ]" in run(program, *arguments)
+def by_suite(command):
+    """A part of a suite that needs no machine is run; of the others the words are looked at."""
+    _, build, suite, *arguments = command.replace("'", "").split()
+    assert os.path.basename(build) in names_of("configurePresets"), build
+    assert suite in suites(), suite
+    if suite in ("unit", "sandbox"):
+        assert " 0 failed" in run("tests/run", BUILD, suite, *arguments).strip().split("\n")[-1]
 
 
 def by_bench(command):
@@ -117,7 +129,7 @@ def by_install(command):
 def by_options(command):
     """A machine is booted for the story and by the appliance suite; the options are those of the help."""
     program, *words = command.split()
-    known = run(program, "--help") if program != "tests/appliance/run-all" else read(program)
+    known = run(program, "--help")
     for word in words:
         assert not word.startswith("--") or word in known, f"{program} knows no {word}"
 
@@ -137,7 +149,7 @@ def by_installed(command):
 
 
 def by_demo(_):
-    assert "appliance/run --disks 4 --timeout 240 appliance/demo.sh" in read("demo")
+    assert "appliance/run --disks 4 appliance/demo.sh" in read("demo")
 
 
 def by_install_test(command):
@@ -157,12 +169,12 @@ def by_being_there(command):
 
 
 RULES = (
-    (r"\./check\b", by_check), (r"\./demo$", by_demo), (r"(cmake|ctest) ", by_preset),
-    (r"build/release/tests/", by_test_program), (r"build/release/bench/", by_bench), (r"bench/", by_gates),
+    (r"\./check\b", by_check), (r"\./demo$", by_demo), (r"cmake ", by_preset),
+    (r"tests/run ", by_suite), (r"build/release/bench/", by_bench), (r"bench/", by_gates),
     (r"DESTDIR=", by_install), (r"mdrequests ", by_installed),
-    (r"appliance/(run|shell)\b|tests/appliance/run-all", by_options), (re.escape(PROMPT), by_story),
+    (r"appliance/(run|shell)\b", by_options), (re.escape(PROMPT), by_story),
     (r"packaging/make-", by_install_test), (r"docs/pictures/make", by_pictures),
-    (r"tests/tree/before-commit|ln -s .*tests/tree/before-commit", by_being_there),
+    (r"tests/style/before-commit|ln -s .*tests/style/before-commit", by_being_there),
 )
 
 
@@ -181,10 +193,10 @@ def case_every_command_of_the_docs_is_run():
 # --- the rest ------------------------------------------------------------------------------------
 
 def case_the_suites_that_are_told_of_exist():
-    table = re.search(r"\| suite \|.*?\n\n", read("CONTRIBUTING.md"), re.S).group(0)
-    told = re.findall(r"^\| ([\w-]+) \|", table, re.M)[1:]
-    known = re.search(r"^suites: (.*)", run("./check", "--help"), re.M).group(1).split()
-    assert len(told) >= 10 and set(told) <= set(known), f"not in ./check: {sorted(set(told) - set(known))}"
+    table = re.search(r"\| suite \|.*?\n\n", read("tests/README.md"), re.S).group(0)
+    told = re.findall(r"[\w-]+", " ".join(re.findall(r"^\| ([\w, -]+) \|", table, re.M)[1:]))
+    verdict.same(told, suites(), "tests/README.md")
+    verdict.same(re.findall(r"^  (\S+)  +", run("./check", "--help"), re.M), [*suites(), "./check"], "./check --help")
 
 
 def case_links_lead_somewhere():
@@ -207,7 +219,7 @@ def case_the_pictures_are_current():
     with tempfile.TemporaryDirectory() as folder:
         run("docs/pictures/make", "--to", folder)
         made = sorted(os.listdir(folder))
-        cases.same(made, ("demo.svg", "layouts.svg", "modules.svg"), "pictures")
+        verdict.same(made, ("demo.svg", "layouts.svg", "modules.svg"), "pictures")
         for name in made:
             current = filecmp.cmp(os.path.join(folder, name), os.path.join(ROOT, "docs/pictures", name), shallow=False)
             assert current, f"docs/pictures/{name} is out of date: run docs/pictures/make"
@@ -245,4 +257,4 @@ if sys.argv[1] == "--appliance-commands":
 BUILD = os.path.abspath(sys.argv[1])
 with open(os.path.join(sys.argv[2], "story"), encoding="utf-8") as story:
     STORY = story.read()
-cases.run(sys.modules[__name__])
+verdict.cases(globals(), "".join(sys.argv[3:4]))

@@ -11,8 +11,8 @@ SOURCE=$SCRATCH/some/other/folder
 DEBS=$SCRATCH/debs
 AMD64=$DEBS/amd64
 VERSION=$(sed -n 's/^project(arrayctl VERSION \([0-9.]*\).*/\1/p' "$ROOT/CMakeLists.txt")
-# shellcheck source=SCRIPTDIR/lib.sh
-. "$ROOT/tests/product/lib.sh"
+# shellcheck source=SCRIPTDIR/../support/verdict/verdict.sh
+. "$ROOT/tests/support/verdict/verdict.sh"
 cd "$ROOT" || exit 1
 
 TOOL_FILES="usr/sbin/arrayctl
@@ -161,22 +161,21 @@ archive_is_reproducible() {
         "$(tar -tf "$SCRATCH/one/arrayctl-$VERSION.tar.gz" | grep -v '/$' | sed 's,^[^/]*/,,' | LC_ALL=C sort)"
 }
 
-is "a copy of the tree" source_copy
-is "packages for amd64 from a read-only source" make_deb amd64
-is "packages for PowerPC from a read-only source" make_deb powerpc
-is "the source is untouched" source_is_untouched
-is "another folder gives the same bytes" bytes_are_those_of_the_tested_build
-is "no path of the build is in the program" no_build_path_in_the_program
-is "packing again gives the same bytes" packing_again_gives_the_same
-is "packages hold what they should" packages_hold_what_they_should
-is "packages depend on what they need" depends_are_right
-is "lintian has nothing to say" lintian_has_nothing_to_say
-is "the PowerPC program is one" powerpc_program_is_one
-is "a package comes and goes without a trace" comes_and_goes_without_a_trace
-is "a plain install leaves the platform out" plain_install_is_without_platform
-is "an install goes where it is told" install_goes_where_it_is_told
-is "the recipes fit the tree" recipes_fit_the_tree
-is "a cross install into a staging tree" cross_install_into_a_staging_tree
-is "one version everywhere" one_version_everywhere
-is "the archive is reproducible" archive_is_reproducible
-summary
+test_is "a copy of the tree" source_copy
+test_is "packages for amd64 from a read-only source" make_deb amd64
+test_is "packages for PowerPC from a read-only source" make_deb powerpc
+test_is "the source is untouched" source_is_untouched
+test_is "another folder gives the same bytes" bytes_are_those_of_the_tested_build
+test_is "no path of the build is in the program" no_build_path_in_the_program
+test_is "packing again gives the same bytes" packing_again_gives_the_same
+test_is "packages hold what they should" packages_hold_what_they_should
+test_is "packages depend on what they need" depends_are_right
+test_is "lintian has nothing to say" lintian_has_nothing_to_say
+test_is "the PowerPC program is one" powerpc_program_is_one
+test_is "a package comes and goes without a trace" comes_and_goes_without_a_trace
+test_is "a plain install leaves the platform out" plain_install_is_without_platform
+test_is "an install goes where it is told" install_goes_where_it_is_told
+test_is "the recipes fit the tree" recipes_fit_the_tree
+test_is "a cross install into a staging tree" cross_install_into_a_staging_tree
+test_is "one version everywhere" one_version_everywhere
+test_is "the archive is reproducible" archive_is_reproducible

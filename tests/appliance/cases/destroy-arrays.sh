@@ -5,7 +5,6 @@
 # disks: 4
 # size: 44M
 # boots: 2
-# timeout: 300
 # shellcheck source=SCRIPTDIR/../lib.sh
 . /appliance/lib.sh
 

@@ -3,7 +3,6 @@
 # Arrays that are in use stay as they are, and arrays that are not there are not found.
 # disks: 4
 # size: 64M
-# timeout: 300
 # shellcheck source=SCRIPTDIR/../lib.sh
 . /appliance/lib.sh
 plan 8

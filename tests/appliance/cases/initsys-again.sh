@@ -4,7 +4,6 @@
 # arrays running, with data on it, with fewer slots, with one disk, and by force.
 # disks: 7
 # size: 4672M
-# timeout: 240
 # shellcheck disable=SC2317  # check must call the functions
 # shellcheck source=SCRIPTDIR/../lib.sh
 . /appliance/lib.sh

@@ -3,7 +3,6 @@
 # Disks with a past: older layouts with and without data, tables of other systems.
 # disks: 10
 # size: 4672M
-# timeout: 240
 # shellcheck disable=SC2317  # check must call the functions
 # shellcheck source=SCRIPTDIR/../lib.sh
 . /appliance/lib.sh

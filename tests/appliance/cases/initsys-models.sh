@@ -4,7 +4,6 @@
 # expansion unit behind two heads.
 # disks: 8
 # size: 4672M
-# timeout: 240
 # shellcheck disable=SC2317  # check must call the functions
 # shellcheck source=SCRIPTDIR/../lib.sh
 . /appliance/lib.sh

@@ -5,7 +5,6 @@
 # had happened.
 # disks: 2
 # size: 4672M
-# timeout: 480
 # shellcheck disable=SC2317  # check must call the functions
 # shellcheck source=SCRIPTDIR/../lib.sh
 . /appliance/lib.sh

@@ -5,7 +5,6 @@
 # disks: 4
 # size: 4672M
 # boots: 2
-# timeout: 240
 # shellcheck disable=SC2317  # check must call the functions
 # shellcheck source=SCRIPTDIR/../lib.sh
 . /appliance/lib.sh

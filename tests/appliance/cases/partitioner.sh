@@ -5,7 +5,6 @@
 # left alone. Read back with sysfs, /proc/partitions, the stock sfdisk, blkid, wipefs and e2fsck.
 # disks: 4
 # size: 6G
-# timeout: 180
 # shellcheck source=SCRIPTDIR/../lib.sh
 . /appliance/lib.sh
 plan 11

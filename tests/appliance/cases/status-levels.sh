@@ -3,7 +3,6 @@
 # Healthy arrays of every level, both superblock formats, large and small; and arrays that are none.
 # disks: 4
 # size: 6G
-# timeout: 120
 # shellcheck source=SCRIPTDIR/../lib.sh
 . /appliance/lib.sh
 plan 17

@@ -3,7 +3,6 @@
 # Members that failed, were taken out, stand by, or are too many to lose.
 # disks: 6
 # size: 1G
-# timeout: 120
 # shellcheck source=SCRIPTDIR/../lib.sh
 . /appliance/lib.sh
 plan 20

@@ -3,7 +3,6 @@
 # Arrays at work: resync, recovery, check, and the same while they wait for one another.
 # disks: 4
 # size: 2G
-# timeout: 120
 # shellcheck source=SCRIPTDIR/../lib.sh
 . /appliance/lib.sh
 plan 12

@@ -1,10 +1,13 @@
 // SPDX-License-Identifier: MIT
 #include "suite.h"
 
+#include "verdict.h"
+
 #include <algorithm>
 #include <cerrno>
 #include <cstdio>
 #include <cstdlib>
+#include <cstring>
 #include <sstream>
 #include <sys/socket.h>
 #include <sys/wait.h>
@@ -13,7 +16,8 @@
 namespace
 {
 
-constexpr size_t WRONG_SHOWN = 5; // of one worker in one test
+constexpr size_t WRONG_SHOWN = 5; // texts of one worker in one test
+constexpr size_t WRONG_SIZE = 32768;
 constexpr size_t REPORT_SIZE = 65536;
 
 using std::string;
@@ -42,29 +46,29 @@ void UsageTell(const std::vector<OPTION> &options)
 
 // ---- workers -----------------------------------------------------------------------------------
 
-// One packet: test, count and number of what was wrong; then a line for every reason.
+// The texts of what was wrong, as many as a report has room for.
+string WrongText(const TALLY &tally)
+{
+    string szText;
+    for (size_t i = 0; i < std::min(tally.wrong.size(), WRONG_SHOWN); i++) {
+        szText += tally.wrong[i];
+    }
+    szText.resize(std::min(szText.size(), WRONG_SIZE));
+    return tally.wrong.empty() ? "" : to_string(tally.wrong.size()) + " wrong\n" + szText;
+}
+
+// One packet: test, count and number of reasons; a line for every reason; what was wrong.
 void TallySend(int fd, size_t test, const TALLY &tally)
 {
-    string szReport =
-        to_string(test) + " " + to_string(tally.done) + " " + to_string(tally.wrong.size()) + "\n";
+    string szReport = to_string(test) + " " + to_string(tally.done) + " " +
+                      to_string(tally.allowed.size()) + "\n";
     for (const auto &[szReason, n] : tally.allowed) {
         szReport += to_string(n) + " " + szReason + "\n";
     }
+    szReport += WrongText(tally);
     if (send(fd, szReport.data(), szReport.size(), 0) < 0) {
         exit(EXIT_FAILURE);
     }
-}
-
-void WrongTell(const TALLY &tally)
-{
-    const size_t nShown = std::min(tally.wrong.size(), WRONG_SHOWN);
-    for (size_t i = 0; i < nShown; i++) {
-        (void)fputs(tally.wrong[i].c_str(), stdout);
-    }
-    if (nShown < tally.wrong.size()) {
-        printf("and %zu more\n", tally.wrong.size() - nShown);
-    }
-    (void)fflush(stdout);
 }
 
 void WorkerStart(const SUITE &suite, size_t worker, const int (&fds)[2])
@@ -74,9 +78,7 @@ void WorkerStart(const SUITE &suite, size_t worker, const int (&fds)[2])
     }
     close(fds[0]);
     for (size_t test = 0; test < suite.names.size(); test++) {
-        const TALLY tally = suite.work(test, worker);
-        WrongTell(tally);
-        TallySend(fds[1], test, tally);
+        TallySend(fds[1], test, suite.work(test, worker));
     }
     exit(EXIT_SUCCESS);
 }
@@ -86,30 +88,26 @@ size_t ReportTake(const string &szReport, std::vector<TEST_TOTAL> &totals)
     std::istringstream lines(szReport);
     size_t test = 0;
     std::uint64_t done = 0;
-    std::uint64_t n = 0;
-    lines >> test >> done >> n;
+    size_t nReason = 0;
+    lines >> test >> done >> nReason;
     TEST_TOTAL &total = totals[test];
     total.reports++;
     total.done += done;
-    total.wrong += n;
     string szReason;
-    while (lines >> n && lines.get() && std::getline(lines, szReason)) {
+    for (std::uint64_t n = 0; nReason > 0 && lines >> n && lines.get(); nReason--) {
+        (void)std::getline(lines, szReason);
         total.allowed[szReason] += n;
     }
+    (void)std::getline(lines >> std::ws, szReason, '\0');
+    total.szWrong += lines ? szReason : "";
     return test;
 }
 
-void TestTell(const SUITE &suite, size_t test, const TEST_TOTAL &total, COUNTS &counts)
+void TestTell(const SUITE &suite, size_t test, const TEST_TOTAL &total)
 {
-    const bool fPassed = total.reports == suite.nWorker && total.wrong == 0;
-    const string &szName = suite.names[test];
-    VerdictTell(counts, fPassed, szName + ": " + to_string(total.done) + " " + suite.szDone);
-    if (total.reports < suite.nWorker) {
-        printf("  a worker broke down\n");
-    }
-    if (!fPassed && *suite.szAgain != '\0') {
-        printf("  again with: %s '%s'\n", suite.szAgain, szName.c_str());
-    }
+    const string szBroken = total.reports < VerdictWorkers() ? "a worker broke down\n" : "";
+    const string szNote = *suite.szDone == '\0' ? "" : to_string(total.done) + " " + suite.szDone;
+    VerdictTell(suite.names[test], szBroken + total.szWrong, szNote);
 }
 
 } // namespace
@@ -124,12 +122,15 @@ bool NumberTake(const char *szText, std::uint64_t &number)
 bool OptionsTake(int argc, char *argv[], const std::vector<OPTION> &options)
 {
     for (int i = 1; i < argc; i++) {
-        const auto option = std::find_if(options.begin(), options.end(), [&](const OPTION &one) {
-            return string(one.szName) == argv[i];
-        });
+        const string szName = strncmp(argv[i], "--", 2) == 0 ? argv[i] : "";
+        const auto option = std::find_if(options.begin(), options.end(),
+                                         [&](const OPTION &one) { return one.szName == szName; });
         if (option != options.end() && option->pTo.index() == 0) {
             *std::get<bool *>(option->pTo) = true;
-        } else if (option == options.end() || i + 1 == argc || !OptionTake(*option, argv[++i])) {
+            continue;
+        }
+        i += szName.empty() ? 0 : 1; // the filter is its own value
+        if (option == options.end() || i >= argc || !OptionTake(*option, argv[i])) {
             UsageTell(options);
             return false;
         }
@@ -137,14 +138,7 @@ bool OptionsTake(int argc, char *argv[], const std::vector<OPTION> &options)
     return true;
 }
 
-void VerdictTell(COUNTS &counts, bool fPassed, const std::string &szName)
-{
-    (fPassed ? counts.passed : counts.failed)++;
-    printf("%s %s\n", fPassed ? "ok" : "FAILED", szName.c_str());
-    (void)fflush(stdout);
-}
-
-std::vector<TEST_TOTAL> SuiteRun(const SUITE &suite, COUNTS &counts)
+std::vector<TEST_TOTAL> SuiteRun(const SUITE &suite)
 {
     int fds[2] = {-1, -1};
     if (socketpair(AF_UNIX, SOCK_SEQPACKET, 0, fds) != 0) {
@@ -152,7 +146,7 @@ std::vector<TEST_TOTAL> SuiteRun(const SUITE &suite, COUNTS &counts)
         exit(EXIT_FAILURE);
     }
     (void)fflush(nullptr);
-    for (size_t worker = 0; worker < suite.nWorker; worker++) {
+    for (size_t worker = 0; worker < VerdictWorkers(); worker++) {
         WorkerStart(suite, worker, fds);
     }
     close(fds[1]);
@@ -160,24 +154,17 @@ std::vector<TEST_TOTAL> SuiteRun(const SUITE &suite, COUNTS &counts)
     string szReport(REPORT_SIZE, '\0');
     for (ssize_t cb = 0; (cb = recv(fds[0], szReport.data(), szReport.size(), 0)) > 0;) {
         const size_t test = ReportTake(szReport.substr(0, static_cast<size_t>(cb)), totals);
-        if (totals[test].reports == suite.nWorker) {
-            TestTell(suite, test, totals[test], counts);
+        if (totals[test].reports == VerdictWorkers()) {
+            TestTell(suite, test, totals[test]);
         }
     }
     close(fds[0]);
     while (wait(nullptr) > 0) {
     }
     for (size_t test = 0; test < totals.size(); test++) {
-        if (totals[test].reports < suite.nWorker) {
-            TestTell(suite, test, totals[test], counts);
+        if (totals[test].reports < VerdictWorkers()) {
+            TestTell(suite, test, totals[test]);
         }
     }
     return totals;
-}
-
-int CountsTell(const COUNTS &counts)
-{
-    printf("%llu passed, %llu failed\n", static_cast<unsigned long long>(counts.passed),
-           static_cast<unsigned long long>(counts.failed));
-    return counts.failed == 0 && counts.passed > 0 ? EXIT_SUCCESS : EXIT_FAILURE;
 }

@@ -12,7 +12,8 @@
 #include <variant>
 #include <vector>
 
-// An option of the command line: a switch, a number of 1 or more, or a text.
+// An option of the command line: a switch, a number of 1 or more, or a text. That without a name is
+// the word that no option takes, the filter.
 struct OPTION {
     const char *szName;
     std::variant<bool *, std::uint64_t *, std::string *> pTo;
@@ -34,29 +35,16 @@ struct TALLY {
 
 struct SUITE {
     std::vector<std::string> names = {};
-    const char *szDone;  // what is counted in each test
-    const char *szAgain; // the command that runs one test again, without its name; may be empty
-    std::uint64_t nWorker;
+    const char *szDone; // what is counted in each test; may be empty
     std::function<TALLY(size_t test, size_t worker)> work;
 };
 
-struct COUNTS {
-    std::uint64_t passed = 0;
-    std::uint64_t failed = 0;
-};
-
-// "ok NAME" or "FAILED NAME".
-void VerdictTell(COUNTS &counts, bool fPassed, const std::string &szName);
-
-// Every worker does its share of every test, in a process of its own. Tells of each test as soon as
-// all have done theirs, and returns what was counted; of what was wrong only how often it was.
+// Every worker, one for each processor, does its share of every test, in a process of its own.
+// Tells of each test as soon as all have done theirs, and returns what was counted.
 struct TEST_TOTAL {
     std::uint64_t reports = 0; // workers that have told of it
     std::uint64_t done = 0;
-    std::uint64_t wrong = 0;
     std::map<std::string, std::uint64_t> allowed = {};
+    std::string szWrong = {};
 };
-std::vector<TEST_TOTAL> SuiteRun(const SUITE &suite, COUNTS &counts);
-
-// The last line, and the exit status.
-int CountsTell(const COUNTS &counts);
+std::vector<TEST_TOTAL> SuiteRun(const SUITE &suite);
