@@ -26,12 +26,8 @@ MACHINE DisklessMake()
 void ExpectRefused(const std::vector<std::string> &arguments, const std::string &szOut)
 {
     SCOPED_TRACE(testing::PrintToString(arguments));
-    const RUN_RESULT result = MachineRun(DisklessMake(), arguments);
-    EXPECT_EQ(result.szOut, szOut);
-    EXPECT_EQ(result.szErr, "");
-    EXPECT_EQ(result.status, 1);
-    EXPECT_EQ(LogText(result), "");
-    EXPECT_EQ(TranscriptText(result), "");
+    const RUN_RESULT result = RunEnds(DisklessMake(), arguments, 1, szOut);
+    EXPECT_EQ(OrderText(result), "");
 }
 
 } // namespace
@@ -129,10 +125,8 @@ TEST(CommandLine, StatusMakesThePathFromTheLeadingNumber)
 {
     for (const RAID_ID_CASE &id : RAID_IDS) {
         SCOPED_TRACE(id.szArgument);
-        const RUN_RESULT result = MachineRun(MachineMake(), {"status", id.szArgument});
-        EXPECT_EQ(result.szOut, std::string("RAID ") + id.szPath + " is not found\n");
-        EXPECT_EQ(result.szErr, "");
-        EXPECT_EQ(result.status, 1);
+        const RUN_RESULT result = RunEnds(MachineMake(), {"status", id.szArgument}, 1,
+                                          std::string("RAID ") + id.szPath + " is not found\n");
         EXPECT_EQ(LogText(result), std::string("<15>raid_info.cpp:# Failed to open ") + id.szPath +
                                        ", errno=No such file or directory\n");
     }
@@ -144,10 +138,8 @@ TEST(CommandLine, DestroyMakesThePathFromTheLeadingNumber)
         SCOPED_TRACE(id.szArgument);
         MACHINE machine = MachineMake();
         MachineTool(machine, PVS);
-        const RUN_RESULT result = MachineRun(machine, {"destroy", id.szArgument});
-        EXPECT_EQ(result.szOut, std::string("Not found ") + id.szPath + " \n");
-        EXPECT_EQ(result.szErr, "");
-        EXPECT_EQ(result.status, 0);
+        RunEnds(machine, {"destroy", id.szArgument}, 0,
+                std::string("Not found ") + id.szPath + " \n");
     }
 }
 
@@ -161,17 +153,14 @@ TEST(CommandLine, StatusIgnoresWhatFollowsTheId)
     for (const std::vector<std::string> &arguments :
          {std::vector<std::string>{"status", "2", "extra"},
           std::vector<std::string>{"status", "2", "5", "7", "status"}}) {
-        const RUN_RESULT result = MachineRun(machine, arguments);
-        EXPECT_EQ(result.szOut, plain.szOut);
-        EXPECT_EQ(result.status, 0);
+        RunEnds(machine, arguments, 0, plain.szOut);
     }
 }
 
 TEST(CommandLine, NewvolAloneIsTaken)
 {
-    const RUN_RESULT result = MachineRun(DisklessMake(), {"newvol"});
-    EXPECT_EQ(result.szOut, "No disk to create RAID... \n");
-    EXPECT_EQ(result.status, 1);
+    const RUN_RESULT result =
+        RunEnds(DisklessMake(), {"newvol"}, 1, "No disk to create RAID... \n");
     EXPECT_EQ(TranscriptText(result), "");
 }
 
@@ -180,9 +169,7 @@ TEST(CommandLine, InitsysIgnoresWhatFollows)
     for (const std::vector<std::string> &arguments :
          {std::vector<std::string>{"initsys"}, std::vector<std::string>{"initsys", "anything"},
           std::vector<std::string>{"initsys", "2", "3"}}) {
-        const RUN_RESULT result = MachineRun(DisklessMake(), arguments);
-        EXPECT_EQ(result.szOut, "");
-        EXPECT_EQ(result.status, 1);
+        const RUN_RESULT result = RunEnds(DisklessMake(), arguments, 1, "");
         EXPECT_EQ(LogText(result), "<11>arrayctl.cpp:# No disk to create system and swap "
                                    "partition, initsys fail!\n");
         EXPECT_EQ(TranscriptText(result), "");
@@ -196,9 +183,7 @@ TEST(CommandLine, InitsysDdIgnoresWhatFollowsAndDuplicates)
           std::vector<std::string>{"initsys-dd", "anything"}}) {
         MACHINE machine = DisklessMake();
         MachineTool(machine, "/bin/nurodd");
-        const RUN_RESULT result = MachineRun(machine, arguments);
-        EXPECT_EQ(result.szOut, "");
-        EXPECT_EQ(result.status, 1);
+        const RUN_RESULT result = RunEnds(machine, arguments, 1, "");
         EXPECT_EQ(TranscriptText(result), "/bin/nurodd\n");
     }
 }
@@ -210,11 +195,8 @@ TEST(CommandLine, TheEnumerationsAreTakenThoughNotAdvertised)
           std::vector<std::string>{"enumformatalldisks", "anything"},
           std::vector<std::string>{"enumformatalldisks_indualhead_install"},
           std::vector<std::string>{"enumformatalldisks_indualhead_install", "2", "3"}}) {
-        const RUN_RESULT result = MachineRun(DisklessMake(), arguments);
-        EXPECT_EQ(result.szOut, "");
-        EXPECT_EQ(result.status, 0);
-        EXPECT_EQ(LogText(result), "");
-        EXPECT_EQ(TranscriptText(result), "");
+        const RUN_RESULT result = RunEnds(DisklessMake(), arguments, 0, "");
+        EXPECT_EQ(OrderText(result), "");
     }
 }
 
@@ -226,9 +208,7 @@ TEST(CommandLine, TheTwoEnumerationsDifferOnlyOnADualHeadMachine)
     MachineTool(machine, "/sbin/mdadm ...", {.nTimes = ANY_TIMES});
     for (const char *const szWord :
          {"enumformatalldisks", "enumformatalldisks_indualhead_install"}) {
-        const RUN_RESULT result = MachineRun(machine, {szWord});
-        EXPECT_EQ(result.szOut, "1 ");
-        EXPECT_EQ(result.status, 1);
+        RunEnds(machine, {szWord}, 1, "1 ");
     }
 }
 

@@ -54,10 +54,7 @@ MACHINE MirrorToDestroy()
 
 void DestroyTells(const MACHINE &machine)
 {
-    const RUN_RESULT result = MachineRun(machine, {"destroy", "2"});
-    EXPECT_EQ(result.status, 0);
-    EXPECT_EQ(result.szOut, "");
-    EXPECT_EQ(result.szErr, "");
+    RunEnds(machine, {"destroy", "2"}, 0, "");
 }
 
 std::string CreateCommand(int nMd)
@@ -82,10 +79,7 @@ MACHINE DisksToInit()
 
 void InitsysTells(const MACHINE &machine)
 {
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 0);
-    EXPECT_EQ(result.szOut, "");
-    EXPECT_EQ(result.szErr, "");
+    RunEnds(machine, {"initsys"}, 0, "");
 }
 
 // Whatever of its commands a run gets to, in any number; none but these may run.
@@ -117,8 +111,7 @@ TEST(HostileStreams, AReportWithoutStandardOutputIsStillARun)
 {
     MACHINE machine = MachineWithMirror();
     machine.prepare = [] { (void)close(STDOUT_FILENO); };
-    const RUN_RESULT result = MachineRun(machine, {"status", "2"});
-    EXPECT_EQ(result.status, 0);
+    const RUN_RESULT result = RunEnds(machine, {"status", "2"}, 0);
     EXPECT_EQ(result.szOut + result.szErr, "");
 }
 
@@ -129,17 +122,14 @@ TEST(HostileStreams, AReportNeedsNoStandardInputOrError)
         (void)close(STDIN_FILENO);
         (void)close(STDERR_FILENO);
     };
-    const RUN_RESULT result = MachineRun(machine, {"status", "2"});
-    EXPECT_EQ(result.status, 0);
-    EXPECT_EQ(result.szOut, REPORT);
+    RunEnds(machine, {"status", "2"}, 0, REPORT);
 }
 
 TEST(HostileStreams, AMissingArrayWithoutStandardOutputIsNotFound)
 {
     MACHINE machine = MachineMake();
     machine.prepare = [] { (void)close(STDOUT_FILENO); };
-    const RUN_RESULT result = MachineRun(machine, {"status", "7"});
-    EXPECT_EQ(result.status, 1);
+    const RUN_RESULT result = RunEnds(machine, {"status", "7"}, 1);
     EXPECT_EQ(result.szOut + result.szErr, "");
     // The log's socket has not become the standard output.
     EXPECT_EQ(LogText(result), "<15>raid_info.cpp:# Failed to open /dev/md7, errno=No such file or "
@@ -186,9 +176,7 @@ TEST(HostileStreams, AReaderThatIsGoneDoesNotChangeTheStatus)
         (void)close(fds[1]);
         (void)signal(SIGPIPE, SIG_IGN);
     };
-    const RUN_RESULT result = MachineRun(machine, {"status", "2"});
-    EXPECT_EQ(result.status, 0);
-    EXPECT_EQ(result.szErr, "");
+    RunEnds(machine, {"status", "2"}, 0);
 }
 
 // ---- limits ------------------------------------------------------------------------------------
@@ -231,9 +219,7 @@ TEST(HostileLimits, WithOneDescriptorTooFewAnArrayIsNotFound)
 {
     MACHINE machine = MachineWithMirror();
     machine.faults = {{.szFunction = "open", .error = EMFILE, .fGoOn = true}};
-    const RUN_RESULT result = MachineRun(machine, {"status", "2"});
-    EXPECT_EQ(result.status, 1);
-    EXPECT_EQ(result.szOut, "RAID /dev/md2 is not found\n");
+    RunEnds(machine, {"status", "2"}, 1, "RAID /dev/md2 is not found\n");
 }
 
 // A sanitizer needs terabytes of addresses.
@@ -264,9 +250,7 @@ TEST(HostileLimits, WithoutProcessesDestroyCannotStopTheArray)
 {
     MACHINE machine = MachineWithMirror();
     machine.faults = {{.szFunction = "fork", .error = EAGAIN, .fGoOn = true}};
-    const RUN_RESULT result = MachineRun(machine, {"destroy", "2"});
-    EXPECT_EQ(result.status, 0);
-    EXPECT_EQ(result.szOut, "");
+    const RUN_RESULT result = RunEnds(machine, {"destroy", "2"}, 0, "");
     EXPECT_NE(LogText(result).find("Reach RAID stop retry limit\n"), std::string::npos);
 }
 
@@ -275,8 +259,7 @@ TEST(HostileLimits, WithoutProcessesInitsysChangesNothing)
     MACHINE machine = MachineWithConf(CONF_RAID);
     MachineDiskAdd(machine, "sda");
     machine.faults = {{.szFunction = "fork", .error = EAGAIN, .fGoOn = true}};
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 1);
+    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 1);
     EXPECT_NE(LogText(result).find("<11>arrayctl.cpp:# Failed to fork.\n"), std::string::npos);
 }
 
@@ -295,8 +278,7 @@ TEST(HostileSignals, DisksWhoseChildrenCannotBeWaitedForAreLeftAlone)
     BlankDiskAdd(machine, "sda");
     BlankDiskAdd(machine, "sdb");
     machine.prepare = [] { (void)signal(SIGCHLD, SIG_IGN); };
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 1);
+    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 1);
     EXPECT_EQ(LogOf(result, "arrayctl.cpp"),
               "<11>arrayctl.cpp:# Wait pid failed. pid: # disk: sda\n"
               "<11>arrayctl.cpp:# Wait pid failed. pid: # disk: sdb\n"
@@ -315,9 +297,7 @@ TEST(HostileSignals, AVolumeWhoseShellCannotBeWaitedForIsAFailure)
                           "-F", "/dev/sda"});
     MachineTool(machine, "/sbin/mdadm -C /dev/md2 -amd -R -l1 -f -n1 /dev/sda3");
     machine.prepare = [] { (void)signal(SIGCHLD, SIG_IGN); };
-    const RUN_RESULT result = MachineRun(machine, {"newvol"});
-    EXPECT_EQ(result.status, 1);
-    EXPECT_EQ(result.szOut, "Creating RAID 1 volume... \n");
+    const RUN_RESULT result = RunEnds(machine, {"newvol"}, 1, "Creating RAID 1 volume... \n");
     EXPECT_EQ(LogErrors(result),
               "<11>arrayctl.cpp:# Failed to create RAID '/dev/md2' on '/dev/sda3 ', errno=255\n");
 }
@@ -360,9 +340,7 @@ TEST(HostileUmask, FilesAreMadeWhateverItHides)
     for (const mode_t mask : {0777U, 0U}) {
         MACHINE machine = MachineWithConf(CONF_RAID);
         machine.prepare = [mask] { (void)umask(mask); };
-        const RUN_RESULT result = MachineRun(machine, {"newvol"});
-        EXPECT_EQ(result.status, 1);
-        EXPECT_EQ(result.szOut, "No disk to create RAID... \n");
+        RunEnds(machine, {"newvol"}, 1, "No disk to create RAID... \n");
         EXPECT_EQ(MachineFileRead("/tmp/.not.dualhead"), "");
     }
 }
@@ -438,8 +416,7 @@ TEST(HostileNames, MembersAreToldAsTheyAre)
     for (const std::string &szName : NAMES) {
         MACHINE machine = MachineMake();
         MachineMdAdd(machine, {.nMd = 2, .members = {{szName}}});
-        const RUN_RESULT result = MachineRun(machine, {"status", "2"});
-        EXPECT_EQ(result.status, 0);
+        const RUN_RESULT result = RunEnds(machine, {"status", "2"}, 0);
         EXPECT_NE(result.szOut.find("\t [/dev/" + szName + ": Normal]\n\n"), std::string::npos)
             << result.szOut;
     }
@@ -449,8 +426,7 @@ TEST(HostileNames, ALongMemberIsCut)
 {
     MACHINE machine = MachineMake();
     MachineMdAdd(machine, {.nMd = 2, .members = {{"sd" + std::string(240, 'a')}}});
-    const RUN_RESULT result = MachineRun(machine, {"status", "2"});
-    EXPECT_EQ(result.status, 0);
+    const RUN_RESULT result = RunEnds(machine, {"status", "2"}, 0);
     EXPECT_NE(result.szOut.find("\t [/dev/sd" + std::string(120, 'a') + ": Normal]\n"),
               std::string::npos);
 }
@@ -506,8 +482,7 @@ TEST(HostileNames, TheShellReadsWhatIsInADisksName)
         MachineTool(machine, std::string("/sbin/mdadm -C ") + szMd +
                                  " -e 0.9 -amd -R -l1 -f -n4 /dev/sda missing missing missing");
     }
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 0);
+    RunEnds(machine, {"initsys"}, 0);
     EXPECT_EQ(MachineFileRead("/made1"), "");
     EXPECT_EQ(MachineFileRead("/made2"), "");
 }
@@ -523,8 +498,7 @@ TEST(HostileAttributes, LongOnesAreReadUpToTheirLimit)
                            .members = {{"sda3", "spare" + szLong, "none" + szLong}},
                            .szSyncAction = szLong,
                            .szComponentSize = szLong});
-    const RUN_RESULT result = MachineRun(machine, {"status", "2"});
-    EXPECT_EQ(result.status, 0);
+    const RUN_RESULT result = RunEnds(machine, {"status", "2"}, 0);
     EXPECT_NE(result.szOut.find("\t [/dev/sda3: Spare Disk]\n"), std::string::npos);
 }
 
@@ -532,8 +506,7 @@ TEST(HostileAttributes, EmptyOnesLeaveTheMemberOut)
 {
     MACHINE machine = MachineMake();
     MachineMdAdd(machine, {.nMd = 2, .members = {{"sda3", ""}, {"sdb3", "in_sync\n", ""}}});
-    const RUN_RESULT result = MachineRun(machine, {"status", "2"});
-    EXPECT_EQ(result.status, 0);
+    const RUN_RESULT result = RunEnds(machine, {"status", "2"}, 0);
     EXPECT_NE(result.szOut.find("Disk: \n\n"), std::string::npos);
 }
 
@@ -564,18 +537,14 @@ constexpr char NO_MASKS[] = "<11>disk_port.cpp:# Get usbportcfg key from "
 void NothingIsKnown(MACHINE machine)
 {
     MachineDiskAdd(machine, "sda");
-    const RUN_RESULT result = MachineRun(machine, {"enumformatalldisks"});
-    EXPECT_EQ(result.status, 0);
-    EXPECT_EQ(result.szOut, "");
+    const RUN_RESULT result = RunEnds(machine, {"enumformatalldisks"}, 0, "");
     EXPECT_NE(LogText(result).find(NO_MASKS), std::string::npos);
 }
 
 void OneDiskIsKnown(MACHINE machine)
 {
     BlankDiskAdd(machine, "sda");
-    const RUN_RESULT result = MachineRun(machine, {"enumformatalldisks"});
-    EXPECT_EQ(result.status, 1);
-    EXPECT_EQ(result.szOut, "1 ");
+    RunEnds(machine, {"enumformatalldisks"}, 1, "1 ");
 }
 
 } // namespace
@@ -671,8 +640,7 @@ TEST(HostileDisks, AFullLogChangesNothingOfARemoval)
     MachineTool(machine, STOP_MD2, {.szErr = "mdadm: stopped /dev/md2\n"});
     WipesExpect(machine);
     machine.prepare = [] { FullMount("/var/log"); };
-    const RUN_RESULT result = MachineRun(machine, {"destroy", "2"});
-    EXPECT_EQ(result.status, 0);
+    const RUN_RESULT result = RunEnds(machine, {"destroy", "2"}, 0);
     EXPECT_NE(
         LogText(result).find("<11>space.cpp:# Fail to open /var/log/space_operation_error.log\n"),
         std::string::npos);
@@ -702,12 +670,9 @@ TEST(HostileDisks, WithoutSysAnArrayHasNoMembersAndAMachineNoDisks)
     MACHINE machine = MachineWithMirror();
     MachineConf(machine, CONF_RAID);
     MachineRemove(machine, "/sys");
-    const RUN_RESULT status = MachineRun(machine, {"status", "2"});
-    EXPECT_EQ(status.status, 0);
+    const RUN_RESULT status = RunEnds(machine, {"status", "2"}, 0);
     EXPECT_NE(status.szOut.find("Disk: \n\n"), std::string::npos);
-    const RUN_RESULT enumerated = MachineRun(machine, {"enumformatalldisks"});
-    EXPECT_EQ(enumerated.status, 0);
-    EXPECT_EQ(enumerated.szOut, "");
+    RunEnds(machine, {"enumformatalldisks"}, 0, "");
 }
 
 TEST(HostileDisks, WithoutProcAnArrayIsStoppedAndNothingWiped)
@@ -717,8 +682,7 @@ TEST(HostileDisks, WithoutProcAnArrayIsStoppedAndNothingWiped)
     MachineTool(machine, PVS);
     MachineTool(machine, STOP_MD2);
     StepsExpect(machine, {Examined("sdb3", UUID_MD2)});
-    const RUN_RESULT result = MachineRun(machine, {"destroy", "2"});
-    EXPECT_EQ(result.status, 0);
+    const RUN_RESULT result = RunEnds(machine, {"destroy", "2"}, 0);
     EXPECT_NE(LogText(result).find("<11>raid_remove.cpp:# Fail to enum partition path\n"),
               std::string::npos);
 }
@@ -728,9 +692,8 @@ TEST(HostileDisks, WithoutProcLvmIsSaidToBeFoundAndLeftAlone)
     MACHINE machine = MachineMake();
     MachineRemove(machine, "/proc");
     MachineTool(machine, PVS, {.szOut = "  /dev/md2:vg1:lv1:\n"});
-    const RUN_RESULT result = MachineRun(machine, {"destroy", "2"});
-    EXPECT_EQ(result.status, 0);
-    EXPECT_EQ(result.szOut, "Found LVM on /dev/md2, remove it \nNot found /dev/md2 \n");
+    const RUN_RESULT result = RunEnds(machine, {"destroy", "2"}, 0,
+                                      "Found LVM on /dev/md2, remove it \nNot found /dev/md2 \n");
     EXPECT_EQ(LogErrors(result), "<11>lvm.cpp:# Failed to open /proc/mounts\n");
 }
 
@@ -801,8 +764,7 @@ TEST(HostileTools, AGrandchildThatHoldsTheStreamIsWaitedFor)
     MachineTool(machine, STOP_MD2, {.msGrandchild = MS_HELD});
     WipesExpect(machine);
     machine.fMayLeaveChildren = true;
-    const RUN_RESULT result = MachineRun(machine, {"destroy", "2"});
-    EXPECT_EQ(result.status, 0);
+    const RUN_RESULT result = RunEnds(machine, {"destroy", "2"}, 0);
     EXPECT_GE(result.seconds, MS_HELD / 1000.0);
 }
 
@@ -816,9 +778,7 @@ TEST(HostileTools, AListingThatGoesOnForeverIsNotReadToItsEnd)
                     {.cbFlood = 1UL << 20U, .msGrandchild = 300});
     }
     machine.fMayLeaveChildren = true;
-    const RUN_RESULT result = MachineRun(machine, {"enumformatalldisks"});
-    EXPECT_EQ(result.szOut, "1 ");
-    EXPECT_EQ(result.status, 1);
+    RunEnds(machine, {"enumformatalldisks"}, 1, "1 ");
 }
 
 TEST(HostileTools, AShellThatIsMissingOrAFolderMakesNoArray)
@@ -828,8 +788,7 @@ TEST(HostileTools, AShellThatIsMissingOrAFolderMakesNoArray)
         machine.rows.pop_back();
         machine.rows.pop_back();
         machine.tools["/bin/sh"] = kind;
-        const RUN_RESULT result = MachineRun(machine, {"initsys"});
-        EXPECT_EQ(result.status, 0);
+        const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0);
         EXPECT_NE(LogErrors(result).find("Failed to create RAID '/dev/md0' on"), std::string::npos);
         EXPECT_NE(LogErrors(result).find("Failed to create RAID '/dev/md1' on"), std::string::npos);
     }

@@ -112,10 +112,7 @@ TEST(Initsys, MakesFourBlankDisksTheSystem)
     CommandsExpect(machine, arrays);
     ShellWatch(machine);
 
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 0);
-    EXPECT_EQ(result.szOut, "");
-    EXPECT_EQ(result.szErr, "");
+    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0, "");
     for (const std::string &szDisk : ABCD) {
         EXPECT_EQ(CommandsOn(result, szDisk), DecideAndRenewText(szDisk, RANGE_ALL));
     }
@@ -136,8 +133,7 @@ TEST(Initsys, FillsTheSlotsWithMissing)
     BlankDiskWipe(machine, "sdb");
     ArraysExpect(machine, {"sda", "sdb"});
     ShellWatch(machine);
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 0);
+    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0);
     EXPECT_EQ(ShellText(), "/sbin/mdadm -C /dev/md0 -e 0.9 -amd -R -l1  -n4 /dev/sda1 /dev/sdb1   "
                            "missing missing> /dev/null 2>&1\n"
                            "/sbin/mdadm -C /dev/md1 -e 0.9 -amd -R -l1  -n4 /dev/sda2 /dev/sdb2   "
@@ -151,8 +147,7 @@ TEST(Initsys, ForcesArraysOfOneDisk)
     BlankDiskWipe(machine, "sdc");
     ArraysExpect(machine, {"sdc"});
     ShellWatch(machine);
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 0);
+    RunEnds(machine, {"initsys"}, 0);
     EXPECT_EQ(ShellText(), "/sbin/mdadm -C /dev/md0 -e 0.9 -amd -R -l1 -f -n4 /dev/sdc1   "
                            "missing missing missing> /dev/null 2>&1\n"
                            "/sbin/mdadm -C /dev/md1 -e 0.9 -amd -R -l1 -f -n4 /dev/sdc2   "
@@ -167,7 +162,7 @@ TEST(Initsys, LeavesOtherPortsAlone)
         MachineDiskAdd(machine, szOther); // USB, eSATA, none, card, boot
     }
     ArraysExpect(machine, {"sda"});
-    EXPECT_EQ(MachineRun(machine, {"initsys"}).status, 0);
+    RunEnds(machine, {"initsys"}, 0);
 }
 
 TEST(Initsys, IgnoresFurtherArguments)
@@ -175,17 +170,13 @@ TEST(Initsys, IgnoresFurtherArguments)
     MACHINE machine = MachineWithConf(CONF_RAID);
     BlankDiskWipe(machine, "sda");
     ArraysExpect(machine, {"sda"});
-    const RUN_RESULT result = MachineRun(machine, {"initsys", "anything", "else"});
-    EXPECT_EQ(result.status, 0);
-    EXPECT_EQ(result.szOut, "");
+    RunEnds(machine, {"initsys", "anything", "else"}, 0, "");
 }
 
 TEST(Initsys, FailsWithoutADisk)
 {
     const MACHINE machine = MachineWithConf(CONF_RAID);
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 1);
-    EXPECT_EQ(result.szOut, "");
+    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 1, "");
     EXPECT_EQ(LogText(result), NO_DISK);
     EXPECT_EQ(TranscriptText(result), "");
 }
@@ -207,8 +198,7 @@ TEST(InitsysSlots, AreWonByTheFirstDisks)
     MachineTool(machine, "/sbin/mdadm --zero-superblock /dev/sdc2");
     const std::vector<std::string> arrays = ArrayCommands({"sda", "sdb"}, 2);
     CommandsExpect(machine, arrays);
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 0);
+    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0);
     EXPECT_EQ(CommandsOn(result, "sdc"), DecideAndRenewText("sdc", RANGE_ALL) +
                                              "/sbin/mdadm --zero-superblock /dev/sdc1\n"
                                              "/sbin/mdadm --zero-superblock /dev/sdc2\n");
@@ -225,7 +215,7 @@ TEST(InitsysSlots, AreOneForOneForcedDisk)
     MachineTool(machine, "/sbin/mdadm --zero-superblock /dev/sdb1", {.status = 1});
     MachineTool(machine, "/sbin/mdadm --zero-superblock /dev/sdb2", {.status = 1});
     ArraysExpect(machine, {"sda"}, 1);
-    EXPECT_EQ(MachineRun(machine, {"initsys"}).status, 0);
+    RunEnds(machine, {"initsys"}, 0);
 }
 
 TEST(InitsysSlots, OfNoneTakeNoDisk)
@@ -239,8 +229,7 @@ TEST(InitsysSlots, OfNoneTakeNoDisk)
         BlankDiskWipe(machine, "sda");
         MachineTool(machine, "/sbin/mdadm --zero-superblock /dev/sda1");
         MachineTool(machine, "/sbin/mdadm --zero-superblock /dev/sda2");
-        const RUN_RESULT result = MachineRun(machine, {"initsys"});
-        EXPECT_EQ(result.status, 1);
+        const RUN_RESULT result = RunEnds(machine, {"initsys"}, 1);
         EXPECT_EQ(CommandsOn(result, "sda"), DecideAndRenewText("sda", RANGE_ALL) +
                                                  "/sbin/mdadm --zero-superblock /dev/sda1\n"
                                                  "/sbin/mdadm --zero-superblock /dev/sda2\n");
@@ -256,7 +245,7 @@ TEST(InitsysSlots, PreferTheirOwnKey)
     BlankDiskWipe(machine, "sda");
     BlankDiskWipe(machine, "sdb");
     ArraysExpect(machine, {"sda", "sdb"}, 3);
-    EXPECT_EQ(MachineRun(machine, {"initsys"}).status, 0);
+    RunEnds(machine, {"initsys"}, 0);
 }
 
 // 31 words of eight characters and seven of the next: 255.
@@ -272,7 +261,7 @@ TEST(InitsysSlots, AreCutWhereTheTextOfMissingEnds)
     ASSERT_EQ(szMissing.size(), 255U);
     MachineTool(machine, "/sbin/mdadm -C ...", {.nTimes = 2});
     ShellWatch(machine);
-    EXPECT_EQ(MachineRun(machine, {"initsys"}).status, 0);
+    RunEnds(machine, {"initsys"}, 0);
     EXPECT_EQ(ShellText(), "/sbin/mdadm -C /dev/md0 -e 0.9 -amd -R -l1 -f -n40 /dev/sda1  " +
                                szMissing + "> /dev/null 2>&1\n" +
                                "/sbin/mdadm -C /dev/md1 -e 0.9 -amd -R -l1 -f -n40 /dev/sda2  " +
@@ -288,8 +277,7 @@ TEST(InitsysSlots, AreCountedBeforeTheLayoutIsChosen)
     RenewExpect(machine, "sda", RANGE_ALL, MADE_NO_RAID);
     MachineTool(machine, "/sbin/mdadm --zero-superblock /dev/sda1");
     MachineTool(machine, "/sbin/mdadm --zero-superblock /dev/sda2");
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 1);
+    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 1);
     EXPECT_EQ(
         LogErrors(result),
         "<11>conf.cpp:# Failed to NLIBCFileGetKeyValue(/etc.defaults/nuroinfo.conf,maxdisks)\n"
@@ -305,8 +293,7 @@ TEST(InitsysDecides, ToKeepTheDataOfADiskOfTheWantedLayout)
     KnownDiskRenew(machine, "sda", PLACES_8, RANGE_SYSTEM);
     SuperblockExpect(machine, "sda3", 2); // for the wanted layout; the disk itself is not asked
     ArraysExpect(machine, {"sda"});
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 0);
+    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0);
     EXPECT_EQ(CommandsOn(result, "sda"),
               "/sbin/mdadm -E /dev/sda3\n" + DecideAndRenewText("sda", RANGE_SYSTEM));
     EXPECT_EQ(LogErrors(result),
@@ -321,8 +308,7 @@ TEST(InitsysDecides, ToUpgradeSevenToEightWithItsData)
     NoSuperblockExpect(machine, "sda3");
     NoSuperblockExpect(machine, "sda5");
     ArraysExpect(machine, {"sda"});
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 0);
+    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0);
     EXPECT_EQ(CommandsOn(result, "sda"), "/sbin/mdadm -E /dev/sda3\n/sbin/mdadm -E /dev/sda5\n" +
                                              DecideAndRenewText("sda", RANGE_SYSTEM));
 }
@@ -342,7 +328,7 @@ TEST(InitsysDecides, ToStayWithTheLayoutOfTheData)
         BlankDiskAdd(machine, "sdb");
         RenewExpect(machine, "sdb", RANGE_ALL, row.made);
         ArraysExpect(machine, {"sda", "sdb"});
-        EXPECT_EQ(MachineRun(machine, {"initsys"}).status, 0);
+        RunEnds(machine, {"initsys"}, 0);
     }
 }
 
@@ -353,8 +339,7 @@ TEST(InitsysDecides, ToWipeAnOlderLayoutWithoutArray)
     NoSuperblockExpect(machine, "sda3", 2); // for the wanted layout, and to decide
     NoSuperblockExpect(machine, "sda5", 2);
     ArraysExpect(machine, {"sda"});
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 0);
+    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0);
     const std::string szAsked = "/sbin/mdadm -E /dev/sda3\n/sbin/mdadm -E /dev/sda5\n";
     EXPECT_EQ(CommandsOn(result, "sda"),
               szAsked + DecideText("sda") + szAsked + Lines(RenewCommands("sda", RANGE_ALL)));
@@ -368,8 +353,7 @@ TEST(InitsysDecides, ToSkipAnOlderLayoutWithArray)
     DecidedDiskAdd(machine, "sdb", PLACES_6);
     SuperblockExpect(machine, "sdb3", 2, 2);
     ArraysExpect(machine, {"sda"});
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 0);
+    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0);
     EXPECT_EQ(CommandsOn(result, "sdb"),
               "/sbin/mdadm -E /dev/sdb3\n" + DecideText("sdb") + "/sbin/mdadm -E /dev/sdb3\n");
     EXPECT_EQ(LogErrors(result),
@@ -384,7 +368,7 @@ TEST(InitsysDecides, ToWipeAnOlderLayoutWhoseSuperblockNamesNoArray)
     MachineTool(machine, "/sbin/mdadm -E /dev/sda3", {.szOut = "Version : 1.2\n", .nTimes = 2});
     NoSuperblockExpect(machine, "sda5", 2);
     ArraysExpect(machine, {"sda"});
-    EXPECT_EQ(MachineRun(machine, {"initsys"}).status, 0);
+    RunEnds(machine, {"initsys"}, 0);
 }
 
 // A newer layout than the wanted one is another layout like any.
@@ -397,7 +381,7 @@ TEST(InitsysDecides, ToWipeEightWhereSevenIsWanted)
     NoSuperblockExpect(machine, "sdb3");
     NoSuperblockExpect(machine, "sdb5");
     ArraysExpect(machine, {"sda", "sdb"});
-    EXPECT_EQ(MachineRun(machine, {"initsys"}).status, 0);
+    RunEnds(machine, {"initsys"}, 0);
 }
 
 TEST(InitsysDecides, ToWipeLayoutOneEvenWhereItIsWanted)
@@ -406,8 +390,7 @@ TEST(InitsysDecides, ToWipeLayoutOneEvenWhereItIsWanted)
     KnownDiskRenew(machine, "sda", PLACES_1, RANGE_ALL, MADE_1);
     SystemArrayAdd(machine, {{"sda1"}});
     ArraysExpect(machine, {"sda"});
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 0);
+    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0);
     EXPECT_EQ(CommandsOn(result, "sda"), DecideAndRenewText("sda", RANGE_ALL, MADE_1));
 }
 
@@ -428,8 +411,7 @@ TEST(InitsysDecides, ToRenewUnrecognisedTablesWhenThereIsNoKnownOne)
     RenewExpect(machine, "sdc", RANGE_SYSTEM);
     BlankDiskWipe(machine, "sdd");
     ArraysExpect(machine, ABCD);
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 0);
+    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0);
     for (const char *const szDisk : {"sda", "sdb", "sdc"}) {
         EXPECT_EQ(CommandsOn(result, szDisk), DecideAndRenewText(szDisk, RANGE_SYSTEM));
     }
@@ -444,8 +426,7 @@ TEST(InitsysDecides, ToLeaveUnrecognisedTablesBesideAKnownOne)
     NoSuperblockExpect(machine, "sdb5");
     BlankDiskWipe(machine, "sdc");
     ArraysExpect(machine, {"sdb", "sdc"});
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 0);
+    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0);
     EXPECT_EQ(CommandsOn(result, "sda"), DecideText("sda"));
     EXPECT_EQ(LogErrors(result), Inited("/dev/sdb1 /dev/sdc1 ", "/dev/sdb2 /dev/sdc2 "));
 }
@@ -463,8 +444,7 @@ TEST(InitsysDecides, ToWipeEveryDiskWhereTheMarkerStands)
         RenewExpect(machine, szDisk, RANGE_ALL);
     }
     ArraysExpect(machine, {"sda", "sdb", "sdc"});
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 0);
+    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0);
     EXPECT_EQ(CommandsOn(result, "sdc"), Lines(RenewCommands("sdc", RANGE_ALL)));
     EXPECT_EQ(MachineFileRead("/.force_clean_all_disk"), "");
 }
@@ -478,7 +458,7 @@ TEST(InitsysModel, WithoutRaidGivesTheTypesOfPlainPartitions)
     BlankDiskAdd(machine, "sdb");
     RenewExpect(machine, "sdb", RANGE_ALL, MADE_NO_RAID);
     ArraysExpect(machine, {"sda", "sdb"});
-    EXPECT_EQ(MachineRun(machine, {"initsys"}).status, 0);
+    RunEnds(machine, {"initsys"}, 0);
 }
 
 // What a disk is decided to be is always looked up among the layouts of RAID machines.
@@ -492,7 +472,7 @@ TEST(InitsysModel, WithoutRaidDoesNotRecogniseItsOwnOldLayout)
                     .szType = "-t83",
                     .szSwapType = "-t82"});
     ArraysExpect(machine, {"sda"});
-    EXPECT_EQ(MachineRun(machine, {"initsys"}).status, 0);
+    RunEnds(machine, {"initsys"}, 0);
 }
 
 TEST(InitsysModel, WithBuiltInStorageHasItsOwnGeometry)
@@ -502,7 +482,7 @@ TEST(InitsysModel, WithBuiltInStorageHasItsOwnGeometry)
     BlankDiskAdd(machine, "sdb");
     RenewExpect(machine, "sdb", RANGE_ALL, MADE_BUILDIN);
     ArraysExpect(machine, {"sda", "sdb"});
-    EXPECT_EQ(MachineRun(machine, {"initsys"}).status, 0);
+    RunEnds(machine, {"initsys"}, 0);
 }
 
 TEST(InitsysModel, WithBuiltInStorageAndRaidHasNoLayout)
@@ -512,8 +492,7 @@ TEST(InitsysModel, WithBuiltInStorageAndRaidHasNoLayout)
     BlankDiskAdd(machine, "sda");
     MachineTool(machine, "/sbin/sfdisk --fast-delete -1 /dev/sda");
     MachineTool(machine, "/sbin/sfdisk -M1 /dev/sda");
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 1);
+    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 1);
     EXPECT_EQ(LogOf(result, "partition_edit.cpp"),
               "<11>partition_edit.cpp:# Failed to get partition layout: version=8\n");
     ASSERT_EQ(result.log.size(), 4U) << LogText(result);
@@ -530,8 +509,7 @@ TEST(InitsysModel, WithoutFileKnowsNoDisk)
     MACHINE machine = MachineMake();
     MachineDiskAdd(machine, "sda");
     MachineDiskAdd(machine, "sdb");
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 1);
+    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 1);
     EXPECT_EQ(TranscriptText(result), "");
     EXPECT_EQ(LogOf(result, "arrayctl.cpp"), NO_DISK);
 }
@@ -547,8 +525,7 @@ TEST(InitsysModel, WithTwoHeadsTakesTheExpansionUnits)
     const std::vector<std::string> disks = {"sdga", "sdgb"};
     const std::vector<std::string> arrays = ArrayCommands(disks);
     CommandsExpect(machine, arrays);
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 0);
+    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0);
     EXPECT_EQ(CommandsBeside(result, disks), WithPauses(arrays));
     EXPECT_EQ(LogErrors(result), Inited("/dev/sdga1 /dev/sdgb1 ", "/dev/sdga2 /dev/sdgb2 "));
     EXPECT_EQ(MachineFileRead("/tmp/.dualhead"), "");
@@ -559,8 +536,7 @@ TEST(InitsysModel, WithTwoHeadsIsToldByTheMarkerToo)
     MACHINE machine = MachineWithConf(CONF_RAID);
     MachineFile(machine, "/tmp/.dualhead", "");
     MachineDiskAdd(machine, "sda");
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 1);
+    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 1);
     EXPECT_EQ(LogText(result), NO_DISK);
 }
 
@@ -586,8 +562,7 @@ TEST(InitsysFails, ForADiskThatCannotBePartitionedAlone)
                 {.szErr = "too small\n", .status = 1});
     BlankDiskWipe(machine, "sdc");
     ArraysExpect(machine, {"sda", "sdc"});
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 0);
+    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0);
     EXPECT_EQ(LogErrors(result),
               "<11>partition_edit.cpp:# Failed to partition disk /dev/sdb, err=256\n" +
                   Uncreated("sdb", "0") + Inited("/dev/sda1 /dev/sdc1 ", "/dev/sda2 /dev/sdc2 "));
@@ -605,8 +580,7 @@ TEST(InitsysFails, WithTheCodeThatStands)
     BlankDiskAdd(machine, "sda");
     MachineTool(machine, "/sbin/sfdisk --fast-delete -1 /dev/sda");
     MachineTool(machine, "/sbin/sfdisk -M1 /dev/sda", {.status = 1, .nTimes = 2});
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 1);
+    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 1);
     const std::string szUnsigned =
         "<11>partition_edit.cpp:# Failed to add ms-dos signature to /dev/sda, err=256\n";
     EXPECT_EQ(LogErrors(result),
@@ -622,9 +596,7 @@ TEST(InitsysFails, WhenEveryChildDoes)
         BlankDiskWipe(machine, szDisk);
         machine.rows.back().answer.status = 1; // partition 2
     }
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 1);
-    EXPECT_EQ(result.szOut, "");
+    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 1, "");
     EXPECT_EQ(CommandsBeside(result, ABCD), "");
     EXPECT_EQ(LogText({.log = {result.log.back()}}), NO_DISK);
 }
@@ -641,10 +613,7 @@ TEST(InitsysFails, NotWhenTheArraysDo)
             row.answer = {.szOut = "noise\n", .szErr = "noise\n", .status = 2};
         }
     }
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 0);
-    EXPECT_EQ(result.szOut, "");
-    EXPECT_EQ(result.szErr, "");
+    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0, "");
     EXPECT_EQ(CommandsBeside(result, ABCD), WithPauses(arrays));
     EXPECT_EQ(LogErrors(result),
               "<11>arrayctl.cpp:# Failed to create RAID '/dev/md0' on '/dev/sda1 /dev/sdb1 ' \n"
@@ -661,8 +630,7 @@ TEST(InitsysFails, NotWithoutAShell)
     MACHINE machine = MachineWithConf(CONF_RAID);
     BlankDiskWipe(machine, "sda");
     machine.faults = {{.szFunction = "system", .nCall = 1, .error = EAGAIN, .fGoOn = true}};
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 0);
+    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0);
     EXPECT_EQ(CommandsBeside(result, ABCD), "sleep 3\nfault system 1\nsleep 3\nfault system 2\n");
     EXPECT_EQ(LogErrors(result),
               "<11>arrayctl.cpp:# Failed to create RAID '/dev/md0' on '/dev/sda1 ' \n"
@@ -680,9 +648,7 @@ TEST(InitsysFails, NotWhenTheShellIsKilled)
     MACHINE machine = MachineWithConf(CONF_RAID);
     BlankDiskWipe(machine, "sda");
     ShellKill(machine);
-    const RUN_RESULT result = MachineRun(machine, {"initsys-dd"});
-    EXPECT_EQ(result.status, 0);
-    EXPECT_EQ(result.szOut, "");
+    const RUN_RESULT result = RunEnds(machine, {"initsys-dd"}, 0, "");
     EXPECT_EQ(CommandsBeside(result, ABCD), "sleep 3\nsleep 3\n");
     EXPECT_EQ(LogErrors(result), Inited("/dev/sda1 ", "/dev/sda2 "));
 }
@@ -692,8 +658,7 @@ TEST(InitsysFails, WithoutAPartitionerForEveryDisk)
     MACHINE machine = MachineWithConf(CONF_RAID);
     MachineDiskAdd(machine, "sda");
     machine.tools["/sbin/sfdisk"] = TOOL_KIND::MISSING;
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 1);
+    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 1);
     EXPECT_EQ(LogOf(result, "partition_edit.cpp"),
               "<15>partition_edit.cpp:# Failed to do '/sbin/sfdisk --fast-delete -1 /dev/sda'\n"
               "<11>partition_edit.cpp:# Failed to add ms-dos signature to /dev/sda, err=32512\n"
@@ -708,8 +673,7 @@ TEST(InitsysFails, WhenNoLayoutIsFound)
     MACHINE machine = MachineWithConf(CONF_RAID);
     MachineDiskAdd(machine, "sda");
     machine.faults = {{.szFunction = "glob", .nCall = 1, .error = EIO}};
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 1);
+    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 1);
     EXPECT_EQ(LogText(result), "<11>arrayctl.cpp:# Failed to find partition layout\n");
     EXPECT_EQ(TranscriptText(result), "fault glob 1\n");
 }
@@ -726,8 +690,7 @@ TEST(InitsysFails, WhenTheDisksCannotBeEnumerated)
     for (const ENUM_CASE &row : CASES) {
         MACHINE machine = MachineWithConf(row.szConf);
         machine.faults = {{.szFunction = "glob", .nCall = 3, .error = EIO}};
-        const RUN_RESULT result = MachineRun(machine, {"initsys"});
-        EXPECT_EQ(result.status, 1);
+        const RUN_RESULT result = RunEnds(machine, {"initsys"}, 1);
         EXPECT_EQ(LogText(result), "<11>disk_port.cpp:# read error :/sys/block/sd*\n"
                                    "<11>arrayctl.cpp:# Failed to enum " +
                                        std::string(row.szDevices) + "\n");
@@ -743,8 +706,7 @@ TEST(InitsysFails, AtOnceWhenNoChildCanBeForked)
     MachineDiskAdd(machine, "sda");
     MachineDiskAdd(machine, "sdb");
     machine.faults = {{.szFunction = "fork", .nCall = 1, .error = EAGAIN}};
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 1);
+    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 1);
     EXPECT_EQ(LogErrors(result), NO_FORK);
     EXPECT_EQ(TranscriptText(result), "fault fork 1\n");
 }
@@ -760,8 +722,7 @@ TEST(InitsysFails, AtOnceWhenALaterChildCannotBeForked)
     }
     machine.faults = {{.szFunction = "fork", .nCall = 3, .error = EAGAIN}};
     machine.fMayLeaveChildren = true;
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 1);
+    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 1);
     EXPECT_EQ(LogErrors(result), NO_FORK);
     EXPECT_EQ(CommandsOn(result, "sdc"), "");
     EXPECT_LT(result.seconds, 4.0);
@@ -775,8 +736,7 @@ TEST(InitsysFails, AtOnceWhenAPartitioningChildCannotBeForked)
     MachineDiskAdd(machine, "sda");
     MachineDiskAdd(machine, "sdb");
     machine.faults = {{.szFunction = "fork", .nCall = 3, .error = EAGAIN}};
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 1);
+    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 1);
     EXPECT_EQ(LogErrors(result), NO_FORK);
     EXPECT_EQ(TranscriptText(result), "fault fork 3\n");
 }
@@ -789,8 +749,7 @@ TEST(InitsysFails, ForTheDiskWhoseDecisionCannotBeWaitedFor)
     ArraysExpect(machine, {"sdb"});
     machine.faults = {{.szFunction = "waitpid", .nCall = 1, .error = ECHILD}};
     machine.fMayLeaveChildren = true;
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 0);
+    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0);
     EXPECT_EQ(LogOf(result, "arrayctl.cpp"),
               "<11>arrayctl.cpp:# Wait pid failed. pid: # disk: sda\n" +
                   Inited("/dev/sdb1 ", "/dev/sdb2 "));
@@ -808,8 +767,7 @@ TEST(InitsysFails, ForTheDiskWhosePartitioningCannotBeWaitedFor)
     ArraysExpect(machine, {"sda"});
     machine.faults = {{.szFunction = "waitpid", .nCall = 4, .error = ECHILD}}; // two have decided
     machine.fMayLeaveChildren = true;
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 0);
+    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0);
     EXPECT_EQ(LogOf(result, "arrayctl.cpp"),
               "<11>arrayctl.cpp:# Wait pid failed. pid: # disk: sdb\n" +
                   Inited("/dev/sda1 ", "/dev/sda2 "));
@@ -859,8 +817,7 @@ TEST(InitsysChildren, WorkSideBySide)
     }
     ArraysExpect(machine, ABCD);
     machine.msBound = 30000;
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 0);
+    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0);
     EXPECT_GE(result.seconds, 4.0); // two slow steps: to decide, and to make partition 1
     EXPECT_LT(result.seconds, 8.0); // one after the other it would be sixteen
 }
@@ -876,8 +833,7 @@ TEST(InitsysChildren, AreWaitedForInTheOrderOfTheDisks)
     BlankDiskWipe(machine, "sdc");
     ArraysExpect(machine, {"sdc"});
     machine.fMayLeaveChildren = true; // the killing partitioner itself
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 0);
+    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0);
     EXPECT_EQ(LogOf(result, "arrayctl.cpp"),
               "<11>arrayctl.cpp:# Child exit not normally, pid: # disk: sda\n"
               "<11>arrayctl.cpp:# Child exit not normally, pid: # disk: sdb\n" +
@@ -893,8 +849,7 @@ TEST(InitsysChildren, CostTheirOwnDiskWhenKilled)
     BlankDiskWipe(machine, "sdc");
     ArraysExpect(machine, {"sda", "sdc"});
     machine.fMayLeaveChildren = true;
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 0);
+    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0);
     EXPECT_EQ(LogOf(result, "arrayctl.cpp"),
               "<11>arrayctl.cpp:# Child exit not normally, pid: # disk: sdb\n" +
                   Inited("/dev/sda1 /dev/sdc1 ", "/dev/sda2 /dev/sdc2 "));
@@ -910,10 +865,7 @@ TEST(InitsysChildren, HaveNothingToReadOrToSay)
         row.answer.szErr = "noise\n";
     }
     ArraysExpect(machine, {"sda"});
-    const RUN_RESULT result = MachineRun(machine, {"initsys"});
-    EXPECT_EQ(result.status, 0);
-    EXPECT_EQ(result.szOut, "");
-    EXPECT_EQ(result.szErr, "");
+    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0, "");
     for (const RUN_EVENT &event : result.events) {
         if (IsOnDisk(event, "sda")) {
             EXPECT_TRUE(event.fNullInput) << event.argv[1];
@@ -933,10 +885,7 @@ TEST(InitsysDuplicate, HandsThePartitionsOverBeforeTheArrays)
     const std::vector<std::string> arrays = ArrayCommands({"sda", "sdb"});
     CommandsExpect(machine, arrays);
     ShellWatch(machine);
-    const RUN_RESULT result = MachineRun(machine, {"initsys-dd", "anything"});
-    EXPECT_EQ(result.status, 0);
-    EXPECT_EQ(result.szOut, "");
-    EXPECT_EQ(result.szErr, "");
+    const RUN_RESULT result = RunEnds(machine, {"initsys-dd", "anything"}, 0, "");
     EXPECT_EQ(CommandsBeside(result, ABCD), szDuplicate + "\n" + WithPauses(arrays));
     const std::string szShell = ShellText();
     EXPECT_EQ(szShell.substr(0, szShell.find('\n')),
@@ -954,7 +903,7 @@ TEST(InitsysDuplicate, GetsTheMembersAlone)
     MachineTool(machine, "/sbin/mdadm --zero-superblock /dev/sdb2");
     MachineTool(machine, "/bin/nurodd /dev/sda1 /dev/sda2");
     ArraysExpect(machine, {"sda"}, 1);
-    EXPECT_EQ(MachineRun(machine, {"initsys-dd"}).status, 0);
+    RunEnds(machine, {"initsys-dd"}, 0);
 }
 
 TEST(InitsysDuplicate, ThatFailsChangesNothing)
@@ -964,9 +913,7 @@ TEST(InitsysDuplicate, ThatFailsChangesNothing)
         BlankDiskWipe(machine, "sda");
         MachineTool(machine, "/bin/nurodd /dev/sda1 /dev/sda2", {.status = status});
         ArraysExpect(machine, {"sda"});
-        const RUN_RESULT result = MachineRun(machine, {"initsys-dd"});
-        EXPECT_EQ(result.status, 0);
-        EXPECT_EQ(result.szOut, "system init with nurodd failed\n");
+        RunEnds(machine, {"initsys-dd"}, 0, "system init with nurodd failed\n");
     }
 }
 
@@ -977,10 +924,7 @@ TEST(InitsysDuplicate, ThatIsMissingIsAFailedOne)
         BlankDiskWipe(machine, "sda");
         machine.tools["/bin/nurodd"] = kind;
         ArraysExpect(machine, {"sda"});
-        const RUN_RESULT result = MachineRun(machine, {"initsys-dd"});
-        EXPECT_EQ(result.status, 0);
-        EXPECT_EQ(result.szOut, "system init with nurodd failed\n");
-        EXPECT_EQ(result.szErr, "");
+        RunEnds(machine, {"initsys-dd"}, 0, "system init with nurodd failed\n");
     }
 }
 
@@ -990,9 +934,7 @@ TEST(InitsysDuplicate, WithoutAShellIsAnotherMessage)
     BlankDiskWipe(machine, "sda");
     machine.faults = {{.szFunction = "system", .nCall = 1, .error = EAGAIN}};
     ArraysExpect(machine, {"sda"});
-    const RUN_RESULT result = MachineRun(machine, {"initsys-dd"});
-    EXPECT_EQ(result.status, 0);
-    EXPECT_EQ(result.szOut, "can not fork to nurodd\n"); // one line only
+    RunEnds(machine, {"initsys-dd"}, 0, "can not fork to nurodd\n"); // one line only
 }
 
 TEST(InitsysDuplicate, RunsWithTwoEmptyListsWhenNoDiskIsThere)
@@ -1000,16 +942,13 @@ TEST(InitsysDuplicate, RunsWithTwoEmptyListsWhenNoDiskIsThere)
     MACHINE machine = MachineWithConf(CONF_RAID);
     MachineTool(machine, "/bin/nurodd");
     ShellWatch(machine);
-    const RUN_RESULT result = MachineRun(machine, {"initsys-dd"});
-    EXPECT_EQ(result.status, 1);
-    EXPECT_EQ(result.szOut, "");
+    const RUN_RESULT result = RunEnds(machine, {"initsys-dd"}, 1, "");
     EXPECT_EQ(ShellText(), "/bin/nurodd   > /dev/null 2>&1\n");
     EXPECT_EQ(LogText(result), NO_DISK);
 
     BlankDiskWipe(machine, "sda");
     machine.rows.back().answer.status = 1;
-    const RUN_RESULT failed = MachineRun(machine, {"initsys-dd"});
-    EXPECT_EQ(failed.status, 1);
+    RunEnds(machine, {"initsys-dd"}, 1);
     EXPECT_EQ(ShellText(), "/bin/nurodd   > /dev/null 2>&1\n");
 }
 

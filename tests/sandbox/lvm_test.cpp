@@ -340,11 +340,10 @@ TEST(LVMRmLVPath, EscapesOfTheTableAreRead)
     MachineFolder(machine, "/my volume");
     MachineTool(machine, {"/bin/umount", "-R", "-A", "-k", "/my volume"});
     StepsExpect(machine, Pvs(ROW_MD2) + STEPS{{"/sbin/lvremove -f /dev/vg1/lv1s1"}} + REMOVED);
-    const RUN_RESULT result = MachineCall(machine, [] {
+    QuietCall(machine, [] {
         EXPECT_EQ(LVMRmLVPath("/dev/md2"), 0);
         EXPECT_EQ(access("/my volume", F_OK), -1);
     });
-    EXPECT_EQ(LogText(result), "");
 }
 
 TEST(LVMRmLVPath, EmptyFieldsAreTakenAsTheyAre)

@@ -170,9 +170,7 @@ TEST(MemberList, OfTheDuplicationToolHoldsWholePartitionsAndKeepsTheRedirection)
     for (const DUPLICATE_CASE &row : DUPLICATE_CASES) {
         SCOPED_TRACE(std::to_string(row.nDisk) + " internal disks");
         MANY_DISKS many = InternalDisks(row.nDisk);
-        const RUN_RESULT result = MachineRun(many.machine, {"initsys-dd"});
-        EXPECT_EQ(result.status, 0);
-        EXPECT_EQ(result.szOut, "");
+        const RUN_RESULT result = RunEnds(many.machine, {"initsys-dd"}, 0, "");
         ExpectPartitionsOnly(result, many);
         const std::string szCommand = FirstLine(ShellText());
         EXPECT_EQ(szCommand.size(), row.cchCommand);
@@ -254,8 +252,7 @@ TEST(MemberList, OfTheSystemArraysHoldsWholePartitions)
         SCOPED_TRACE(row.szName);
         MANY_DISKS many = UnitDisks(row.units);
         ASSERT_EQ(many.disks.size(), row.nDisk);
-        const RUN_RESULT result = MachineRun(many.machine, {"initsys"});
-        EXPECT_EQ(result.status, 0);
+        const RUN_RESULT result = RunEnds(many.machine, {"initsys"}, 0);
         ExpectPartitionsOnly(result, many);
         EXPECT_EQ(NamedCounts(result), (std::vector<size_t>{row.nNamed, row.nNamed}));
         const std::string szNote = NOTE + std::string(row.szNote) + NO_ROOM;
@@ -274,8 +271,7 @@ TEST(MemberList, OfTheDuplicationToolIsMadeOfTheListsOfTheArrays)
     for (const UNITS_CASE &row : UNITS_CASES) {
         SCOPED_TRACE(row.szName);
         MANY_DISKS many = UnitDisks(row.units);
-        const RUN_RESULT result = MachineRun(many.machine, {"initsys-dd"});
-        EXPECT_EQ(result.status, 0);
+        const RUN_RESULT result = RunEnds(many.machine, {"initsys-dd"}, 0);
         ExpectPartitionsOnly(result, many);
         const std::string szNote = NOTE + std::string(row.szNote) + NO_ROOM;
         EXPECT_EQ(NotesOnRoom(result), (row.szNote[0] == '\0' ? "" : szNote + szNote) + NOTE +
@@ -288,9 +284,8 @@ TEST(MemberList, OfTheDataArrayHoldsWholePartitions)
     for (const UNITS_CASE &row : UNITS_CASES) {
         SCOPED_TRACE(row.szName);
         MANY_DISKS many = UnitDisks(row.units);
-        const RUN_RESULT result = MachineRun(many.machine, {"newvol"});
-        EXPECT_EQ(result.status, 0);
-        EXPECT_EQ(result.szOut, "Creating RAID 5 volume... \n");
+        const RUN_RESULT result =
+            RunEnds(many.machine, {"newvol"}, 0, "Creating RAID 5 volume... \n");
         ExpectPartitionsOnly(result, many);
         EXPECT_EQ(NamedCounts(result), std::vector<size_t>{row.nNamed});
         const std::string szNote = NOTE + std::string(row.szNote) + NO_ROOM;
@@ -308,8 +303,7 @@ TEST(MemberList, OfTheDataArrayHoldsWholePartitions)
 TEST(MemberList, OfAllInternalDisksIsWhole)
 {
     MANY_DISKS many = InternalDisks(32);
-    const RUN_RESULT result = MachineRun(many.machine, {"newvol"});
-    EXPECT_EQ(result.status, 0);
+    const RUN_RESULT result = RunEnds(many.machine, {"newvol"}, 0);
     ExpectPartitionsOnly(result, many);
     EXPECT_EQ(NamedCounts(result), std::vector<size_t>{32});
     EXPECT_EQ(NotesOnRoom(result), "");

@@ -124,10 +124,8 @@ TEST(Newvol, MakesTheDataArrayOfTheInternalDisks)
             MachineFile(machine, szMarker, "");
         }
         MachineTool(machine, "/sbin/mdadm -C /dev/md2 ...");
-        const RUN_RESULT result = MachineRun(machine, {"newvol"});
-        EXPECT_EQ(result.status, 0);
-        EXPECT_EQ(result.szOut, "Creating RAID " + std::to_string(row.level) + " volume... \n");
-        EXPECT_EQ(result.szErr, "");
+        const RUN_RESULT result = RunEnds(
+            machine, {"newvol"}, 0, "Creating RAID " + std::to_string(row.level) + " volume... \n");
         const std::string szForced = row.nDisk == 1 ? " -f" : "";
         std::string szMembers = MembersText(disks);
         EXPECT_EQ(ShellText(), "/sbin/mdadm -C /dev/md2 -amd -R -l" + std::to_string(row.level) +
@@ -162,7 +160,7 @@ TEST(Newvol, LeavesOtherPortsAlone)
         MachineDiskAdd(machine, szOther);
     }
     MachineTool(machine, "/sbin/mdadm -C /dev/md2 -amd -R -l1 -f -n1 /dev/sdb3");
-    EXPECT_EQ(MachineRun(machine, {"newvol"}).status, 0);
+    RunEnds(machine, {"newvol"}, 0);
 }
 
 // A disk's own layout is no matter, nor is an array on it.
@@ -174,7 +172,7 @@ TEST(Newvol, GivesEveryDiskTheNewestGap)
     CreateExpect(machine, "sda");
     SystemArrayAdd(machine, {{"sda1"}});
     MachineTool(machine, "/sbin/mdadm -C /dev/md2 -amd -R -l1 -f -n1 /dev/sda3");
-    EXPECT_EQ(MachineRun(machine, {"newvol"}).status, 0);
+    RunEnds(machine, {"newvol"}, 0);
 }
 
 TEST(Newvol, TakesTypeAndGapOfTheModel)
@@ -190,8 +188,7 @@ TEST(Newvol, TakesTypeAndGapOfTheModel)
         MACHINE machine = MachineWithConf(row.szConf);
         DataDiskAdd(machine, "sda", row.made);
         MachineTool(machine, "/sbin/mdadm -C /dev/md2 -amd -R -l1 -f -n1 /dev/sda3");
-        const RUN_RESULT result = MachineRun(machine, {"newvol"});
-        EXPECT_EQ(result.status, 0);
+        const RUN_RESULT result = RunEnds(machine, {"newvol"}, 0);
         EXPECT_EQ(CommandsOn(result, "sda"), RenewText("sda", row.made));
     }
 }
@@ -205,11 +202,8 @@ TEST(Newvol, AnswersFurtherArgumentsWithTheUsage)
     const std::vector<std::vector<std::string>> cases = {
         {"newvol", "3"}, {"newvol", ""}, {"newvol", "2", "3"}};
     for (const std::vector<std::string> &arguments : cases) {
-        const RUN_RESULT result = MachineRun(machine, arguments);
-        EXPECT_EQ(result.status, 1);
-        EXPECT_EQ(result.szOut, USAGE);
-        EXPECT_EQ(LogText(result), "");
-        EXPECT_EQ(TranscriptText(result), "");
+        const RUN_RESULT result = RunEnds(machine, arguments, 1, USAGE);
+        EXPECT_EQ(OrderText(result), "");
         EXPECT_EQ(MachineFileRead("/tmp/.dualhead"), std::nullopt); // nothing was asked
     }
 }
@@ -219,11 +213,8 @@ TEST(Newvol, SaysThatThereIsNoDisk)
     for (const char *const szConf : {CONF_RAID, CONF_DUAL_HEAD}) {
         MACHINE machine = MachineWithConf(szConf);
         MachineDiskAdd(machine, "sde"); // USB
-        const RUN_RESULT result = MachineRun(machine, {"newvol"});
-        EXPECT_EQ(result.status, 1);
-        EXPECT_EQ(result.szOut, NO_DISK);
-        EXPECT_EQ(LogText(result), "");
-        EXPECT_EQ(TranscriptText(result), "");
+        const RUN_RESULT result = RunEnds(machine, {"newvol"}, 1, NO_DISK);
+        EXPECT_EQ(OrderText(result), "");
     }
 }
 
@@ -239,9 +230,7 @@ TEST(Newvol, FailsWhenTheDisksCannotBeEnumerated)
     for (const ENUM_CASE &row : CASES) {
         MACHINE machine = MachineWithConf(row.szConf);
         machine.faults = {{.szFunction = "glob", .nCall = 1, .error = EIO}};
-        const RUN_RESULT result = MachineRun(machine, {"newvol"});
-        EXPECT_EQ(result.status, 1);
-        EXPECT_EQ(result.szOut, "");
+        const RUN_RESULT result = RunEnds(machine, {"newvol"}, 1, "");
         EXPECT_EQ(LogText(result), "<11>disk_port.cpp:# read error :/sys/block/sd*\n"
                                    "<11>arrayctl.cpp:# Failed to enum " +
                                        std::string(row.szDevices) + "\n");
@@ -280,9 +269,7 @@ TEST(NewvolFails, AtTheFirstDiskThatCannotBePartitioned)
     CleanExpect(machine, "sdb");
     CreateExpect(machine, "sdb", {}, {.szErr = "does not fit\n", .status = 1});
     MachineDiskAdd(machine, "sdc");
-    const RUN_RESULT result = MachineRun(machine, {"newvol"});
-    EXPECT_EQ(result.status, 1);
-    EXPECT_EQ(result.szOut, "");
+    const RUN_RESULT result = RunEnds(machine, {"newvol"}, 1, "");
     EXPECT_EQ(TranscriptText(result), RenewText("sda") + RenewText("sdb"));
     EXPECT_EQ(LogText(result),
               "<11>partition_edit.cpp:# Failed to [/sbin/sfdisk -N3  -uS -q -f -j260352 -z-1 -tfd "
@@ -297,8 +284,7 @@ TEST(NewvolFails, WithTheCodeThatStands)
     MachineDiskAdd(machine, "sda");
     CleanExpect(machine, "sda");
     CreateExpect(machine, "sda", {}, {.status = 1});
-    const RUN_RESULT result = MachineRun(machine, {"newvol"});
-    EXPECT_EQ(result.status, 1);
+    const RUN_RESULT result = RunEnds(machine, {"newvol"}, 1);
     EXPECT_EQ(LogOf(result, "arrayctl.cpp"),
               "<11>arrayctl.cpp:# Failed to create data partition of /dev/sda, errno=0x2000\n");
 }
@@ -310,8 +296,7 @@ TEST(NewvolFails, WithoutARowForTheModel)
                                       "internalportcfg=0xf\n");
     MachineDiskAdd(machine, "sda");
     CleanExpect(machine, "sda");
-    const RUN_RESULT result = MachineRun(machine, {"newvol"});
-    EXPECT_EQ(result.status, 1);
+    const RUN_RESULT result = RunEnds(machine, {"newvol"}, 1);
     EXPECT_EQ(LogErrors(result).substr(0, LogErrors(result).find('\n') + 1),
               "<11>partition_edit.cpp:# Failed to get partition layout: version=0\n");
 }
@@ -323,8 +308,7 @@ TEST(NewvolFails, NotWhenThePartitionsCannotBeDeleted)
         row.answer.status = row.argv[1] == "-N3" ? 0 : 1;
     }
     MachineTool(machine, "/sbin/mdadm -C /dev/md2 -amd -R -l1 -n2 /dev/sda3 /dev/sdb3");
-    const RUN_RESULT result = MachineRun(machine, {"newvol"});
-    EXPECT_EQ(result.status, 0);
+    const RUN_RESULT result = RunEnds(machine, {"newvol"}, 0);
     EXPECT_EQ(LogText(result),
               "<15>partition_edit.cpp:# Failed to do '/sbin/sfdisk --fast-delete 3:128 /dev/sda'\n"
               "<11>partition_edit.cpp:# Failed to add ms-dos signature to /dev/sda, err=256\n"
@@ -340,10 +324,7 @@ TEST(NewvolFails, WithTheExitStatusOfTheArrayTool)
         MachineTool(machine,
                     "/sbin/mdadm -C /dev/md2 -amd -R -l5 -n3 /dev/sda3 /dev/sdb3 /dev/sdc3",
                     {.szOut = "noise\n", .szErr = "noise\n", .status = status});
-        const RUN_RESULT result = MachineRun(machine, {"newvol"});
-        EXPECT_EQ(result.status, 1);
-        EXPECT_EQ(result.szOut, "Creating RAID 5 volume... \n");
-        EXPECT_EQ(result.szErr, "");
+        const RUN_RESULT result = RunEnds(machine, {"newvol"}, 1, "Creating RAID 5 volume... \n");
         EXPECT_EQ(LogText(result),
                   "<11>arrayctl.cpp:# Failed to create RAID '/dev/md2' on '/dev/sda3 /dev/sdb3 "
                   "/dev/sdc3 ', errno=" +
@@ -355,8 +336,7 @@ TEST(NewvolFails, WithoutAnArrayTool)
 {
     MACHINE machine = MachineWithDisks(CONF_RAID, FirstDisks(1));
     machine.tools["/sbin/mdadm"] = TOOL_KIND::MISSING;
-    const RUN_RESULT result = MachineRun(machine, {"newvol"});
-    EXPECT_EQ(result.status, 1);
+    const RUN_RESULT result = RunEnds(machine, {"newvol"}, 1);
     EXPECT_EQ(LogText(result),
               "<11>arrayctl.cpp:# Failed to create RAID '/dev/md2' on '/dev/sda3 ', errno=127\n");
 }
@@ -365,8 +345,7 @@ TEST(NewvolFails, WithoutAShell)
 {
     MACHINE machine = MachineWithDisks(CONF_RAID, FirstDisks(1));
     machine.faults = {{.szFunction = "system", .nCall = 1, .error = EAGAIN}};
-    const RUN_RESULT result = MachineRun(machine, {"newvol"});
-    EXPECT_EQ(result.status, 1);
+    const RUN_RESULT result = RunEnds(machine, {"newvol"}, 1);
     EXPECT_EQ(LogText(result),
               "<11>arrayctl.cpp:# Failed to create RAID '/dev/md2' on '/dev/sda3 ', errno=255\n");
 }
@@ -376,8 +355,7 @@ TEST(NewvolFails, NotWhenTheShellIsKilled)
 {
     MACHINE machine = MachineWithDisks(CONF_RAID, FirstDisks(1));
     ShellKill(machine);
-    const RUN_RESULT result = MachineRun(machine, {"newvol"});
-    EXPECT_EQ(result.status, 0);
+    const RUN_RESULT result = RunEnds(machine, {"newvol"}, 0);
     EXPECT_EQ(TranscriptText(result), RenewText("sda"));
     EXPECT_EQ(LogText(result), "");
 }
@@ -456,10 +434,9 @@ TEST(NewvolDualHead, TakesTheDisksOfAnExpansionUnitUpToItsLimit)
         SCOPED_TRACE(testing::Message() << row.szConf << row.nDisk);
         MACHINE machine = MachineWithUnit(row.szConf, row.nDisk, row.nTaken);
         UnitArrayExpect(machine, row.nTaken);
-        const RUN_RESULT result = MachineRun(machine, {"newvol"});
-        EXPECT_EQ(result.status, 0);
-        EXPECT_EQ(result.szOut,
-                  row.nTaken > 2 ? "Creating RAID 5 volume... \n" : "Creating RAID 1 volume... \n");
+        const RUN_RESULT result = RunEnds(machine, {"newvol"}, 0,
+                                          row.nTaken > 2 ? "Creating RAID 5 volume... \n"
+                                                         : "Creating RAID 1 volume... \n");
         EXPECT_EQ(LogText(result), row.nDisk > row.nTaken ? OverLimit(row.nTaken) : "");
     }
 }
@@ -470,9 +447,7 @@ TEST(NewvolDualHead, SaysThatThereIsNoDiskWithinItsLimit)
         SCOPED_TRACE(szLimit);
         const MACHINE machine =
             MachineWithUnit("raidgroup_split_units=" + std::string(szLimit) + "\n", 3, 0);
-        const RUN_RESULT result = MachineRun(machine, {"newvol"});
-        EXPECT_EQ(result.status, 1);
-        EXPECT_EQ(result.szOut, NO_DISK);
+        const RUN_RESULT result = RunEnds(machine, {"newvol"}, 1, NO_DISK);
         EXPECT_EQ(LogText(result), OverLimit(0));
         EXPECT_EQ(TranscriptText(result), "");
     }
@@ -486,8 +461,7 @@ TEST(NewvolDualHead, ReadsItsLimitOnEveryTurn)
         {"/etc.defaults/nuroinfo.conf", std::string(CONF_DUAL_HEAD) + "raidgroup_split_units=1\n"}};
     machine.rows.erase(machine.rows.begin() + 3, machine.rows.end());
     UnitArrayExpect(machine, 1);
-    const RUN_RESULT result = MachineRun(machine, {"newvol"});
-    EXPECT_EQ(result.status, 0);
+    const RUN_RESULT result = RunEnds(machine, {"newvol"}, 0);
     EXPECT_EQ(LogText(result), OverLimit(1));
 }
 
@@ -498,8 +472,7 @@ TEST(NewvolDualHead, AloneHasALimit)
             std::string(CONF_RAID) + "raidgroup_split_units=" + szLimit + "\n", FirstDisks(4));
         MachineTool(machine, "/sbin/mdadm -C /dev/md2 -amd -R -l5 -n4 /dev/sda3 /dev/sdb3 "
                              "/dev/sdc3 /dev/sdd3");
-        const RUN_RESULT result = MachineRun(machine, {"newvol"});
-        EXPECT_EQ(result.status, 0);
+        const RUN_RESULT result = RunEnds(machine, {"newvol"}, 0);
         EXPECT_EQ(LogText(result), "");
     }
 }
@@ -510,14 +483,14 @@ TEST(NewvolDualHead, IsToldByTheMarkersFirst)
     MachineConf(machine, CONF_RAID);
     MachineFile(machine, "/tmp/.dualhead", "");
     UnitArrayExpect(machine, 2);
-    EXPECT_EQ(MachineRun(machine, {"newvol"}).status, 0);
+    RunEnds(machine, {"newvol"}, 0);
 
     MACHINE machineNot = MachineWithUnit("", 2, 0);
     MachineFile(machineNot, "/tmp/.not.dualhead", "");
     CleanExpect(machineNot, "sda");
     CreateExpect(machineNot, "sda");
     MachineTool(machineNot, "/sbin/mdadm -C /dev/md2 -amd -R -l1 -f -n1 /dev/sda3");
-    EXPECT_EQ(MachineRun(machineNot, {"newvol"}).status, 0);
+    RunEnds(machineNot, {"newvol"}, 0);
 }
 
 // ---- in turn -----------------------------------------------------------------------------------
@@ -530,8 +503,7 @@ TEST(Newvol, HandlesOneDiskAfterTheOther)
         row.answer.msDelay = row.argv[1] == "-N3" ? 300 : 0;
     }
     MachineTool(machine, "/sbin/mdadm -C /dev/md2 ...");
-    const RUN_RESULT result = MachineRun(machine, {"newvol"});
-    EXPECT_EQ(result.status, 0);
+    const RUN_RESULT result = RunEnds(machine, {"newvol"}, 0);
     EXPECT_GE(result.seconds, 0.9);
     EXPECT_EQ(CommandsBeside(result, {}).substr(0, RenewAllText(FirstDisks(3)).size()),
               RenewAllText(FirstDisks(3)));

@@ -229,9 +229,7 @@ TEST(PartitionPathEnum, AnEmptyListFails)
     MachineFile(machine, "/proc/partitions", "");
     const RUN_RESULT result = MachineCall(machine, [] {
         PNLIBSZLIST pList = NLIBCSzListAlloc(512);
-        RecordReset();
-        EXPECT_EQ(PartitionPathEnum(nullptr, &pList), -1);
-        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
+        EXPECT_QUIET(PartitionPathEnum(nullptr, &pList), -1);
         EXPECT_EQ(pList->nItem, 0);
         EXPECT_EQ(pList->fMode, 1);
         NLIBCSzListFree(pList);
@@ -269,14 +267,13 @@ TEST(PartitionPathEnum, WithoutMemoryForALineFails)
         MACHINE machine = MachineWithNames({"sda", "sdb"});
         machine.faults = {{.szFunction = "strdup", .nCall = nCall}};
         const char *const szAdded = ADDED[nCall - 1];
-        const RUN_RESULT result = MachineCall(machine, [szAdded] {
+        QuietCall(machine, [szAdded] {
             PNLIBSZLIST pList = NLIBCSzListAlloc(512);
             EXPECT_EQ(PartitionPathEnum(nullptr, &pList), -1);
             EXPECT_EQ(NLIBCErrGet(), ERR_OUT_OF_MEMORY);
             EXPECT_EQ(ListText(pList), szAdded);
             NLIBCSzListFree(pList);
         });
-        EXPECT_EQ(LogText(result), "");
     }
 }
 

@@ -48,14 +48,13 @@ RUN_RESULT ExpectFirst(const MACHINE &machine, u32 versionExpected)
 
 TEST(PartitionVersion, RefusesNull)
 {
-    const RUN_RESULT result = MachineCall(MachineMake(), [] {
+    QuietCall(MachineMake(), [] {
         RecordReset();
         EXPECT_EQ(PartitionLayoutGetMax(nullptr, 0), -1);
         EXPECT_EQ(PartitionLayoutGetMax(nullptr, 1), -1);
         EXPECT_EQ(PartitionLayoutGet(nullptr), -1);
         EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
     });
-    EXPECT_EQ(LogText(result), "");
 }
 
 // ---- a running system array --------------------------------------------------------------------
@@ -69,8 +68,7 @@ TEST(PartitionVersion, IsThatOfTheRunningSystemArray)
     SystemArrayAdd(machine, {{"sda1"}, {"sdb1"}});
     for (const int fChooseBiggest : {0, 1}) {
         const RUN_RESULT result = ExpectVersion(machine, fChooseBiggest, 2);
-        EXPECT_EQ(LogText(result), "");
-        EXPECT_EQ(TranscriptText(result), "");
+        EXPECT_EQ(OrderText(result), "");
     }
 }
 
@@ -143,8 +141,7 @@ TEST(PartitionVersion, IsTheNewestWhenNoMemberIsKnown)
     PartitionedDiskAdd(machine, "sdb", PLACES_7); // no member
     SystemArrayAdd(machine, {{"sda1"}});
     const RUN_RESULT result = ExpectVersion(machine, 1, 8);
-    EXPECT_EQ(LogText(result), "");
-    EXPECT_EQ(TranscriptText(result), "");
+    EXPECT_EQ(OrderText(result), "");
 }
 
 TEST(PartitionVersion, TakesAMembersNameWithoutItsLastCharacter)
@@ -171,12 +168,11 @@ TEST(PartitionVersion, FailsWhenTheMembersCannotBeRead)
     MACHINE machine = MachineWithConf(CONF_NO_RAID);
     PartitionedDiskAdd(machine, "sda", PLACES_7);
     machine.faults = {{.szFunction = "glob", .nCall = 1, .error = EIO}};
-    const RUN_RESULT result = MachineCall(machine, [] {
+    const RUN_RESULT result = QuietCall(machine, [] {
         u32 version = 0;
         EXPECT_EQ(PartitionLayoutGetMax(&version, 1), -1);
         EXPECT_EQ(version, 0U);
     });
-    EXPECT_EQ(LogText(result), "");
     EXPECT_EQ(TranscriptText(result), "fault glob 1\n");
 }
 
@@ -206,8 +202,7 @@ TEST(PartitionVersion, IsThatOfTheFirstDiskOrTheBiggest)
     PartitionedDiskAdd(machine, "sdb", PLACES_7);
     PartitionedDiskAdd(machine, "sdc", PLACES_3_NO_RAID);
     const RUN_RESULT first = ExpectFirst(machine, 6);
-    EXPECT_EQ(LogText(first), "");
-    EXPECT_EQ(TranscriptText(first), "");
+    EXPECT_EQ(OrderText(first), "");
     const RUN_RESULT biggest = ExpectVersion(machine, 1, 7);
     EXPECT_EQ(LogText(biggest), Biggest(7));
     EXPECT_EQ(TranscriptText(biggest), "");
@@ -250,9 +245,7 @@ TEST(PartitionVersion, AsksForRaidBeforeTheDisks)
         EXPECT_EQ(PartitionLayoutGet(&version), 0);
         EXPECT_EQ(version, 8U);
         EXPECT_EQ(NLIBCErrGet(), ERR_KEY_NOT_FOUND);
-        RecordReset();
-        EXPECT_EQ(IsSupportRaid(), 0);
-        EXPECT_EQ(NLIBCErrGet(), OLD_CODE); // it was asked above
+        EXPECT_QUIET(IsSupportRaid(), 0); // it was asked above
     });
     MachineCall(machine, [] {
         EXPECT_EQ(IsSupportRaid(), 0);

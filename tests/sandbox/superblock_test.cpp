@@ -97,7 +97,7 @@ RAID_SUPERBLOCK WithEvents(i32 events)
 
 void LinesAreTaken(const std::vector<LINE_CASE> &cases)
 {
-    const RUN_RESULT result = MachineCall(MachineMake(), [&cases] {
+    QuietCall(MachineMake(), [&cases] {
         for (const LINE_CASE &row : cases) {
             std::string szLine = row.szLine;
             RAID_SUPERBLOCK superblock = BEFORE;
@@ -105,7 +105,6 @@ void LinesAreTaken(const std::vector<LINE_CASE> &cases)
             EXPECT_EQ(superblock, row.after) << row.szLine;
         }
     });
-    EXPECT_EQ(LogText(result), "");
 }
 
 TEST(SuperblockLine, Version)
@@ -395,7 +394,7 @@ TEST(SuperblockReport, OfEveryKindIsReadFromTheCommand)
         MachineTool(machine, std::string("/sbin/mdadm -E /dev/") + row.szName,
                     {.szOut = ReportRead(std::string(row.szName) + ".txt")});
     }
-    const RUN_RESULT result = MachineCall(machine, [] {
+    QuietCall(machine, [] {
         for (const REPORT_CASE &row : REPORT_CASES) {
             RAID_SUPERBLOCK superblock = {};
             EXPECT_EQ(RAIDSuperblockGet((std::string("/dev/") + row.szName).c_str(), &superblock),
@@ -403,7 +402,6 @@ TEST(SuperblockReport, OfEveryKindIsReadFromTheCommand)
             EXPECT_EQ(superblock, row.superblock) << row.szName;
         }
     });
-    EXPECT_EQ(LogText(result), "");
 }
 
 // ---- the command -------------------------------------------------------------------------------

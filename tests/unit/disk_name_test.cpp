@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: MIT
 #include "hwcontrol/disk_name.h"
 
-#include "test_error.h"
+#include "last_error.h"
 
 #include <array>
 #include <climits>
@@ -114,9 +114,7 @@ TEST(DiskIndexGet, NumbersEveryNameOfUpToThreeLettersInTurn)
 
 TEST(DiskIndexGet, NullIsNoDiskAndSetsNoCode)
 {
-    ErrorMark();
-    EXPECT_EQ(DiskIndexGet(nullptr), -1);
-    EXPECT_EQ(NLIBCErrGet(), ERROR_MARK);
+    EXPECT_QUIET(DiskIndexGet(nullptr), -1);
 }
 
 struct NUMBER_CASE {
@@ -203,12 +201,12 @@ TEST(DiskPartitionNumGet, SplitsNameIntoDiskAndNumber)
     for (const NUMBER_CASE &row : NUMBER_CASES) {
         SCOPED_TRACE(testing::Message() << '"' << row.szName << "\" into " << row.cbDisk);
         GUARDED_BUFFER disk(row.cbDisk);
-        ErrorMark();
+        RecordReset();
         EXPECT_EQ(DiskPartitionNumGet(row.szName, disk.text.data(), static_cast<int>(disk.cb)),
                   row.number);
         EXPECT_EQ(TextOf(disk), row.szDisk);
         EXPECT_TRUE(IsRestKept(disk));
-        EXPECT_EQ(NLIBCErrGet(), ERROR_MARK);
+        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
     }
 }
 
@@ -239,9 +237,8 @@ TEST(DiskPartitionNumGet, RefusesBadArguments)
                 {"sda1", szDisk, -1},
                 {"sda1", szDisk, INT_MIN}};
     for (const auto &row : rows) {
-        ErrorMark();
-        EXPECT_EQ(DiskPartitionNumGet(row.szName, row.szDisk, row.cbDisk), -1);
-        EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
+        EXPECT_FAILS(DiskPartitionNumGet(row.szName, row.szDisk, row.cbDisk), -1,
+                     ERR_BAD_PARAMETER);
         EXPECT_STREQ(NLIBCErrGetFile(), "disk_name.cpp");
         EXPECT_GT(NLIBCErrGetLine(), 1);
         EXPECT_TRUE(IsRestKept(disk));
@@ -291,11 +288,11 @@ TEST(DiskPartitionNumRemove, CutsTheNumber)
     for (const REMOVE_CASE &row : REMOVE_CASES) {
         SCOPED_TRACE(row.szPart);
         GUARDED_BUFFER disk(32);
-        ErrorMark();
+        RecordReset();
         EXPECT_EQ(DiskPartitionNumRemove(row.szPart, disk.text.data(), 32), 0);
         EXPECT_EQ(TextOf(disk), row.szDisk);
         EXPECT_TRUE(IsRestKept(disk));
-        EXPECT_EQ(NLIBCErrGet(), ERROR_MARK);
+        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
     }
 }
 
@@ -332,14 +329,14 @@ TEST(DiskPartitionNumRemove, TakesUpTo31CharactersIntoTheUsualBuffer)
 TEST(DiskPartitionNumRemove, RefusesBadArgumentsWithoutACode)
 {
     GUARDED_BUFFER disk(0);
-    ErrorMark();
+    RecordReset();
     EXPECT_EQ(DiskPartitionNumRemove(nullptr, disk.text.data(), 32), -1);
     EXPECT_EQ(DiskPartitionNumRemove("sda1", nullptr, 32), -1);
     EXPECT_EQ(DiskPartitionNumRemove("sda1", disk.text.data(), 0), -1);
     EXPECT_EQ(DiskPartitionNumRemove("sda1", disk.text.data(), -1), -1);
     EXPECT_EQ(DiskPartitionNumRemove("sda1", disk.text.data(), 4), -1);
     EXPECT_TRUE(IsRestKept(disk));
-    EXPECT_EQ(NLIBCErrGet(), ERROR_MARK);
+    EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
 }
 
 struct PARTITION_CASE {
@@ -376,12 +373,12 @@ TEST(DiskDevicePartitionNameGet, PutsTheNumberBehindTheName)
     for (const PARTITION_CASE &row : PARTITION_CASES) {
         SCOPED_TRACE(row.szDisk);
         GUARDED_BUFFER name(32);
-        ErrorMark();
+        RecordReset();
         EXPECT_EQ(DiskDevicePartitionNameGet(row.szDisk, row.partNum, name.text.data(), name.cb),
                   0);
         EXPECT_EQ(TextOf(name), row.szName);
         EXPECT_TRUE(IsRestKept(name));
-        EXPECT_EQ(NLIBCErrGet(), ERROR_MARK);
+        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
     }
 }
 
@@ -390,12 +387,12 @@ TEST(DiskDevicePartitionPathGet, PutsDevInFront)
     for (const PARTITION_CASE &row : PARTITION_CASES) {
         SCOPED_TRACE(row.szDisk);
         GUARDED_BUFFER path(64);
-        ErrorMark();
+        RecordReset();
         EXPECT_EQ(DiskDevicePartitionPathGet(row.szDisk, row.partNum, path.text.data(), path.cb),
                   0);
         EXPECT_EQ(TextOf(path), std::string("/dev/") + row.szName);
         EXPECT_TRUE(IsRestKept(path));
-        EXPECT_EQ(NLIBCErrGet(), ERROR_MARK);
+        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
     }
 }
 
@@ -467,30 +464,28 @@ TEST(DiskDevicePartitionNameGet, RefusesWhatHasNoPartitions)
         {"nuroboot", 1, szOut, 32},  {"/dev/nuroboot", 1, szOut, 32},
         {"nurobootx", 1, szOut, 32}, {"/dev/nuroboot1", 1, szOut, 32},
     };
-    ErrorMark();
+    RecordReset();
     for (const auto &row : rows) {
         EXPECT_EQ(DiskDevicePartitionNameGet(row.szDisk, row.partNum, row.szOut, row.cbOut), -1);
         EXPECT_EQ(DiskDevicePartitionPathGet(row.szDisk, row.partNum, row.szOut, row.cbOut), -1);
     }
     EXPECT_TRUE(IsRestKept(out));
-    EXPECT_EQ(NLIBCErrGet(), ERROR_MARK);
+    EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
 }
 
 TEST(DiskIsExist, NullIsABadParameter)
 {
-    ErrorMark();
-    EXPECT_EQ(DiskIsExist(nullptr), -1);
-    EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
+    EXPECT_FAILS(DiskIsExist(nullptr), -1, ERR_BAD_PARAMETER);
     EXPECT_STREQ(NLIBCErrGetFile(), "disk_name.cpp");
 }
 
 TEST(DiskIsExist, WhatIsNoBlockDeviceDoesNotExist)
 {
-    ErrorMark();
+    RecordReset();
     EXPECT_EQ(DiskIsExist("/dev/no-such-disk"), 0);
     EXPECT_EQ(DiskIsExist("/"), 0);
     EXPECT_EQ(DiskIsExist("/dev/null"), 0);
-    EXPECT_EQ(NLIBCErrGet(), ERROR_MARK);
+    EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
 }
 
 } // namespace

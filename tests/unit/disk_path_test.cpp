@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: MIT
 #include "hwcontrol/disk_path.h"
 
-#include "test_error.h"
+#include "last_error.h"
 
 #include <cstddef>
 
@@ -50,7 +50,7 @@ constexpr CONTAINER_CASE CONTAINER_CASES[] = {
 
 TEST(DiskContainerFromPortType, MapsThePortTypes)
 {
-    ErrorMark();
+    RecordReset();
     for (const CONTAINER_CASE &row : CONTAINER_CASES) {
         u32 mask = OLD_MASK;
         EXPECT_EQ(DiskContainerFromPortType(static_cast<DISK_PORT_TYPE>(row.type), &mask),
@@ -58,17 +58,17 @@ TEST(DiskContainerFromPortType, MapsThePortTypes)
             << row.type;
         EXPECT_EQ(mask, row.mask) << row.type;
     }
-    EXPECT_EQ(NLIBCErrGet(), ERROR_MARK);
+    EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
 }
 
 TEST(DiskContainerGet, RefusesNullWithoutACode)
 {
     u32 mask = OLD_MASK;
-    ErrorMark();
+    RecordReset();
     EXPECT_EQ(DiskContainerGet(nullptr, &mask), -1);
     EXPECT_EQ(DiskContainerGet("mmcblk0", nullptr), -1);
     EXPECT_EQ(mask, OLD_MASK);
-    EXPECT_EQ(NLIBCErrGet(), ERROR_MARK);
+    EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
 }
 
 TEST(DiskContainerGet, HasNoneForCardsAndTheBootDevice)
@@ -83,13 +83,9 @@ TEST(DiskContainerGet, HasNoneForCardsAndTheBootDevice)
 TEST(DiskPathParse, RefusesNull)
 {
     DISK_PATH_INFO info = {};
-    ErrorMark();
-    EXPECT_EQ(DiskPathParse(nullptr, &info), -1);
-    EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
+    EXPECT_FAILS(DiskPathParse(nullptr, &info), -1, ERR_BAD_PARAMETER);
     EXPECT_STREQ(NLIBCErrGetFile(), "disk_path.cpp");
-    ErrorMark();
-    EXPECT_EQ(DiskPathParse("mmcblk0", nullptr), -1);
-    EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
+    EXPECT_FAILS(DiskPathParse("mmcblk0", nullptr), -1, ERR_BAD_PARAMETER);
 }
 
 struct PARSE_CASE {
@@ -112,13 +108,13 @@ TEST(DiskPathParse, CountsACardAsUsbAndTheBootDeviceAsInternal)
     for (const PARSE_CASE &row : PARSE_CASES) {
         SCOPED_TRACE(row.szPath);
         DISK_PATH_INFO info = {99, 99, 99, 99};
-        ErrorMark();
+        RecordReset();
         EXPECT_EQ(DiskPathParse(row.szPath, &info), 0);
         EXPECT_EQ(info.diskIndex, row.info.diskIndex);
         EXPECT_EQ(info.container, row.info.container);
         EXPECT_EQ(info.unitIndex, row.info.unitIndex);
         EXPECT_EQ(info.partitionNum, row.info.partitionNum);
-        EXPECT_EQ(NLIBCErrGet(), ERROR_MARK);
+        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
     }
 }
 

@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: MIT
 #include "nurocore/error.h"
 
+#include "last_error.h"
 #include "nurocore/szlist.h"
-#include "test_error.h"
 
 #include <string>
 
@@ -52,12 +52,12 @@ TEST(LastError, TheSecondOfTwoFailuresIsLeft)
 
 TEST(LastError, ASuccessLeavesTheFailureBefore)
 {
-    ErrorMark();
+    RecordReset();
     PNLIBSZLIST pList = NLIBCSzListAlloc(512);
     ASSERT_EQ(NLIBCSzListPush(&pList, "sda"), 0);
     NLIBCSzListFree(pList);
-    EXPECT_EQ(NLIBCErrGet(), ERROR_MARK);
-    EXPECT_STREQ(NLIBCErrGetFile(), "mark");
+    EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
+    EXPECT_STREQ(NLIBCErrGetFile(), "before");
     EXPECT_EQ(NLIBCErrGetLine(), 1);
 }
 

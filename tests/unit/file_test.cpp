@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: MIT
 #include "nurocore/file.h"
 
-#include "test_error.h"
+#include "last_error.h"
 #include "test_files.h"
 #include "test_szlist.h"
 

@@ -2,7 +2,7 @@
 #include "nurocore/hash.h"
 
 #include "hash_walk.h"
-#include "test_error.h"
+#include "last_error.h"
 
 #include <algorithm>
 #include <climits>
@@ -122,9 +122,9 @@ TEST(HashAlloc, ATableLargerThanTheAddressSpaceIsNone)
 
 TEST(HashFree, IgnoresNull)
 {
-    ErrorMark();
+    RecordReset();
     NLIBCHashFree(nullptr);
-    EXPECT_EQ(NLIBCErrGet(), ERROR_MARK);
+    EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
 }
 
 TEST(HashSet, RefusesNullWithoutACode)

@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: MIT
 #include "nurocore/io.h"
 
+#include "last_error.h"
 #include "test_child.h"
-#include "test_error.h"
 #include "test_files.h"
 
 #include <algorithm>
@@ -68,12 +68,12 @@ TEST(Fgets, IsTriedThreeTimesWhileInterrupted)
         FILE *const pStream = ScriptOpen(script);
         ASSERT_NE(pStream, nullptr);
         char szLine[16] = "";
+        RecordReset();
         errno = ERRNO_AT_ENTRY;
-        ErrorMark();
         char *const pszRead = NLIBCFgets(szLine, 16, pStream);
         const int errnoAtReturn = errno;
         EXPECT_EQ(errnoAtReturn, ERRNO_AT_ENTRY);
-        EXPECT_EQ(NLIBCErrGet(), ERROR_MARK);
+        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
         EXPECT_EQ(script.nRead, row.nRead);
         if (row.szLine == nullptr) {
             EXPECT_EQ(pszRead, nullptr);
@@ -135,12 +135,16 @@ TEST(Fgets, RefusesBadArguments)
     FILE *const pStream = ScriptOpen(script);
     ASSERT_NE(pStream, nullptr);
     char szLine[8];
-    errno = ERRNO_AT_ENTRY;
-    EXPECT_FAILS(NLIBCFgets(nullptr, 8, pStream), nullptr, ERR_BAD_PARAMETER);
-    EXPECT_FAILS(NLIBCFgets(szLine, 0, pStream), nullptr, ERR_BAD_PARAMETER);
-    EXPECT_FAILS(NLIBCFgets(szLine, -1, pStream), nullptr, ERR_BAD_PARAMETER);
-    EXPECT_FAILS(NLIBCFgets(szLine, 8, nullptr), nullptr, ERR_BAD_PARAMETER);
-    EXPECT_EQ(errno, ERRNO_AT_ENTRY);
+    const auto read = [](char *szBuf, int cbBuf, FILE *pFrom) {
+        errno = ERRNO_AT_ENTRY;
+        char *const pszRead = NLIBCFgets(szBuf, cbBuf, pFrom);
+        EXPECT_EQ(errno, ERRNO_AT_ENTRY);
+        return pszRead;
+    };
+    EXPECT_FAILS(read(nullptr, 8, pStream), nullptr, ERR_BAD_PARAMETER);
+    EXPECT_FAILS(read(szLine, 0, pStream), nullptr, ERR_BAD_PARAMETER);
+    EXPECT_FAILS(read(szLine, -1, pStream), nullptr, ERR_BAD_PARAMETER);
+    EXPECT_FAILS(read(szLine, 8, nullptr), nullptr, ERR_BAD_PARAMETER);
     EXPECT_EQ(script.nRead, 0);
     (void)fclose(pStream);
 }
@@ -161,22 +165,27 @@ struct PIPE_PAIR {
     }
 };
 
+// Reads with this errno at entry, and has it back.
+ssize_t ReadAt(int errnoAtEntry, int fd, void *p, size_t cb)
+{
+    errno = errnoAtEntry;
+    const ssize_t cbRead = NLIBCRead(fd, p, cb);
+    EXPECT_EQ(errno, errnoAtEntry);
+    return cbRead;
+}
+
 TEST(Read, GivesWhatReadGivesAndErrnoBack)
 {
     const PIPE_PAIR pipe;
     char szBuf[8] = "";
     ASSERT_EQ(write(pipe.fd[1], "abc", 3), 3);
-    errno = ERRNO_AT_ENTRY;
-    EXPECT_QUIET(NLIBCRead(pipe.fd[0], szBuf, 2), 2);
-    EXPECT_QUIET(NLIBCRead(pipe.fd[0], szBuf + 2, 6), 1);
+    EXPECT_QUIET(ReadAt(ERRNO_AT_ENTRY, pipe.fd[0], szBuf, 2), 2);
+    EXPECT_QUIET(ReadAt(ERRNO_AT_ENTRY, pipe.fd[0], szBuf + 2, 6), 1);
     EXPECT_STREQ(szBuf, "abc");
-    EXPECT_EQ(errno, ERRNO_AT_ENTRY);
 
     const TEST_FOLDER folder;
     const int fdEmpty = open(folder.Write("f", "").c_str(), O_RDONLY | O_CLOEXEC);
-    errno = EINTR;
-    EXPECT_QUIET(NLIBCRead(fdEmpty, szBuf, 8), 0);
-    EXPECT_EQ(errno, EINTR);
+    EXPECT_QUIET(ReadAt(EINTR, fdEmpty, szBuf, 8), 0);
     (void)close(fdEmpty);
 }
 
@@ -185,9 +194,7 @@ TEST(Read, ReportsAFailureWithoutACode)
     const PIPE_PAIR pipe;
     char szBuf[8];
     for (const int errnoAtEntry : {ERRNO_AT_ENTRY, EINTR, 0}) {
-        errno = errnoAtEntry;
-        EXPECT_QUIET(NLIBCRead(pipe.fd[1], szBuf, 8), -1); // the end that is written
-        EXPECT_EQ(errno, errnoAtEntry);
+        EXPECT_QUIET(ReadAt(errnoAtEntry, pipe.fd[1], szBuf, 8), -1); // the end that is written
     }
 }
 
@@ -195,11 +202,9 @@ TEST(Read, RefusesBadArguments)
 {
     const PIPE_PAIR pipe;
     char szBuf[8];
-    errno = ERRNO_AT_ENTRY;
-    EXPECT_FAILS(NLIBCRead(-1, szBuf, 8), -1, ERR_BAD_PARAMETER);
-    EXPECT_FAILS(NLIBCRead(pipe.fd[0], nullptr, 8), -1, ERR_BAD_PARAMETER);
-    EXPECT_FAILS(NLIBCRead(pipe.fd[0], szBuf, 0), -1, ERR_BAD_PARAMETER);
-    EXPECT_EQ(errno, ERRNO_AT_ENTRY);
+    EXPECT_FAILS(ReadAt(ERRNO_AT_ENTRY, -1, szBuf, 8), -1, ERR_BAD_PARAMETER);
+    EXPECT_FAILS(ReadAt(ERRNO_AT_ENTRY, pipe.fd[0], nullptr, 8), -1, ERR_BAD_PARAMETER);
+    EXPECT_FAILS(ReadAt(ERRNO_AT_ENTRY, pipe.fd[0], szBuf, 0), -1, ERR_BAD_PARAMETER);
 }
 
 // The pipe that the signal handlers below feed, and after how many signals.

@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: MIT
 #include "nurocore/pipe.h"
 
+#include "last_error.h"
 #include "test_child.h"
-#include "test_error.h"
 #include "test_files.h"
 
 #include <initializer_list>
@@ -168,7 +168,7 @@ TEST(Popen, WithoutDescriptorsThereIsNoPipe)
     EXPECT_EQ(InChild([] {
                   constexpr rlimit none = {3, 3};
                   (void)setrlimit(RLIMIT_NOFILE, &none);
-                  ErrorMark();
+                  RecordReset();
                   FILE *const pStream = NLIBCPopen("/bin/true", "r", nullptr);
                   return std::string(pStream == nullptr ? "none " : "some ") +
                          std::to_string(NLIBCErrGet());

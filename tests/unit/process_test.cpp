@@ -1,9 +1,9 @@
 // SPDX-License-Identifier: MIT
 #include "nurocore/process.h"
 
+#include "last_error.h"
 #include "lock_file.h"
 #include "test_child.h"
-#include "test_error.h"
 #include "test_files.h"
 
 #include <cstdlib>
@@ -208,7 +208,7 @@ TEST(Fork, FailureSetsItsCode)
 {
     EXPECT_EQ(InChild([] {
                   ForkForbid();
-                  ErrorMark();
+                  RecordReset();
                   const int result = NLIBCFork(0xBB);
                   return std::to_string(result) + " " + std::to_string(NLIBCErrGet());
               }),
@@ -486,11 +486,11 @@ TEST(ForkCloseIo, FailureSetsNoCode)
 {
     EXPECT_EQ(InChild([] {
                   ForkForbid();
-                  ErrorMark();
+                  RecordReset();
                   const int result = NLIBCForkCloseIo();
                   return std::to_string(result) + " " + std::to_string(NLIBCErrGet());
               }),
-              "-1 " + std::to_string(ERROR_MARK));
+              "-1 " + std::to_string(OLD_CODE));
 }
 
 } // namespace

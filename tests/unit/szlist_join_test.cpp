@@ -3,7 +3,7 @@
 // Texts made of a string list, and lists made of two.
 #include "nurocore/szlist.h"
 
-#include "test_error.h"
+#include "last_error.h"
 #include "test_szlist.h"
 
 #include <algorithm>
@@ -271,9 +271,9 @@ TEST(SzListOr, FollowsTheOrdersOfBoth)
         TEST_LIST a(row.a, row.fModeA);
         const TEST_LIST b(row.b, row.fModeB);
         const bool fNew = row.flags == SZLIST_OR_NEW;
-        ErrorMark();
+        RecordReset();
         const PNLIBSZLIST pResult = NLIBCSzListOr(&a.p, b.p, row.flags);
-        EXPECT_EQ(NLIBCErrGet(), ERROR_MARK);
+        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
         ASSERT_NE(pResult, nullptr);
         EXPECT_EQ(ItemsOf(pResult), row.expected);
         EXPECT_EQ(pResult->fMode, row.fModeExpected);

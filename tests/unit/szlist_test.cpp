@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: MIT
 #include "nurocore/szlist.h"
 
-#include "test_error.h"
+#include "last_error.h"
 #include "test_files.h"
 #include "test_szlist.h"
 
@@ -35,9 +35,9 @@ TEST(SzListAlloc, StartsEmptyAndUnsorted)
 
 TEST(SzListFree, IgnoresNull)
 {
-    ErrorMark();
+    RecordReset();
     NLIBCSzListFree(nullptr);
-    EXPECT_EQ(NLIBCErrGet(), ERROR_MARK);
+    EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
 }
 
 // Strings of three characters take 3 + 1 bytes and a slot of 4: 488 / 8 = 61 of them fill the
@@ -268,9 +268,9 @@ TEST(SzListGet, RefusesWhatIsOutside)
     EXPECT_FAILS(NLIBCSzListGet(list.p, -1), nullptr, ERR_BAD_PARAMETER);
     EXPECT_FAILS(NLIBCSzListGet(list.p, 2), nullptr, ERR_BAD_PARAMETER);
     EXPECT_FAILS(NLIBCSzListGet(TEST_LIST().p, 0), nullptr, ERR_BAD_PARAMETER);
-    ErrorMark();
+    RecordReset();
     EXPECT_STREQ(NLIBCSzListGet(list.p, 1), "b");
-    EXPECT_EQ(NLIBCErrGet(), ERROR_MARK);
+    EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
 }
 
 TEST(SzListFind, TellsTheFirstEqualItemOfAnUnsortedList)
@@ -372,9 +372,9 @@ TEST(SzListRemove, ClosesTheGapAndGivesFourBytesBack)
     TEST_LIST list({"a", "b", "c"}, SZLIST_UNSORTED);
     const i32 nFree = list.p->nFree;
     const i32 endOfFree = list.p->EndofFree;
-    ErrorMark();
+    RecordReset();
     EXPECT_STREQ(NLIBCSzListRemove(list.p, 1), "b") << "the bytes stay in the block";
-    EXPECT_EQ(NLIBCErrGet(), ERROR_MARK);
+    EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
     EXPECT_EQ(ItemsOf(list.p), (ITEMS{"a", "c"}));
     EXPECT_EQ(list.p->nFree, nFree + 4);
     EXPECT_EQ(list.p->EndofFree, endOfFree);
@@ -580,9 +580,9 @@ TEST(SzListSort, FromOneOrderToAnotherOnlyStoresTheMode)
 
 TEST(SzListSort, IgnoresNull)
 {
-    ErrorMark();
+    RecordReset();
     NLIBCSzListSort(nullptr, SZLIST_SORTED);
-    EXPECT_EQ(NLIBCErrGet(), ERROR_MARK);
+    EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
 }
 
 TEST(SzListCompact, DropsTheEmptySlots)
@@ -601,7 +601,7 @@ TEST(SzListCompact, DropsTheEmptySlots)
 
 TEST(SzListCompact, RefusesNull)
 {
-    ErrorMark();
+    RecordReset();
     NLIBCSzListCompact(nullptr);
     EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
 }
@@ -622,7 +622,7 @@ TEST(SzListClear, KeepsTheBlockAndTheMode)
 
 TEST(SzListClear, RefusesNull)
 {
-    ErrorMark();
+    RecordReset();
     NLIBCSzListClear(nullptr);
     EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
 }

@@ -487,6 +487,22 @@ RUN_RESULT MachineRun(const MACHINE &machine, const std::vector<std::string> &ar
     return ProblemsFail(MachineTry(machine, arguments));
 }
 
+RUN_RESULT RunEnds(const MACHINE &machine, const std::vector<std::string> &arguments, int status)
+{
+    RUN_RESULT result = MachineRun(machine, arguments);
+    EXPECT_EQ(result.status, status);
+    EXPECT_EQ(result.szErr, "");
+    return result;
+}
+
+RUN_RESULT RunEnds(const MACHINE &machine, const std::vector<std::string> &arguments, int status,
+                   const std::string &szOut)
+{
+    RUN_RESULT result = RunEnds(machine, arguments, status);
+    EXPECT_EQ(result.szOut, szOut);
+    return result;
+}
+
 RUN_RESULT MachineRunAgain(const MACHINE &machine, const std::vector<std::string> &arguments)
 {
     return ProblemsFail(MachineTryAgain(machine, arguments));
@@ -519,6 +535,20 @@ RUN_RESULT MachineCall(const MACHINE &machine, const std::function<void()> &body
                       << result.szOut << result.szErr;
     }
     return ProblemsFail(std::move(result));
+}
+
+RUN_RESULT QuietCall(const MACHINE &machine, const std::function<void()> &body)
+{
+    RUN_RESULT result = MachineCall(machine, body);
+    EXPECT_EQ(LogText(result), "");
+    return result;
+}
+
+RUN_RESULT IdleCall(const MACHINE &machine, const std::function<void()> &body)
+{
+    RUN_RESULT result = MachineCall(machine, body);
+    EXPECT_EQ(OrderText(result), "");
+    return result;
 }
 
 std::vector<std::string> MachineCalls()

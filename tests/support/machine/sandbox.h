@@ -237,6 +237,11 @@ std::string Lines(const std::vector<std::string> &lines);
 // Lays the machine out and runs the program with these arguments. Every problem fails the test.
 RUN_RESULT MachineRun(const MACHINE &machine, const std::vector<std::string> &arguments);
 
+// The same. It ends with this status, with nothing on standard error, and prints this, if said.
+RUN_RESULT RunEnds(const MACHINE &machine, const std::vector<std::string> &arguments, int status);
+RUN_RESULT RunEnds(const MACHINE &machine, const std::vector<std::string> &arguments, int status,
+                   const std::string &szOut);
+
 // The same, but problems are only listed in the result.
 RUN_RESULT MachineTry(const MACHINE &machine, const std::vector<std::string> &arguments);
 
@@ -250,6 +255,10 @@ RUN_RESULT MachineTryAgain(const MACHINE &machine, const std::vector<std::string
 // bodies run in the test program of another processor, that program has no results of the calls
 // before: a test must reach its later calls whatever came of the earlier ones.
 RUN_RESULT MachineCall(const MACHINE &machine, const std::function<void()> &body);
+
+// The same, and nothing is logged; and nothing is run either.
+RUN_RESULT QuietCall(const MACHINE &machine, const std::function<void()> &body);
+RUN_RESULT IdleCall(const MACHINE &machine, const std::function<void()> &body);
 
 // After a run of a machine with fCallsTold: each call that can be made to fail, in order within its
 // process, as "PROCESS FUNCTION OBJECT".

@@ -5,23 +5,27 @@
 
 #include "nurocore/error.h"
 
+#include <cerrno>
 #include <gtest/gtest.h>
 
-// No failure sets it: the low byte of a code is 0.
-constexpr u32 ERROR_MARK = 0x0D0D;
+// Stands in the record before a call, so that it shows whether the call wrote it; no failure has
+// it.
+inline constexpr u32 OLD_CODE = 0xFFFFFF00;
 
-inline void ErrorMark()
+// And no errno of an earlier call, whose words would get into the log.
+inline void RecordReset()
 {
-    NLIBCErrSet(ERROR_MARK, "mark", 1);
+    NLIBCErrSet(OLD_CODE, "before", 1);
+    errno = 0;
 }
 
 // The call returns result and leaves code in the record.
 #define EXPECT_FAILS(call, result, code)                                                           \
     do {                                                                                           \
-        ErrorMark();                                                                               \
+        RecordReset();                                                                             \
         EXPECT_EQ(call, result);                                                                   \
         EXPECT_EQ(NLIBCErrGet(), u32{code}) << #call;                                              \
     } while (false)
 
 // The call returns result and does not touch the record.
-#define EXPECT_QUIET(call, result) EXPECT_FAILS(call, result, ERROR_MARK)
+#define EXPECT_QUIET(call, result) EXPECT_FAILS(call, result, OLD_CODE)
