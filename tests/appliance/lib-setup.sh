@@ -1,28 +1,32 @@
 # SPDX-License-Identifier: MIT
 # shellcheck shell=sh
-# shellcheck disable=SC2034  # the cases read what stands here
+# shellcheck disable=SC2034,SC2046,SC2086  # the cases read what stands here; lists of words
 #
 # What the cases share that set up machines: other models, disks with a past, and what the tool is
-# to leave on them. They source it after lib.sh.
+# to leave on them. It brings lib.sh along.
+# shellcheck source-path=SCRIPTDIR source-path=SCRIPTDIR/.. source=lib.sh
+. /appliance/lib.sh
 
 CONFIGURATION=/etc.defaults/nuroinfo.conf
-OPERATION_ERRORS=/var/log/space_operation_error.log
 SCSI_HOSTS=/sys/class/scsi_host
 SLEEPS=/tmp/sleeps
-LOG_SECONDS=5
 
 # Layout 8, the newest: with disks of 4672 MiB its third partition has 64 MiB.
 LAYOUT_8='1 2048 4980480 fd
 2 4982528 4194304 fd'
 LAYOUT_8_DATA='3 9437184 131072 fd'
+WHOLE_8="$LAYOUT_8
+$LAYOUT_8_DATA"
 
 # Older ones, with the place for data that their own data partitions have.
 LAYOUT_7='1 256 4980480 fd
 2 4980736 4194304 fd'
-LAYOUT_7_DATA='3 9437184 131072 fd'
+WHOLE_7="$LAYOUT_7
+3 9437184 131072 fd"
 LAYOUT_6='1 63 4980087 fd
 2 4980150 4192965 fd'
-LAYOUT_6_DATA='3 9430155 138101 fd'
+WHOLE_6="$LAYOUT_6
+3 9430155 138101 fd"
 
 # --- the machine -------------------------------------------------------------------------------
 
@@ -36,15 +40,18 @@ machine() {
     done
 }
 
+# bays MASK [KEY=VALUE...]: the disks of this mask are the machine's own, and none is on USB.
+bays() {
+    mask=$1
+    shift
+    machine "internalportcfg=$mask" usbportcfg=0x10000 "$@"
+}
+
 # expansion_unit /dev/sde,/dev/sdf: what the host adapter reports of a unit behind it.
 expansion_unit() {
     must mount -t tmpfs tmpfs "$SCSI_HOSTS"
     must mkdir "$SCSI_HOSTS/host0"
     echo "nuro_device_list=\"$1\"" >"$SCSI_HOSTS/host0/nuro_pm_info"
-}
-
-expansion_unit_off() {
-    must umount "$SCSI_HOSTS"
 }
 
 # --- disks -------------------------------------------------------------------------------------
@@ -81,8 +88,13 @@ table_is() {
     diff "$EXPECTED" "$SEEN"
 }
 
-has_no_partition() {
-    [ -z "$(table_of "$1")" ]
+# check_tables TABLE DISK...: each has these partitions and no other.
+check_tables() {
+    table=$1
+    shift
+    for disk in "$@"; do
+        check "table of $disk" table_is "$disk" "$table"
+    done
 }
 
 # A clean ms-dos label, with nothing beside it that another program could take for the disk's.
@@ -100,14 +112,12 @@ writes_of() {
 watch_writes() {
     watched=$*
     sync
-    # shellcheck disable=SC2086
     writes_of $watched >/tmp/writes
 }
 
 # Not one sector of the watched disks was written or given up since.
 nothing_written() {
     sync
-    # shellcheck disable=SC2086
     writes_of $watched | diff /tmp/writes -
 }
 
@@ -149,42 +159,26 @@ uuid_of() {
     mdadm --detail "/dev/md$1" | sed -n 's/^ *UUID : \([^ ]*\).*/\1/p'
 }
 
+# claims_are "ARRAY" SLOT...: each superblock tells this of its array, and its own slot in it.
+claims_are() {
+    claim=$1
+    shift
+    slot=0
+    for member in "$@"; do
+        [ "$member" = missing ] || echo "$claim $slot"
+        slot=$((slot + 1))
+    done | tr '\n' ' ' >"$EXPECTED"
+    claims_of $(nodes "$@" | sed 's/missing //g') >"$SEEN"
+    diff "$EXPECTED" "$SEEN"
+}
+
 # system_arrays_are SLOT...: a disk, or "missing", for every slot of the system and the swap array,
 # in the driver's words and in those of each superblock.
 system_arrays_are() {
     for part in 1 2; do
-        slots=
-        nodes=
-        claims=
-        slot=0
-        for disk in "$@"; do
-            if [ "$disk" = missing ]; then
-                slots="$slots missing"
-            else
-                slots="$slots $disk$part"
-                nodes="$nodes /dev/$disk$part"
-                claims="${claims}0.90.00 raid1 $# $((part - 1)) $slot "
-            fi
-            slot=$((slot + 1))
-        done
-        # shellcheck disable=SC2086
+        slots=$(printf "%s$part " "$@" | sed "s/missing$part/missing/g")
         array_is $((part - 1)) raid1 0.90 $slots || return 1
-        # shellcheck disable=SC2086
-        seen_claims=$(claims_of $nodes)
-        [ "$seen_claims" = "$claims" ] || {
-            echo "superblocks: expected '$claims'"
-            echo "seen '$seen_claims'"
-            return 1
-        }
-    done
-}
-
-# As if the first resync had come to its end. It would keep a data array on the same disks waiting.
-end_resync() {
-    for number in "$@"; do
-        echo frozen >"/sys/block/md$number/md/sync_action"
-        echo none >"/sys/block/md$number/md/resync_start"
-        echo idle >"/sys/block/md$number/md/sync_action"
+        claims_are "0.90.00 raid1 $# $((part - 1))" $slots || return 1
     done
 }
 
@@ -218,8 +212,16 @@ arrayctl_awake() {
         -e inject=clock_nanosleep:retval=0 arrayctl "$@"
 }
 
-slept_before_both_arrays() {
-    [ "$(grep -c '{tv_sec=3, tv_nsec=0}' "$SLEEPS")" = 2 ]
+# check_initsys SLOT...: it ends well, with a disk or "missing" in every slot.
+check_initsys() {
+    check 'initsys' says 0 '' arrayctl_awake initsys
+    check 'arrays' system_arrays_are "$@"
+}
+
+# installs SLOT...: the same, and the arrays are stopped again.
+installs() {
+    check_initsys "$@"
+    stop_arrays 0 1
 }
 
 # says STATUS TEXT COMMAND...: the exit status, and every byte on standard output and error. It is
@@ -228,39 +230,25 @@ says() {
     status=$1
     printf '%b' "$2" >"$EXPECTED"
     shift 2
+    log_is_whole
     log_start=$(wc -l <"$SYSLOG")
-    "$@" >"$SEEN" 2>"$ERRORS"
-    seen_status=$?
-    [ "$seen_status" = "$status" ] || {
-        echo "expected status $status, seen $seen_status"
-        tail -n +$((log_start + 1)) "$SYSLOG"
-        return 1
-    }
-    cat "$ERRORS"
-    cmp "$EXPECTED" "$SEEN" && [ ! -s "$ERRORS" ]
+    answers "$status" "$@"
+    said=$?
+    log_is_whole
+    [ "$said" = 0 ] || log_of_run
+    return "$said"
 }
 
 log_of_run() {
     tail -n +$((log_start + 1)) "$SYSLOG" |
-        sed "s/^.* user\.\([a-z]*\) arrayctl: [a-z_]*\.cpp:[0-9]* /\1 /"
+        sed -n "s/^.* user\.\([a-z]*\) arrayctl: [a-z_]*\.cpp:[0-9]* /\1 /p"
 }
 
-log_has() {
-    [ "$(log_of_run | grep -cxF -- "$2")" = "$1" ]
-}
-
-# logged "PRIORITY MESSAGE" [TIMES]: whole lines of the last run, without their place in the source.
+# logged "PRIORITY MESSAGE": one whole line of the last run, without its place in the source.
 logged() {
-    wait_for "$LOG_SECONDS" log_has "${2:-1}" "$1" || {
-        log_of_run
-        return 1
-    }
-}
-
-not_logged() {
-    is_not grep -qF -- "$1" <<LINES
-$(log_of_run)
-LINES
+    [ "$(log_of_run | grep -cxF -- "$1")" = 1 ] && return
+    log_of_run
+    return 1
 }
 
 # What an installation says of the layout, the disks that it took, one that it could not, and none.

@@ -1,5 +1,6 @@
 # SPDX-License-Identifier: MIT
 # shellcheck shell=sh
+# shellcheck disable=SC2046,SC2086  # lists of words
 #
 # What the cases share. They run inside the appliance under BusyBox sh; the runner outside reads
 # the lines "plan N", "ok NAME", "not ok NAME" and "end", and takes anything else as an explanation.
@@ -11,6 +12,7 @@ SEEN=/tmp/seen
 ERRORS=/tmp/errors
 RUNS=/tmp/runs
 SYSLOG=/var/log/messages
+OPERATION_ERRORS=/var/log/space_operation_error.log
 
 # Nobody waits longer than the condition takes; one that does not come true in this time hangs.
 SETTLE_SECONDS=$SILENCE
@@ -37,23 +39,6 @@ must() {
         cat /tmp/must
         abort "$* ended with an error"
     }
-}
-
-pass() {
-    echo "ok $1"
-}
-
-fail() {
-    echo "not ok $1"
-    shift
-    for line in "$@"; do
-        echo "    $line"
-    done
-}
-
-show_file() {
-    echo "    $1:"
-    cat -A "$2" | sed 's/^/        /'
 }
 
 # --- many checks, one verdict ------------------------------------------------------------------
@@ -84,9 +69,10 @@ as_expected() {
 # verdict NAME: one for all the checks since the one before.
 verdict() {
     if [ "$failures" -eq 0 ] && [ "$checks" -gt 0 ]; then
-        pass "$1 ($checks checks)"
+        echo "ok $1 ($checks checks)"
     else
-        fail "$1" "$failures of $checks checks failed"
+        echo "not ok $1"
+        echo "    $failures of $checks checks failed"
     fi
     checks=0
     failures=0
@@ -103,6 +89,15 @@ wait_for() {
         [ "$tenths" -gt 0 ] || return 1
         sleep 0.1
     done
+}
+
+# comes COMMAND...: sooner or later. await COMMAND...: what follows needs it.
+comes() {
+    wait_for "$SETTLE_SECONDS" "$@"
+}
+
+await() {
+    comes "$@" || abort "it does not come to this: $*"
 }
 
 # --- disks -------------------------------------------------------------------------------------
@@ -123,7 +118,7 @@ partition_disks() {
 # pull_disk sdd: as if the drive was taken out of its bay.
 pull_disk() {
     echo 1 >"/sys/block/$1/device/delete"
-    wait_for "$SETTLE_SECONDS" test ! -e "/sys/block/$1" || abort "$1 cannot be pulled"
+    await test ! -e "/sys/block/$1"
 }
 
 # picture NODE...: a line for each, another one when a single bit of it changes. What the arrays on
@@ -158,6 +153,24 @@ make_array() {
     must mdadm --create "/dev/md$number" --run "$@"
 }
 
+# nodes NAME...: as mdadm wants them; an empty slot has no node.
+nodes() {
+    printf '/dev/%s ' "$@" | sed 's,/dev/missing,missing,g'
+}
+
+# The UUID that "array" gives: the next array's differs in the last digit alone.
+uuid() {
+    printf '5b1f2c3d:4e5f6071:8293a4b5:%08x' "$1"
+}
+
+# array MD "OPTIONS" MEMBER...: an array in sync over these members, "missing" for an empty slot.
+array() {
+    number=$1
+    options=$2
+    shift 2
+    make_array "$number" --uuid="$(uuid "$number")" --assume-clean --raid-devices=$# $options $(nodes "$@")
+}
+
 array_is_gone() {
     ! grep -q "^md$1 :" /proc/mdstat
 }
@@ -166,16 +179,20 @@ array_is_gone() {
 stop_arrays() {
     for number in "$@"; do
         must mdadm --stop "/dev/md$number"
-        wait_for "$SETTLE_SECONDS" array_is_gone "$number" || abort "md$number does not go away"
+        await array_left_nothing "$number"
     done
 }
 
-# drop_array MD MEMBER...: stops it and takes its superblocks off, so that the next one starts blank.
-drop_array() {
-    stop_arrays "$1"
-    shift
-    for member in "$@"; do
-        must mdadm --zero-superblock "$member"
+# drop_arrays MD...: stops them and takes the superblocks off the members that the driver still lists,
+# so that the next one starts blank.
+drop_arrays() {
+    for number in "$@"; do
+        members=
+        for entry in "/sys/block/md$number/md/dev-"*; do
+            members="$members /dev/${entry##*/dev-}"
+        done
+        stop_arrays "$number"
+        must mdadm --zero-superblock $members
     done
 }
 
@@ -183,24 +200,20 @@ drop_array() {
 # it; so the member's own word decides.
 fail_member() {
     mdadm "/dev/md$1" --fail "/dev/$2" >/dev/null 2>&1
-    wait_for "$SETTLE_SECONDS" grep -q faulty "/sys/block/md$1/md/dev-$2/state" || abort "$2 of md$1 does not fail"
+    await grep -q faulty "/sys/block/md$1/md/dev-$2/state"
 }
 
 # break_array MD MEMBER: fails a member that the driver cannot do without. It keeps the member and
 # marks the array instead.
 break_array() {
     echo faulty >"/sys/block/md$1/md/dev-$2/state" 2>/dev/null
-    wait_for_broken "$1"
-}
-
-wait_for_broken() {
-    wait_for "$SETTLE_SECONDS" grep -q broken "/sys/block/md$1/md/array_state" || abort "md$1 is not broken"
+    await grep -q broken "/sys/block/md$1/md/array_state"
 }
 
 # Keeps a resync from ending before it was looked at, and lets it go on.
 slow_resync() {
     echo 1 >/proc/sys/dev/raid/speed_limit_min
-    echo 100 >/proc/sys/dev/raid/speed_limit_max
+    echo 10 >/proc/sys/dev/raid/speed_limit_max
 }
 
 fast_resync() {
@@ -208,14 +221,10 @@ fast_resync() {
     echo 1000000 >/proc/sys/dev/raid/speed_limit_min
 }
 
-# The array's state in mdadm's words. Whether a write happened a moment ago is no matter here.
-mdadm_state() {
-    mdadm --detail "/dev/md$1" 2>/dev/null |
-        sed -n -e 's/^ *State : //p' | sed -e 's/^active\(-idle\)\{0,1\}/clean/' -e 's/ *$//'
-}
-
+# mdadm_state_is MD WORDS: whether a write happened a moment ago is no matter here.
 mdadm_state_is() {
-    [ "$(mdadm_state "$1")" = "$2" ]
+    words=$(mdadm --detail "/dev/md$1" 2>/dev/null | sed -n 's/^ *State : \(.*[^ ]\) *$/\1/p')
+    [ "$(echo "$words" | sed 's/^active\(-idle\)\{0,1\}/clean/')" = "$2" ]
 }
 
 # settle MD...: the driver calls an array clean again when the last write is a moment old; until then
@@ -223,7 +232,7 @@ mdadm_state_is() {
 settle() {
     sync
     for number in "$@"; do
-        wait_for "$SETTLE_SECONDS" array_is_clean "$number" || abort "md$number does not settle"
+        await array_is_clean "$number"
     done
 }
 
@@ -244,8 +253,7 @@ arrays_known() {
 # have_no_superblock MEMBER...: mdadm has to say it of each.
 have_no_superblock() {
     printf 'mdadm: No md superblock detected on /dev/%s.\n' "$@" >/tmp/members
-    # shellcheck disable=SC2046  # a list of nodes
-    mdadm -E $(printf '/dev/%s ' "$@") 2>&1 | diff /tmp/members -
+    mdadm -E $(nodes "$@") 2>&1 | diff /tmp/members -
 }
 
 # On no disk and no partition, whatever array they belong to.
@@ -254,12 +262,16 @@ uuid_is_nowhere() {
 }
 
 has_no_signature() {
-    # shellcheck disable=SC2046
-    [ -z "$(blkid -p -s TYPE -o value $(printf '/dev/%s ' "$@"))" ]
+    [ -z "$(blkid -p -s TYPE -o value $(nodes "$@"))" ]
 }
 
-array_bytes() {
-    blockdev --getsize64 "/dev/md$1"
+# carry MD MEMBER...: each of these has the superblock of that array.
+carry() {
+    carried=$(uuid "$1")
+    shift
+    for member in "$@"; do
+        mdadm -E "/dev/$member" | grep "UUID : $carried" || return 1
+    done
 }
 
 # --- the tool ----------------------------------------------------------------------------------
@@ -277,110 +289,191 @@ report() {
     printf '\n'
 }
 
-# check_run NAME STATUS COMMAND...: what it prints must be, byte for byte, what stands in $EXPECTED.
-check_run() {
-    name=$1
-    expected_status=$2
-    shift 2
+# answers STATUS COMMAND...: the exit status, what stands in $EXPECTED byte for byte, and no errors.
+answers() {
+    status=$1
+    shift
     "$@" >"$SEEN" 2>"$ERRORS"
     seen_status=$?
-    if [ "$seen_status" = "$expected_status" ] && [ ! -s "$ERRORS" ] && cmp -s "$EXPECTED" "$SEEN"
-    then
-        pass "$name"
-        return
-    fi
-    fail "$name" "command: $*" "expected status $expected_status, seen $seen_status"
-    show_file expected "$EXPECTED"
-    show_file seen "$SEEN"
-    show_file "on standard error" "$ERRORS"
+    [ "$seen_status" = "$status" ] && [ ! -s "$ERRORS" ] && cmp -s "$EXPECTED" "$SEEN" && return
+    echo "expected status $status, seen $seen_status; expected, seen and on standard error:"
+    cat -A "$EXPECTED" "$SEEN" "$ERRORS"
+    return 1
 }
 
-# check_status NAME MD MDADM_STATE HEALTH REBUILD LEVEL MEMBER:WORD...: mdadm must see the array in
-# the state that the test meant to make, and the tool must report it.
+# check_report NAME MD HEALTH REBUILD LEVEL MEMBER:WORD...
+check_report() {
+    name=$1
+    number=$2
+    health=$3
+    rebuild=$4
+    level=$5
+    shift 5
+    report "$number" "$health" "$rebuild" "$level" "$(blockdev --getsize64 "/dev/md$number")" "$@" >"$EXPECTED"
+    check 'report' answers 0 arrayctl status "$number"
+    verdict "$name"
+}
+
+# What mdadm calls a state, and the tool's two words for it.
+STATES='clean|NORMAL|None
+clean, degraded|DEGRADE|None
+clean, FAILED|CRASHED|None
+clean, resyncing|NORMAL|Progressing...[
+clean, resyncing (DELAYED)|NORMAL|Waiting...
+clean, resyncing (PENDING)|NORMAL|Waiting...
+clean, checking|NORMAL|Progressing...[
+clean, degraded, recovering|DEGRADE|Progressing...[
+clean, degraded, resyncing (DELAYED)|DEGRADE|Waiting...'
+
+# check_status NAME MD STATE LEVEL MEMBER:WORD...: mdadm must see the array in the state that the test
+# meant to make, and the tool must report it.
 check_status() {
     name=$1
     number=$2
-    state=$3
+    report_words=$(echo "$STATES" | awk -F'|' -v state="$3" '$1 == state { print $2 "|" $3 }')
+    check "$3 in mdadm's words" comes mdadm_state_is "$number" "$3"
     shift 3
-    if ! wait_for "$SETTLE_SECONDS" mdadm_state_is "$number" "$state"; then
-        fail "$name" "the array is not what the test wants: mdadm expected '$state'" \
-            "seen '$(mdadm_state "$number")'"
-        return
-    fi
-    health=$1
-    rebuild=$2
-    level=$3
-    shift 3
-    report "$number" "$health" "$rebuild" "$level" "$(array_bytes "$number")" "$@" >"$EXPECTED"
-    check_run "$name" 0 arrayctl status "$number"
+    check_report "$name" "$number" "${report_words%|*}" "${report_words#*|}" "$@"
 }
 
 # check_not_found NAME MD
 check_not_found() {
     echo "RAID /dev/md$2 is not found" >"$EXPECTED"
-    check_run "$1" 1 arrayctl status "$2"
+    check 'report' answers 1 arrayctl status "$2"
+    verdict "$1"
 }
 
-# --- destroy -----------------------------------------------------------------------------------
+# --- the system log ----------------------------------------------------------------------------
 
-# run_destroy TAG MD: under a name of its own, as the system log tells runs apart by the program's
-# name. Leaves TAG.out, TAG.status and TAG.seconds.
-run_destroy() {
-    mkdir -p "$RUNS"
-    ln -sf /sbin/arrayctl "$RUNS/$1"
-    begin=$(cut -d. -f1 /proc/uptime)
-    /sbin/mdrequests "$RUNS/$1" destroy "$2" >"$RUNS/$1.out" 2>&1
-    echo $? >"$RUNS/$1.status"
-    echo $(($(cut -d. -f1 /proc/uptime) - begin)) >"$RUNS/$1.seconds"
+# Lines arrive in their order: with one more behind them, all that were written are there.
+log_is_whole() {
+    mark=$(od -An -N4 -tx4 /dev/urandom | tr -d ' ')
+    logger -t mark "$mark"
+    await grep -q "mark: $mark" "$SYSLOG"
 }
 
 # log_of TAG: the lines of that run as "PRIORITY MESSAGE", without the place in the source.
 log_of() {
-    grep " $1: " "$SYSLOG" | sed "s/^.* user\.\([a-z]*\) $1: [a-z_]*\.cpp:[0-9]* /\1 /"
+    log_is_whole
+    sed -n "s/^.* user\.\([a-z]*\) $1: [a-z_]*\.cpp:[0-9]* /\1 /p" "$SYSLOG"
 }
 
-# check_log TAG: all that the run is to have logged stands in $EXPECTED.
+# check_log TAG [COUNT]: all that the run is to have logged stands in $EXPECTED. Members are wiped in
+# the order of a hash, so the last COUNT lines are compared sorted.
 check_log() {
-    log_of "$1" >"$SEEN"
-    check "system log of $1" as_expected "$SEEN"
-}
-
-# Members are wiped in the order of a hash, so the last COUNT lines are compared sorted.
-check_log_of_members() {
     log_of "$1" >/tmp/log
-    before=$(($(wc -l </tmp/log) - $2))
-    { head -n "$before" /tmp/log && tail -n "$2" /tmp/log | sort; } >"$SEEN"
+    before=$(($(wc -l </tmp/log) - ${2:-0}))
+    { head -n "$before" /tmp/log && tail -n "${2:-0}" /tmp/log | sort; } >"$SEEN"
     check "system log of $1" as_expected "$SEEN"
 }
 
 # The operation error log without its time stamps; a line with none that is well formed stays whole.
 operation_errors() {
     stamp='[A-Z][a-z][a-z] [0-3][0-9] [0-2][0-9]:[0-5][0-9]:[0-5][0-9]'
-    sed "s/^$stamp command=/command=/" /var/log/space_operation_error.log
+    sed "s/^$stamp command=/command=/" "$OPERATION_ERRORS" 2>/dev/null
 }
 
-check_silent_success() {
-    : >"$EXPECTED"
+# The commands in it, whatever they said; mdadm before 4.4 says something when it stops an array, too.
+complaints() {
+    operation_errors | sed -e '/^command="\/sbin\/mdadm -S \(.*\)" Error="mdadm: stopped \1 "$/d' \
+        -e 's/^command="\(.*\)" Error=".*"$/\1/'
+}
+
+# --- destroy -----------------------------------------------------------------------------------
+
+# run_destroy TAG MD: under a name of its own, as the system log tells runs apart by the program's
+# name. Leaves TAG.out, TAG.status and TAG.sleeps.
+run_destroy() {
+    mkdir -p "$RUNS"
+    ln -sf /sbin/arrayctl "$RUNS/$1"
+    strace -q -o "$RUNS/$1.sleeps" -e signal=none -e trace=clock_nanosleep \
+        /sbin/mdrequests "$RUNS/$1" destroy "$2" >"$RUNS/$1.out" 2>&1
+    echo $? >"$RUNS/$1.status"
+}
+
+# slept COUNT SECONDS FILE: that many pauses of this length in what strace wrote.
+slept() {
+    [ "$(grep -c "{tv_sec=$2, tv_nsec=0}" "$3")" = "$1" ]
+}
+
+# The command's exit status is 0 whatever happened.
+check_output() {
     check "output of $1" as_expected "$RUNS/$1.out"
     check "exit status of $1" test "$(cat "$RUNS/$1.status")" = 0
 }
 
-# log_of_removal MD MEMBER...: what a removal that goes well logs.
-log_of_removal() {
-    echo "err [Info] clean RAID superblock of /dev/md$1"
-    shift
-    for member in "$@"; do
-        echo "err [Info] Clean RAID superblock on '/dev/$member'"
-    done
+# finds_nothing TAG MD: nothing but one line, with a blank at its end.
+finds_nothing() {
+    run_destroy "$1" "$2"
+    printf 'Not found /dev/md%s \n' "$2" >"$EXPECTED"
+    check_output "$1"
 }
 
-# check_left_nothing MD UUID MEMBER...
-check_left_nothing() {
+lines() {
+    [ -z "$1" ] || printf '%s\n' "$1"
+}
+
+# wipes TAG MD COMMANDS MEMBER...: says nothing, and logs the LVM tools that fail and every member.
+wipes() {
+    tag=$1
+    number=$2
+    complaining=$3
+    shift 3
+    rm -f "$OPERATION_ERRORS"
+    run_destroy "$tag" "$number"
+    : >"$EXPECTED"
+    check_output "$tag"
+    {
+        lines "$complaining" | sed 's/^/err Failed to /'
+        echo "err [Info] clean RAID superblock of /dev/md$number"
+        printf "err [Info] Clean RAID superblock on '/dev/%s'\n" "$@"
+    } >"$EXPECTED"
+    check_log "$tag" $#
+    lines "$complaining" >"$EXPECTED"
+    complaints >"$SEEN"
+    check 'operation error log' as_expected "$SEEN"
+}
+
+# left_nothing MD MEMBER...
+left_nothing() {
     number=$1
-    uuid=$2
-    shift 2
-    check 'the array is gone' wait_for "$SETTLE_SECONDS" array_left_nothing "$number"
+    shift
+    check 'the array is gone' comes array_left_nothing "$number"
     check 'no superblock' have_no_superblock "$@"
     check 'no signature' has_no_signature "$@"
-    check 'no superblock anywhere' uuid_is_nowhere "$uuid"
+    check 'no superblock anywhere' uuid_is_nowhere "$(uuid "$number")"
+}
+
+# destroys TAG MD COMMANDS MEMBER...
+destroys() {
+    wipes "$@"
+    shift 3
+    left_nothing "$number" "$@"
+}
+
+# --- LVM ---------------------------------------------------------------------------------------
+
+# make_group GROUP MD
+make_group() {
+    must pvcreate -q "/dev/md$2"
+    must vgcreate -q "$1" "/dev/md$2"
+}
+
+# make_volume GROUP VOLUME EXTENTS: without udev nobody else makes its node.
+make_volume() {
+    must lvcreate -q -y -l "$3" -n "$2" "$1"
+    must dmsetup mknodes
+}
+
+# What pvs says of an array decides what a destroy does.
+rows_of() {
+    pvs -o pv_name,vg_name,lv_name,origin --noheading --separator : | grep "/dev/md$1:"
+}
+
+# No group and nothing of its volumes, in LVM or the kernel.
+check_no_group() {
+    check 'no group' is_not vgs "$1"
+    check 'no mapped volume' is_not sh -c "dmsetup ls | grep '^$1-'"
+    check 'no node of the volume' test ! -e "/dev/mapper/$1-data"
+    check 'no folder of the group' test ! -e "/dev/$1"
 }

@@ -27,12 +27,15 @@ make_outside() {
     tar -x -f "$archive" -C "$target"
 }
 
+if [ "${1:-}" != inside ]; then
+    make_outside
+    exit
+fi
+
 # --- inside ------------------------------------------------------------------------------------
 
-# The last digits of an array's UUID are its number.
-uuid() {
-    printf '5b1f2c3d:4e5f6071:8293a4b5:%08x' "$1"
-}
+# shellcheck source=SCRIPTDIR/lib.sh
+. /appliance/lib.sh
 
 # examine NAME DEVICE
 examine() {
@@ -68,105 +71,74 @@ keep() {
     blank
 }
 
-of_formats() {
-    for format in 0.90 1.0 1.1 1.2; do
-        keep "mirror-$format" /dev/sdb3 2 -e "$format" -l 1 -n 2 /dev/sda3 /dev/sdb3
-        keep "spare-$format" /dev/sdc3 3 -e "$format" -l 1 -n 2 -x 1 /dev/sda3 /dev/sdb3 /dev/sdc3
-    done
-}
+mkdir "$REPORTS"
+partition_disks '16M 16M' sda sdb sdc sdd
+blank
+for format in 0.90 1.0 1.1 1.2; do
+    keep "mirror-$format" /dev/sdb3 2 -e "$format" -l 1 -n 2 /dev/sda3 /dev/sdb3
+    keep "spare-$format" /dev/sdc3 3 -e "$format" -l 1 -n 2 -x 1 /dev/sda3 /dev/sdb3 /dev/sdc3
+done
 
-# shellcheck disable=SC2086  # lists of words
-of_levels() {
-    keep level-raid0 /dev/sda3 4 -l 0 -n 2 /dev/sda3 /dev/sdb3
-    keep level-raid4 /dev/sda3 5 -l 4 -n 3 /dev/sda3 /dev/sdb3 /dev/sdc3
-    keep level-raid5 /dev/sdc3 6 -l 5 -n 3 /dev/sda3 /dev/sdb3 /dev/sdc3
-    keep level-raid6 /dev/sdd3 7 -l 6 -n 4 $MEMBERS
-    keep level-raid10 /dev/sda3 8 -l 10 -n 4 $MEMBERS
-    keep level-linear /dev/sdb3 9 -l linear -n 2 /dev/sda3 /dev/sdb3
-    keep level-linear-0.90 /dev/sdb3 9 -e 0.90 -l linear -n 2 /dev/sda3 /dev/sdb3
-}
+keep level-raid0 /dev/sda3 4 -l 0 -n 2 /dev/sda3 /dev/sdb3
+keep level-raid4 /dev/sda3 5 -l 4 -n 3 /dev/sda3 /dev/sdb3 /dev/sdc3
+keep level-raid5 /dev/sdc3 6 -l 5 -n 3 /dev/sda3 /dev/sdb3 /dev/sdc3
+# shellcheck disable=SC2086  # a list of words
+keep level-raid6 /dev/sdd3 7 -l 6 -n 4 $MEMBERS
+# shellcheck disable=SC2086
+keep level-raid10 /dev/sda3 8 -l 10 -n 4 $MEMBERS
+keep level-linear /dev/sdb3 9 -l linear -n 2 /dev/sda3 /dev/sdb3
+keep level-linear-0.90 /dev/sdb3 9 -e 0.90 -l linear -n 2 /dev/sda3 /dev/sdb3
 
-of_names() {
-    keep name-of-another-host /dev/sda3 12 --homehost=attic -l 1 -n 2 /dev/sda3 /dev/sdb3
-    keep name-without-number /dev/sda3 13 --name=data -l 1 -n 2 /dev/sda3 /dev/sdb3
-    # Too long to fit in front of the name, so it is left out.
-    keep name-without-host /dev/sda3 14 --homehost=a-host-of-thirty-characters-00 -l 1 -n 2 \
-        /dev/sda3 /dev/sdb3
-    keep name-with-umlaut /dev/sda3 15 --name='größe' -l 1 -n 2 /dev/sda3 /dev/sdb3
-    keep name-with-two-colons /dev/sda3 16 --name='a:b:16' -l 1 -n 2 /dev/sda3 /dev/sdb3
-    keep preferred-minor-127 /dev/sda3 127 -e 0.90 -l 1 -n 2 /dev/sda3 /dev/sdb3
-}
+keep name-of-another-host /dev/sda3 12 --homehost=attic -l 1 -n 2 /dev/sda3 /dev/sdb3
+keep name-without-number /dev/sda3 13 --name=data -l 1 -n 2 /dev/sda3 /dev/sdb3
+# Too long to fit in front of the name, so it is left out.
+keep name-without-host /dev/sda3 14 --homehost=a-host-of-thirty-characters-00 -l 1 -n 2 \
+    /dev/sda3 /dev/sdb3
+keep name-with-umlaut /dev/sda3 15 --name='größe' -l 1 -n 2 /dev/sda3 /dev/sdb3
+keep name-with-two-colons /dev/sda3 16 --name='a:b:16' -l 1 -n 2 /dev/sda3 /dev/sdb3
+keep preferred-minor-127 /dev/sda3 127 -e 0.90 -l 1 -n 2 /dev/sda3 /dev/sdb3
 
-of_roles() {
-    array 20 -l 5 -n 3 /dev/sda3 /dev/sdb3 /dev/sdc3
-    fail_member 20 sdb3
-    examine degraded-raid5 /dev/sdc3
-    examine failed-member /dev/sdb3
-    blank
+array 20 -l 5 -n 3 /dev/sda3 /dev/sdb3 /dev/sdc3
+fail_member 20 sdb3
+examine degraded-raid5 /dev/sdc3
+examine failed-member /dev/sdb3
+blank
 
-    array 21 -e 0.90 -l 5 -n 3 /dev/sda3 /dev/sdb3 /dev/sdc3
-    fail_member 21 sdb3
-    examine degraded-raid5-0.90 /dev/sdc3
-    blank
+array 21 -e 0.90 -l 5 -n 3 /dev/sda3 /dev/sdb3 /dev/sdc3
+fail_member 21 sdb3
+examine degraded-raid5-0.90 /dev/sdc3
+blank
 
-    # The stop breaks the copy off and tells the replacement's superblock what it is.
-    array 22 -l 1 -n 2 -x 1 /dev/sda3 /dev/sdb3 /dev/sdc3
-    slow_resync
-    must mdadm /dev/md22 --replace /dev/sda3 --with /dev/sdc3
-    wait_for "$SETTLE_SECONDS" is_recovering 22 || abort "no copy to the replacement"
-    must mdadm --stop /dev/md22
-    examine role-replacement /dev/sdc3
-    fast_resync
-    blank
+# The stop breaks the copy off and tells the replacement's superblock what it is.
+array 22 -l 1 -n 2 -x 1 /dev/sda3 /dev/sdb3 /dev/sdc3
+slow_resync
+must mdadm /dev/md22 --replace /dev/sda3 --with /dev/sdc3
+await grep -q recover /sys/block/md22/md/sync_action
+must mdadm --stop /dev/md22
+examine role-replacement /dev/sdc3
+fast_resync
+blank
 
-    keep role-journal /dev/sdd3 23 -l 5 -n 3 --write-journal /dev/sdd3 \
-        /dev/sda3 /dev/sdb3 /dev/sdc3
-    keep bitmap-internal /dev/sda3 24 -l 1 -n 2 --bitmap=internal /dev/sda3 /dev/sdb3
-}
+keep role-journal /dev/sdd3 23 -l 5 -n 3 --write-journal /dev/sdd3 \
+    /dev/sda3 /dev/sdb3 /dev/sdc3
+keep bitmap-internal /dev/sda3 24 -l 1 -n 2 --bitmap=internal /dev/sda3 /dev/sdb3
 
-is_recovering() {
-    grep -q recover "/sys/block/md$1/md/sync_action"
-}
+examine no-superblock /dev/sda3
+examine no-such-device /dev/sdz3
+examine mbr-only /dev/sda
+echo 'LAUFWERKE /dev/sd*' >/etc/mdadm/mdadm.conf
+keep warning-on-standard-error /dev/sda3 40 -l 1 -n 2 /dev/sda3 /dev/sdb3
+rm /etc/mdadm/mdadm.conf
+must sh -c 'echo "label: gpt" | sfdisk.stock -q --wipe always /dev/sdd'
+examine gpt-only /dev/sdd
 
 # Containers want whole disks, so the tables go last.
-of_containers() {
-    must mdadm --create /dev/md30 --run -e ddf -l container -n 2 /dev/sda /dev/sdb
-    examine container-ddf /dev/sda
-    must mdadm --stop /dev/md30
-    must wipefs -q -a /dev/sda /dev/sdb
-    IMSM_NO_PLATFORM=1 must mdadm --create /dev/md31 --run -e imsm -l container -n 2 /dev/sdc /dev/sdd
-    IMSM_NO_PLATFORM=1 examine container-imsm /dev/sdc
-    must mdadm --stop /dev/md31
-}
+must mdadm --create /dev/md30 --run -e ddf -l container -n 2 /dev/sda /dev/sdb
+examine container-ddf /dev/sda
+must mdadm --stop /dev/md30
+must wipefs -q -a /dev/sda /dev/sdb
+IMSM_NO_PLATFORM=1 must mdadm --create /dev/md31 --run -e imsm -l container -n 2 /dev/sdc /dev/sdd
+IMSM_NO_PLATFORM=1 examine container-imsm /dev/sdc
+must mdadm --stop /dev/md31
 
-of_no_superblock() {
-    examine no-superblock /dev/sda3
-    examine no-such-device /dev/sdz3
-    examine mbr-only /dev/sda
-    echo 'LAUFWERKE /dev/sd*' >/etc/mdadm/mdadm.conf
-    keep warning-on-standard-error /dev/sda3 40 -l 1 -n 2 /dev/sda3 /dev/sdb3
-    rm /etc/mdadm/mdadm.conf
-    must sh -c 'echo "label: gpt" | sfdisk.stock -q --wipe always /dev/sdd'
-    examine gpt-only /dev/sdd
-}
-
-make_inside() {
-    mkdir "$REPORTS"
-    partition_disks '16M 16M' sda sdb sdc sdd
-    blank
-    of_formats
-    of_levels
-    of_names
-    of_roles
-    of_no_superblock
-    of_containers
-    tar -c -f - -C "$REPORTS" .
-}
-
-if [ "${1:-}" = inside ]; then
-    # shellcheck source=SCRIPTDIR/lib.sh
-    . /appliance/lib.sh
-    make_inside
-else
-    make_outside
-fi
+tar -c -f - -C "$REPORTS" .

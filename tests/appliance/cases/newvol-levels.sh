@@ -4,9 +4,7 @@
 # keeps them from being made.
 # disks: 6
 # size: 4672M
-# shellcheck disable=SC2317  # check must call the functions
-# shellcheck source=SCRIPTDIR/../lib.sh
-. /appliance/lib.sh
+# shellcheck disable=SC2086,SC2317  # lists of words; check must call the functions
 # shellcheck source=SCRIPTDIR/../lib-setup.sh
 . /appliance/lib-setup.sh
 plan 16
@@ -16,115 +14,18 @@ USAGE=$USAGE'\tarrayctl newvol \n\tarrayctl initsys \n\tarrayctl initsys-dd \n'
 
 # How the tool asks for a data partition; the argument behind the number is empty.
 DATA_COMMAND='/sbin/sfdisk -N3  -uS -q -f -j260352 -z-1 -tfd -F'
-EXPANSION_UNIT='internalportcfg=0x0 esataportcfg=0x7 support_dual_head=yes'
+EXPANSION_UNIT='0x0 esataportcfg=0x7 support_dual_head=yes'
 
-bays() {
-    machine "internalportcfg=$1" usbportcfg=0x40
-}
-
-data_partitions_are() {
-    for disk in "$@"; do
-        table_is "$disk" "$LAYOUT_8" "$LAYOUT_8_DATA" || return 1
-    done
-}
-
-# level_is TEXT LEVEL CLAIMED_LEVEL DISK...: one run with what it says and leaves behind.
+# level_is LEVEL DISK...: one run with what it says and leaves behind.
 level_is() {
-    check 'newvol' says 0 "$1" arrayctl newvol
-    level=$2
-    claimed=$3
-    shift 3
-    check 'data partitions' data_partitions_are "$@"
-    members=
-    nodes=
-    claims=
-    slot=0
-    for disk in "$@"; do
-        members="$members ${disk}3"
-        nodes="$nodes /dev/${disk}3"
-        claims="${claims}1.2 2 $claimed $# $slot "
-        slot=$((slot + 1))
-    done
-    # shellcheck disable=SC2086
-    check 'array' array_is 2 "$level" 1.2 $members
-    # shellcheck disable=SC2086
-    check 'superblocks' [ "$(claims_of $nodes)" = "$claims" ]
+    level=$1
+    shift
+    check 'newvol' says 0 "Creating RAID $level volume... \n" arrayctl newvol
+    check_tables "$WHOLE_8" "$@"
+    members=$(printf '%s3 ' "$@")
+    check 'array' array_is 2 "raid$level" 1.2 $members
+    check 'superblocks' claims_are "1.2 2 raid$level $#" $members
     stop_arrays 2
-}
-
-by_number_of_disks() {
-    bays 0x1
-    # Whatever is behind the system partitions goes, logical partitions included.
-    lay_out sda "$LAYOUT_8
-3 9437184 30000 83
-4 9469184 90000 5
-5 9470000 20000 83
-6 9492000 20000 83"
-    level_is 'Creating RAID 1 volume... \n' raid1 raid1 sda
-    verdict 'one disk, with other data partitions on it'
-
-    bays 0x3
-    level_is 'Creating RAID 1 volume... \n' raid1 raid1 sda sdb
-    verdict 'two disks, one with an older array on it'
-
-    bays 0x7
-    level_is 'Creating RAID 5 volume... \n' raid5 raid5 sda sdb sdc
-    verdict 'three disks'
-
-    bays 0xf
-    level_is 'Creating RAID 5 volume... \n' raid5 raid5 sda sdb sdc sdd
-    check 'system partitions are no matter' [ "$(arrays_known)" = '' ]
-    verdict 'four disks'
-}
-
-by_marker() {
-    touch /tmp/raid.0
-    level_is 'Creating RAID 0 volume... \n' raid0 raid0 sda sdb sdc sdd
-    verdict 'RAID 0 over four disks'
-
-    touch /tmp/raid.1 /tmp/raid.5
-    bays 0x3
-    level_is 'Creating RAID 0 volume... \n' raid0 raid0 sda sdb
-    verdict 'the marker of RAID 0 goes before all others'
-
-    rm /tmp/raid.0
-    bays 0x7
-    level_is 'Creating RAID 1 volume... \n' raid1 raid1 sda sdb sdc
-    verdict 'the marker of RAID 1 goes before that of RAID 5'
-
-    rm /tmp/raid.1
-    bays 0x3
-    level_is 'Creating RAID 5 volume... \n' raid5 raid5 sda sdb
-    verdict 'RAID 5 over two disks'
-
-    bays 0x1
-    mdadm -C /dev/md2 -amd -R -l5 -f -n1 /dev/sda3 >/dev/null 2>&1
-    refusal=$?
-    check 'newvol' says 1 'Creating RAID 5 volume... \n' arrayctl newvol
-    check 'why' logged "err Failed to create RAID '/dev/md2' on '/dev/sda3 ', errno=$refusal"
-    check 'the partition is there' data_partitions_are sda
-    check 'no array' [ -z "$(arrays_known)" ]
-    rm /tmp/raid.5
-    verdict 'RAID 5 over one disk is refused by mdadm'
-}
-
-refusals() {
-    bays 0xf
-    watch_writes sda sdb sdc sdd
-    check 'an argument too many' says 1 "$USAGE" arrayctl newvol 2
-    bays 0x0
-    check 'no disk' says 1 'No disk to create RAID... \n' arrayctl newvol
-    check 'nothing is touched' nothing_written
-    verdict 'an argument too many, and no disk'
-
-    # The one that has no system partitions yet.
-    bays 0x20
-    check 'newvol' says 1 '' arrayctl newvol
-    check 'why' logged 'err Failed to create data partition of /dev/sdf, errno=0x2000'
-    check 'the command' logged "err Failed to [$DATA_COMMAND /dev/sdf], err=256"
-    check 'no partition' has_no_partition sdf
-    check 'no array' [ -z "$(arrays_known)" ]
-    verdict 'a disk without system partitions'
 }
 
 # Stands in for the partitioner and refuses one thing.
@@ -144,77 +45,133 @@ mend_partitioner() {
     mv /sbin/sfdisk.whole /sbin/sfdisk
 }
 
-failing_partitioner() {
-    bays 0x7
-    rm -f "$OPERATION_ERRORS"
-    for disk in sda sdb sdc; do
-        lay_out "$disk" "$LAYOUT_8
-3 9437184 65536 83"
-    done
-    break_partitioner '-N3*sdb'
-    check 'newvol' says 1 '' arrayctl newvol
-    check 'the command' logged "err Failed to [$DATA_COMMAND /dev/sdb], err=512"
-    check 'why' logged 'err Failed to create data partition of /dev/sdb, errno=0x2000'
-    words="command=\"$DATA_COMMAND /dev/sdb\" Error=\"out of order \""
-    check 'its own words' [ "$(operation_errors)" = "$words" ]
-    check 'done before it' table_is sda "$LAYOUT_8" "$LAYOUT_8_DATA"
-    check 'half done' table_is sdb "$LAYOUT_8"
-    check 'not begun after it' table_is sdc "$LAYOUT_8" '3 9437184 65536 83'
-    check 'no array' [ -z "$(arrays_known)" ]
-    mend_partitioner
-    verdict 'a partition that cannot be made in the middle'
-
-    break_partitioner '--fast-delete*sdb'
-    check 'newvol' says 0 'Creating RAID 5 volume... \n' arrayctl newvol
-    check 'only noted' logged "debug Failed to do '/sbin/sfdisk --fast-delete 3:128 /dev/sdb'"
-    check 'array' array_is 2 raid5 1.2 sda3 sdb3 sdc3
-    mend_partitioner
-    verdict 'a partition that cannot be deleted, but is not there anyway'
-}
-
-# The array of the run before still runs.
-data_in_use() {
-    store_data md2
-    uuid=$(uuid_of 2)
-    check 'newvol' says 1 '' arrayctl newvol
-    check 'why' logged 'err Failed to create data partition of /dev/sda, errno=0x2000'
-    check 'array' array_is 2 raid5 1.2 sda3 sdb3 sdc3
-    check 'the same' [ "$(uuid_of 2)" = "$uuid" ]
-    check 'tables' data_partitions_are sda sdb sdc
-    check 'data' data_is_whole md2
-    stop_arrays 2
-    verdict 'a data array that runs'
-}
-
-two_heads() {
-    # shellcheck disable=SC2086
-    machine $EXPANSION_UNIT usbportcfg=0x40 raidgroup_split_units=2
-    expansion_unit /dev/sda,/dev/sdb,/dev/sdc
-    watch_writes sdc
-    level_is 'Creating RAID 1 volume... \n' raid1 raid1 sda sdb
-    check 'the limit' logged 'err Get 2 disks, more than raid group split unit'
-    check 'the one over the limit' nothing_written
-    verdict 'no more disks of an expansion unit than its limit'
-
-    # shellcheck disable=SC2086
-    machine $EXPANSION_UNIT usbportcfg=0x40 raidgroup_split_units=0
-    check 'newvol' says 1 'No disk to create RAID... \n' arrayctl newvol
-    check 'the limit' logged 'err Get 0 disks, more than raid group split unit'
-    machine internalportcfg=0x7 usbportcfg=0x40 raidgroup_split_units=2
-    check 'one head' says 0 'Creating RAID 5 volume... \n' arrayctl newvol
-    check 'no limit' not_logged 'raid group split unit'
-    check 'array' array_is 2 raid5 1.2 sda3 sdb3 sdc3
-    expansion_unit_off
-    verdict 'a limit of none, and a machine that knows no limit'
-}
-
 for disk in sdb sdc sdd; do
     lay_out "$disk" "$LAYOUT_8"
 done
-by_number_of_disks
-by_marker
-refusals
-failing_partitioner
-data_in_use
-two_heads
+
+bays 0x1
+# Whatever is behind the system partitions goes, logical partitions included.
+lay_out sda "$LAYOUT_8
+3 9437184 30000 83
+4 9469184 90000 5
+5 9470000 20000 83
+6 9492000 20000 83"
+level_is 1 sda
+verdict 'one disk, with other data partitions on it'
+
+bays 0x3
+level_is 1 sda sdb
+verdict 'two disks, one with an older array on it'
+
+bays 0x7
+level_is 5 sda sdb sdc
+verdict 'three disks'
+
+bays 0xf
+level_is 5 sda sdb sdc sdd
+check 'system partitions are no matter' [ "$(arrays_known)" = '' ]
+verdict 'four disks'
+
+touch /tmp/raid.0
+level_is 0 sda sdb sdc sdd
+verdict 'RAID 0 over four disks'
+
+touch /tmp/raid.1 /tmp/raid.5
+bays 0x3
+level_is 0 sda sdb
+verdict 'the marker of RAID 0 goes before all others'
+
+rm /tmp/raid.0
+bays 0x7
+level_is 1 sda sdb sdc
+verdict 'the marker of RAID 1 goes before that of RAID 5'
+
+rm /tmp/raid.1
+bays 0x3
+level_is 5 sda sdb
+verdict 'RAID 5 over two disks'
+
+bays 0x1
+mdadm -C /dev/md2 -amd -R -l5 -f -n1 /dev/sda3 >/dev/null 2>&1
+refusal=$?
+check 'newvol' says 1 'Creating RAID 5 volume... \n' arrayctl newvol
+check 'why' logged "err Failed to create RAID '/dev/md2' on '/dev/sda3 ', errno=$refusal"
+check_tables "$WHOLE_8" sda
+check 'no array' [ -z "$(arrays_known)" ]
+rm /tmp/raid.5
+verdict 'RAID 5 over one disk is refused by mdadm'
+
+bays 0xf
+watch_writes sda sdb sdc sdd
+check 'an argument too many' says 1 "$USAGE" arrayctl newvol 2
+bays 0x0
+check 'no disk' says 1 'No disk to create RAID... \n' arrayctl newvol
+check 'nothing is touched' nothing_written
+verdict 'an argument too many, and no disk'
+
+# The one that has no system partitions yet.
+bays 0x20
+check 'newvol' says 1 '' arrayctl newvol
+check 'why' logged 'err Failed to create data partition of /dev/sdf, errno=0x2000'
+check 'the command' logged "err Failed to [$DATA_COMMAND /dev/sdf], err=256"
+check 'no partition' [ -z "$(table_of sdf)" ]
+check 'no array' [ -z "$(arrays_known)" ]
+verdict 'a disk without system partitions'
+
+bays 0x7
+rm -f "$OPERATION_ERRORS"
+for disk in sda sdb sdc; do
+    lay_out "$disk" "$LAYOUT_8
+3 9437184 65536 83"
+done
+break_partitioner '-N3*sdb'
+check 'newvol' says 1 '' arrayctl newvol
+check 'the command' logged "err Failed to [$DATA_COMMAND /dev/sdb], err=512"
+check 'why' logged 'err Failed to create data partition of /dev/sdb, errno=0x2000'
+words="command=\"$DATA_COMMAND /dev/sdb\" Error=\"out of order \""
+check 'its own words' [ "$(operation_errors)" = "$words" ]
+check 'done before it' table_is sda "$WHOLE_8"
+check 'half done' table_is sdb "$LAYOUT_8"
+check 'not begun after it' table_is sdc "$LAYOUT_8" '3 9437184 65536 83'
+check 'no array' [ -z "$(arrays_known)" ]
+mend_partitioner
+verdict 'a partition that cannot be made in the middle'
+
+break_partitioner '--fast-delete*sdb'
+check 'newvol' says 0 'Creating RAID 5 volume... \n' arrayctl newvol
+check 'only noted' logged "debug Failed to do '/sbin/sfdisk --fast-delete 3:128 /dev/sdb'"
+check 'array' array_is 2 raid5 1.2 sda3 sdb3 sdc3
+mend_partitioner
+verdict 'a partition that cannot be deleted, but is not there anyway'
+
+# The array of the run before still runs.
+store_data md2
+uuid=$(uuid_of 2)
+check 'newvol' says 1 '' arrayctl newvol
+check 'why' logged 'err Failed to create data partition of /dev/sda, errno=0x2000'
+check 'array' array_is 2 raid5 1.2 sda3 sdb3 sdc3
+check 'the same' [ "$(uuid_of 2)" = "$uuid" ]
+check_tables "$WHOLE_8" sda sdb sdc
+check 'data' data_is_whole md2
+stop_arrays 2
+verdict 'a data array that runs'
+
+bays $EXPANSION_UNIT raidgroup_split_units=2
+expansion_unit /dev/sda,/dev/sdb,/dev/sdc
+watch_writes sdc
+level_is 1 sda sdb
+check 'the limit' logged 'err Get 2 disks, more than raid group split unit'
+check 'the one over the limit' nothing_written
+verdict 'no more disks of an expansion unit than its limit'
+
+bays $EXPANSION_UNIT raidgroup_split_units=0
+check 'newvol' says 1 'No disk to create RAID... \n' arrayctl newvol
+check 'the limit' logged 'err Get 0 disks, more than raid group split unit'
+bays 0x7 raidgroup_split_units=2
+check 'one head' says 0 'Creating RAID 5 volume... \n' arrayctl newvol
+check 'no limit' [ -z "$(log_of_run | grep 'raid group split unit')" ]
+check 'array' array_is 2 raid5 1.2 sda3 sdb3 sdc3
+must umount "$SCSI_HOSTS"
+verdict 'a limit of none, and a machine that knows no limit'
+
 finish

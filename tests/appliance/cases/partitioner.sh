@@ -5,8 +5,8 @@
 # left alone. Read back with sysfs, /proc/partitions, the stock sfdisk, blkid, wipefs and e2fsck.
 # disks: 4
 # size: 6G
-# shellcheck source=SCRIPTDIR/../lib.sh
-. /appliance/lib.sh
+# shellcheck source=SCRIPTDIR/../lib-setup.sh
+. /appliance/lib-setup.sh
 plan 11
 
 does() {
@@ -44,189 +44,9 @@ table_has() {
     sfdisk.stock --dump "/dev/$1" | grep -q "^/dev/$1$2 : start= *$3, size= *$4, type=$5\$"
 }
 
-label_is() {
-    [ "$(blkid -p -s PTTYPE -o value "/dev/$1")" = "$2" ]
-}
-
-only_dos() {
-    [ "$(wipefs --noheadings -O TYPE "/dev/$1")" = dos ]
-}
-
 stock_table() {
     echo "$2" >/tmp/table
     must sh -c "sfdisk.stock -q --wipe always /dev/$1 </tmp/table"
-}
-
-layout_of_the_appliance() {
-    check "sign a blank disk" does -M1 /dev/sda
-    check "clean table" only_dos sda
-    check "create 1" creates sda 1 2048 4980480 fd
-    check "1 is known at once" knows sda 1 2048 4980480
-    check "create 2" creates sda 2 0 4194304 fd
-    check "2 is known at once" knows sda 2 4982528 4194304
-    check "create 3" creates sda 3 260352 -1 fd
-    check "3 is known at once" knows sda 3 9437184 $(($(cat /sys/block/sda/size) - 9437184))
-    check "table 1" table_has sda 1 2048 4980480 fd
-    check "table 2" table_has sda 2 4982528 4194304 fd
-    check "line of 2" [ "$(sfdisk -l -uS -N2 /dev/sda)" = "/dev/sda2 4982528 9176831 4194304 fd" ]
-    check "no line of 4" [ "$(sfdisk -l -uS -N4 /dev/sda)" = "" ]
-    check "delete 3:128" does --fast-delete 3:128 /dev/sda
-    check "3 is gone" forgot sda 3
-    check "a partition is no disk" refuses "/dev/sda1 is a partition, no disk" -M1 /dev/sda1
-    check "an absent disk" refuses "cannot open /dev/sdz: No such file or directory" -M1 /dev/sdz
-}
-
-beside_a_mounted_partition() {
-    must mkfs.ext4 -q /dev/sda1
-    must mount /dev/sda1 /mnt
-    echo precious >/mnt/file
-    check "the kernel reads no whole table now" is_not blockdev --rereadpt /dev/sda 2>/dev/null
-    check "create 3 beside a mounted 1" creates sda 3 260352 1000000 83
-    check "3 is known at once" knows sda 3 9437184 1000000
-    check "sign beside a mounted 1" does -M1 /dev/sda
-    check "delete 3 beside a mounted 1" does --fast-delete 3:128 /dev/sda
-    check "3 is gone" forgot sda 3
-    check "all is refused" refuses "partition 1 of /dev/sda is in use" --fast-delete -1 /dev/sda
-    check "1:2 is refused" refuses "partition 1 of /dev/sda is in use" --fast-delete 1:2 /dev/sda
-    check "1 stays" knows sda 1 2048 4980480
-    check "2 stays" knows sda 2 4982528 4194304
-    check "1 stays in the table" table_has sda 1 2048 4980480 fd
-    check "2 stays in the table" table_has sda 2 4982528 4194304 fd
-    check "1 exists" refuses "partition 1 of /dev/sda exists already" \
-        -N1 -uS -q -f -j2048 -z4980480 -tfd -F /dev/sda
-    check "the file is there" [ "$(cat /mnt/file)" = precious ]
-    must umount /mnt
-    check "file system is whole" e2fsck -fn /dev/sda1 >/dev/null 2>&1
-}
-
-beside_an_array() {
-    check "sign sdb" does -M1 /dev/sdb
-    check "sdb1" creates sdb 1 2048 4980480 fd
-    check "sdb2" creates sdb 2 0 4194304 fd
-    make_array 0 -e 0.9 -l1 -n2 /dev/sda1 /dev/sdb1
-    check "a member is in use" refuses "partition 1 of /dev/sdb is in use" \
-        --fast-delete -1 /dev/sdb
-    check "sdb2 came back" knows sdb 2 4982528 4194304
-    check "data partition beside the array" creates sdb 3 260352 -1 fd
-    must pvcreate /dev/sdb3
-    must vgcreate group /dev/sdb3
-    must lvcreate -L 64M -n volume group
-    check "a volume is in use" refuses "partition 3 of /dev/sdb is in use" \
-        --fast-delete 3:128 /dev/sdb
-    must lvremove -f group
-    must vgremove -f group
-    check "no volume, no use" does --fast-delete 3:128 /dev/sdb
-    must mdadm --stop /dev/md0
-    wait_for 5 array_is_gone 0
-    check "no array, no use" does --fast-delete -1 /dev/sdb
-    check "sdb1 is gone" forgot sdb 1
-    check "sdb2 is gone" forgot sdb 2
-    check "sign again" does -M1 /dev/sdb
-}
-
-who_only_looks_is_waited_for() {
-    check "sdb1" creates sdb 1 2048 10000 fd
-    (
-        exec </dev/sdb1
-        sleep 0.4
-    ) &
-    check "a short look" does --fast-delete -1 /dev/sdb
-    wait
-    check "sdb1 is gone" forgot sdb 1
-}
-
-foreign_tables() {
-    stock_table sdc 'label: gpt
-start=2048, size=100000
-start=104448, size=100000'
-    check "gpt is known" knows sdc 2 104448 100000
-    must mkfs.ext4 -q /dev/sdc2
-    must mount /dev/sdc2 /mnt
-    check "a mounted gpt" refuses "/dev/sdc is in use" -M1 /dev/sdc
-    check "a mounted gpt stays" label_is sdc gpt
-    check "its partitions stay" knows sdc 1 2048 100000
-    must umount /mnt
-    check "no partition in a gpt" refuses "/dev/sdc has no ms-dos partition table" \
-        -N3 -uS -j0 -z100 -tfd /dev/sdc
-    check "sign a gpt" does -M1 /dev/sdc
-    check "no ghost" only_dos sdc
-    check "gpt 1 is gone" forgot sdc 1
-    check "gpt 2 is gone" forgot sdc 2
-    blockdev --rereadpt /dev/sdc
-    check "gpt 1 stays gone" forgot sdc 1
-
-    must wipefs -qa /dev/sdc
-    must mkfs.ext4 -qF /dev/sdc
-    must mount /dev/sdc /mnt
-    check "a mounted disk" refuses "/dev/sdc is in use" -M1 /dev/sdc
-    must umount /mnt
-    check "the file system is whole" e2fsck -fn /dev/sdc >/dev/null 2>&1
-    check "sign a file system" does -M1 /dev/sdc
-    check "no ghost of it" only_dos sdc
-}
-
-logical_partitions() {
-    stock_table sdc 'label: dos
-1: start=2048, size=2048, type=fd
-4: start=8192, size=100000, type=5
-5: start=10240, size=2048, type=83
-6: start=14336, size=2048, type=83
-7: start=18432, size=4096, type=83'
-    check "7 is known" knows sdc 7 18432 4096
-    exec 7</dev/sdc7
-    check "7 would move" refuses "partition 7 of /dev/sdc is in use" --fast-delete 6:6 /dev/sdc
-    check "6 stays" knows sdc 6 14336 2048
-    exec 7<&-
-    check "delete 6" does --fast-delete 6:6 /dev/sdc
-    check "7 is 6 now" knows sdc 6 18432 4096
-    check "there is no 7" forgot sdc 7
-    check "5 stays" knows sdc 5 10240 2048
-    blockdev --rereadpt /dev/sdc
-    check "the kernel reads the same" knows sdc 6 18432 4096
-    must dd if=/dev/sdc of=/tmp/tables bs=512 count=20000
-    check "delete all" does --fast-delete -1 /dev/sdc
-    must dd if=/tmp/tables of=/dev/sdc bs=512 conv=notrunc
-    check "sign" does -M1 /dev/sdc
-    check "5 is known again" knows sdc 5 10240 2048
-    check "6 is known again" knows sdc 6 18432 4096
-    check "of 4 only its beginning" knows sdc 4 8192 2
-    check "delete 3:128" does --fast-delete 3:128 /dev/sdc
-    for part in 4 5 6; do
-        check "$part is gone" forgot sdc "$part"
-    done
-    check "1 stays" knows sdc 1 2048 2048
-}
-
-# The table says one thing and the kernel another, as after a run that was cut short.
-kernel_and_table_differ() {
-    check "sdc2" creates sdc 2 0 2048 fd
-    dd if=/dev/zero of=/dev/sdc bs=512 count=1 conv=notrunc 2>/dev/null
-    check "sign" does -M1 /dev/sdc
-    check "sdc1 is gone" forgot sdc 1
-    check "sdc2 is gone" forgot sdc 2
-    check "sdc1" creates sdc 1 2048 2048 fd
-    dd if=/dev/sdc of=/tmp/table bs=512 count=1 2>/dev/null
-    check "delete" does --fast-delete -1 /dev/sdc
-    dd if=/tmp/table of=/dev/sdc bs=512 count=1 conv=notrunc 2>/dev/null
-    check "the kernel knows nothing" forgot sdc 1
-    check "sign" does -M1 /dev/sdc
-    check "the kernel knows" knows sdc 1 2048 2048
-}
-
-locks() {
-    check "sign" does -M1 /dev/sdd
-    flock /dev/sdd sleep 1 &
-    sleep 0.2
-    before=$(cut -d. -f1 /proc/uptime)
-    check "a locked disk is waited for" creates sdd 1 2048 2048 fd
-    check "not for long" [ $(($(cut -d. -f1 /proc/uptime) - before)) -le 4 ]
-    wait
-    check "made" knows sdd 1 2048 2048
-    sfdisk -N2 -uS -j0 -z10 -tfd /dev/sdd &
-    sfdisk --fast-delete -1 /dev/sdc &
-    wait
-    check "two disks at once" knows sdd 2 4096 10
-    check "the table reaches the disk" synced
 }
 
 # The last thing before the kernel learns of it is that the disk has it.
@@ -235,24 +55,6 @@ synced() {
     last=$(grep -E 'write|fsync|BLKPG' /tmp/trace | tail -n 2 | cut -d'(' -f1)
     [ "$last" = "fsync
 ioctl" ]
-}
-
-killed_and_run_again() {
-    for pause in 0.000 0.005 0.010 0.015 0.020 0.025 0.030 0.040 0.050; do
-        for step in "--fast-delete -1" -M1 "-N1 -uS -j2048 -z2048 -tfd"; do
-            # shellcheck disable=SC2086  # words, not one word
-            sfdisk $step /dev/sdd 2>/dev/null &
-            killed=$!
-            sleep "$pause"
-            kill -KILL "$killed" 2>/dev/null
-            wait "$killed" 2>/dev/null
-            check "$pause $step: delete" does --fast-delete -1 /dev/sdd
-            check "$pause $step: sign" does -M1 /dev/sdd
-            check "$pause $step: create" creates sdd 1 2048 2048 fd
-            check "$pause $step: known" knows sdd 1 2048 2048
-            check "$pause $step: in the table" table_has sdd 1 2048 2048 fd
-        done
-    done
 }
 
 # The name of the disk that the kernel's test driver made.
@@ -269,59 +71,232 @@ debug_disk() {
     for host in /sys/class/scsi_host/host*; do
         [ "$(cat "$host/proc_name")" = scsi_debug ] && echo '- - -' >"$host/scan"
     done
-    wait_for 5 debug_disk_name || abort "no disk of scsi_debug"
+    await debug_disk_name
     disk=$(debug_disk_name)
 }
 
-sectors_of_4096_bytes() {
-    debug_disk sector_size=4096
-    check "large sectors" grep -qx 4096 "/sys/block/$disk/queue/logical_block_size"
-    check "sign" does -M1 "/dev/$disk"
-    check "half a sector" refuses "partition 1 does not lie on whole sectors of /dev/$disk" \
-        -N1 -uS -j63 -z8000 -tfd "/dev/$disk"
-    check "create 1" creates "$disk" 1 2048 8192 fd
-    check "1 is known" knows "$disk" 1 2048 8192
-    check "create 2" creates "$disk" 2 0 -1 82
-    check "2 is known" knows "$disk" 2 10240 $(($(cat "/sys/block/$disk/size") - 10240))
-    check "line" [ "$(sfdisk -l -uS -N1 "/dev/$disk")" = "/dev/${disk}1 2048 10239 8192 fd" ]
-    check "stock reads it" table_has "$disk" 1 256 1024 fd
-    check "delete" does --fast-delete -1 "/dev/$disk"
-    check "1 is gone" forgot "$disk" 1
-    must rmmod scsi_debug
+# makes DISK NUMBER GAP SIZE TYPE START SECTORS: what it is asked for, and what the kernel knows at once.
+makes() {
+    check "$1$2 is made" creates "$1" "$2" "$3" "$4" "$5"
+    check "$1$2 is known" knows "$1" "$2" "$6" "$7"
 }
 
-more_than_two_tebibytes() {
-    debug_disk virtual_gb=3000
-    check "the disk is large" [ "$(cat "/sys/block/$disk/size")" -gt 4294967296 ]
-    check "sign" does -M1 "/dev/$disk"
-    check "create 1" creates "$disk" 1 2048 -1 fd
-    check "up to 2 TiB" knows "$disk" 1 2048 4294965248
-    check "no more" refuses \
-        "partition 2 does not fit on /dev/$disk: it begins at sector 4294967296 of 4294967296" \
-        -N2 -uS -j0 -z-1 -tfd "/dev/$disk"
-    must rmmod scsi_debug
+# gone DISK NUMBER...
+gone() {
+    on=$1
+    shift
+    for part in "$@"; do
+        check "$on$part is gone" forgot "$on" "$part"
+    done
 }
 
-layout_of_the_appliance
+# deletes RANGE DISK NUMBER...: these are gone then.
+deletes() {
+    check "delete $1 of $2" does --fast-delete "$1" "/dev/$2"
+    shift
+    gone "$@"
+}
+
+signs() {
+    check "sign $1" does -M1 "/dev/$1"
+}
+
+in_use() {
+    check "partition $1 of $2 is in use" refuses "partition $1 of /dev/$2 is in use" --fast-delete "$3" "/dev/$2"
+}
+
+# waits_for HOLDER ARGUMENT...: the partitioner is stopped when it begins to wait for the process that
+# holds the disk; that one ends, and the partitioner goes on and succeeds.
+waits_for() {
+    holder=$1
+    shift
+    strace -q -o /tmp/trace -e trace=clock_nanosleep -e inject=clock_nanosleep:signal=STOP:when=1 \
+        sfdisk "$@" &
+    await grep -q 'stopped by SIGSTOP' /tmp/trace
+    kill "$holder"
+    wait "$holder"
+    kill -CONT "$(pidof sfdisk)"
+    wait "$!"
+}
+
+signs sda
+check "clean table" only_dos sda
+makes sda 1 2048 4980480 fd 2048 4980480
+makes sda 2 0 4194304 fd 4982528 4194304
+makes sda 3 260352 -1 fd 9437184 $(($(cat /sys/block/sda/size) - 9437184))
+check "table 1" table_has sda 1 2048 4980480 fd
+check "table 2" table_has sda 2 4982528 4194304 fd
+check "line of 2" [ "$(sfdisk -l -uS -N2 /dev/sda)" = "/dev/sda2 4982528 9176831 4194304 fd" ]
+check "no line of 4" [ "$(sfdisk -l -uS -N4 /dev/sda)" = "" ]
+deletes 3:128 sda 3
+check "a partition is no disk" refuses "/dev/sda1 is a partition, no disk" -M1 /dev/sda1
+check "an absent disk" refuses "cannot open /dev/sdz: No such file or directory" -M1 /dev/sdz
 verdict 'the layout of the appliance'
-beside_a_mounted_partition
+
+must mkfs.ext4 -q /dev/sda1
+must mount /dev/sda1 /mnt
+echo precious >/mnt/file
+check "the kernel reads no whole table now" is_not blockdev --rereadpt /dev/sda 2>/dev/null
+makes sda 3 260352 1000000 83 9437184 1000000
+signs sda
+deletes 3:128 sda 3
+in_use 1 sda -1
+in_use 1 sda 1:2
+check "1 stays" knows sda 1 2048 4980480
+check "2 stays" knows sda 2 4982528 4194304
+check "1 stays in the table" table_has sda 1 2048 4980480 fd
+check "2 stays in the table" table_has sda 2 4982528 4194304 fd
+check "1 exists" refuses "partition 1 of /dev/sda exists already" \
+    -N1 -uS -q -f -j2048 -z4980480 -tfd -F /dev/sda
+check "the file is there" [ "$(cat /mnt/file)" = precious ]
+must umount /mnt
+check "file system is whole" e2fsck -fn /dev/sda1 >/dev/null 2>&1
 verdict 'beside a mounted partition'
-beside_an_array
+
+signs sdb
+check "sdb1" creates sdb 1 2048 4980480 fd
+check "sdb2" creates sdb 2 0 4194304 fd
+array 0 '-e 0.9 -l 1' sda1 sdb1
+in_use 1 sdb -1
+check "sdb2 came back" knows sdb 2 4982528 4194304
+check "data partition beside the array" creates sdb 3 260352 -1 fd
+must pvcreate /dev/sdb3
+must vgcreate group /dev/sdb3
+must lvcreate -L 64M -n volume group
+in_use 3 sdb 3:128
+must lvremove -f group
+must vgremove -f group
+deletes 3:128 sdb
+stop_arrays 0
+deletes -1 sdb 1 2
+signs sdb
 verdict 'beside an array and a volume'
-who_only_looks_is_waited_for
+
+check "sdb1" creates sdb 1 2048 10000 fd
+tail -f /dev/null 3</dev/sdb1 &
+await test -e "/proc/$!/fd/3"
+check "a look is waited for" waits_for "$!" --fast-delete -1 /dev/sdb
+gone sdb 1
 verdict 'who only looks is waited for'
-foreign_tables
+
+stock_table sdc 'label: gpt
+start=2048, size=100000
+start=104448, size=100000'
+check "gpt is known" knows sdc 2 104448 100000
+must mkfs.ext4 -q /dev/sdc2
+must mount /dev/sdc2 /mnt
+check "a mounted gpt" refuses "/dev/sdc is in use" -M1 /dev/sdc
+check "a mounted gpt stays" test "$(blkid -p -s PTTYPE -o value /dev/sdc)" = gpt
+check "its partitions stay" knows sdc 1 2048 100000
+must umount /mnt
+check "no partition in a gpt" refuses "/dev/sdc has no ms-dos partition table" \
+    -N3 -uS -j0 -z100 -tfd /dev/sdc
+signs sdc
+check "no ghost" only_dos sdc
+gone sdc 1 2
+blockdev --rereadpt /dev/sdc
+gone sdc 1
+
+must wipefs -qa /dev/sdc
+must mkfs.ext4 -qF /dev/sdc
+must mount /dev/sdc /mnt
+check "a mounted disk" refuses "/dev/sdc is in use" -M1 /dev/sdc
+must umount /mnt
+check "the file system is whole" e2fsck -fn /dev/sdc >/dev/null 2>&1
+signs sdc
+check "no ghost of it" only_dos sdc
 verdict 'foreign tables and whole disks in use'
-logical_partitions
+
+stock_table sdc 'label: dos
+1: start=2048, size=2048, type=fd
+4: start=8192, size=100000, type=5
+5: start=10240, size=2048, type=83
+6: start=14336, size=2048, type=83
+7: start=18432, size=4096, type=83'
+check "7 is known" knows sdc 7 18432 4096
+exec 7</dev/sdc7
+check "7 would move" refuses "partition 7 of /dev/sdc is in use" --fast-delete 6:6 /dev/sdc
+check "6 stays" knows sdc 6 14336 2048
+exec 7<&-
+deletes 6:6 sdc 7
+check "7 is 6 now" knows sdc 6 18432 4096
+check "5 stays" knows sdc 5 10240 2048
+blockdev --rereadpt /dev/sdc
+check "the kernel reads the same" knows sdc 6 18432 4096
+must dd if=/dev/sdc of=/tmp/tables bs=512 count=20000
+deletes -1 sdc
+must dd if=/tmp/tables of=/dev/sdc bs=512 conv=notrunc
+signs sdc
+check "5 is known again" knows sdc 5 10240 2048
+check "6 is known again" knows sdc 6 18432 4096
+check "of 4 only its beginning" knows sdc 4 8192 2
+deletes 3:128 sdc 4 5 6
+check "1 stays" knows sdc 1 2048 2048
 verdict 'logical partitions'
-kernel_and_table_differ
+
+# The table says one thing and the kernel another, as after a run that was cut short.
+check "sdc2" creates sdc 2 0 2048 fd
+dd if=/dev/zero of=/dev/sdc bs=512 count=1 conv=notrunc 2>/dev/null
+signs sdc
+gone sdc 1 2
+check "sdc1" creates sdc 1 2048 2048 fd
+dd if=/dev/sdc of=/tmp/table bs=512 count=1 2>/dev/null
+deletes -1 sdc
+dd if=/tmp/table of=/dev/sdc bs=512 count=1 conv=notrunc 2>/dev/null
+gone sdc 1
+signs sdc
+check "the kernel knows" knows sdc 1 2048 2048
 verdict 'the table and the kernel differ'
-locks
+
+signs sdd
+flock /dev/sdd tail -f /dev/null &
+await grep -q 'FLOCK.*WRITE' /proc/locks
+check "a locked disk is waited for" waits_for "$(pidof tail)" -N1 -uS -j2048 -z2048 -tfd /dev/sdd
+check "made" knows sdd 1 2048 2048
+sfdisk -N2 -uS -j0 -z10 -tfd /dev/sdd &
+sfdisk --fast-delete -1 /dev/sdc &
+wait
+check "two disks at once" knows sdd 2 4096 10
+check "the table reaches the disk" synced
 verdict 'locks, and data on the disk'
-killed_and_run_again
+
+for pause in 0.000 0.005 0.010 0.015 0.020 0.025 0.030 0.040 0.050; do
+    for step in "--fast-delete -1" -M1 "-N1 -uS -j2048 -z2048 -tfd"; do
+        # shellcheck disable=SC2086  # words, not one word
+        sfdisk $step /dev/sdd 2>/dev/null &
+        killed=$!
+        sleep "$pause"
+        kill -KILL "$killed" 2>/dev/null
+        wait "$killed" 2>/dev/null
+        deletes -1 sdd
+        signs sdd
+        makes sdd 1 2048 2048 fd 2048 2048
+        check "in the table after $step, killed after $pause" table_has sdd 1 2048 2048 fd
+    done
+done
 verdict 'killed and run again'
-sectors_of_4096_bytes
+
+debug_disk sector_size=4096
+check "large sectors" grep -qx 4096 "/sys/block/$disk/queue/logical_block_size"
+signs "$disk"
+check "half a sector" refuses "partition 1 does not lie on whole sectors of /dev/$disk" \
+    -N1 -uS -j63 -z8000 -tfd "/dev/$disk"
+makes "$disk" 1 2048 8192 fd 2048 8192
+makes "$disk" 2 0 -1 82 10240 $(($(cat "/sys/block/$disk/size") - 10240))
+check "line" [ "$(sfdisk -l -uS -N1 "/dev/$disk")" = "/dev/${disk}1 2048 10239 8192 fd" ]
+check "stock reads it" table_has "$disk" 1 256 1024 fd
+deletes -1 "$disk" 1
+must rmmod scsi_debug
 verdict 'sectors of 4096 bytes'
-more_than_two_tebibytes
+
+debug_disk virtual_gb=3000
+check "the disk is large" [ "$(cat "/sys/block/$disk/size")" -gt 4294967296 ]
+signs "$disk"
+makes "$disk" 1 2048 -1 fd 2048 4294965248
+check "no more" refuses \
+    "partition 2 does not fit on /dev/$disk: it begins at sector 4294967296 of 4294967296" \
+    -N2 -uS -j0 -z-1 -tfd "/dev/$disk"
+must rmmod scsi_debug
 verdict 'a disk of more than 2 TiB'
+
 finish

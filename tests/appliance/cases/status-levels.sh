@@ -3,6 +3,7 @@
 # Healthy arrays of every level, both superblock formats, large and small; and arrays that are none.
 # disks: 4
 # size: 6G
+# shellcheck disable=SC2086  # lists of words
 # shellcheck source=SCRIPTDIR/../lib.sh
 . /appliance/lib.sh
 plan 17
@@ -16,18 +17,13 @@ level_case() {
     word=$3
     format=$4
     shift 4
-    nodes=
     lines=
     for member in "$@"; do
-        nodes="$nodes /dev/$member"
         lines="$member:Normal $lines"
     done
-    # shellcheck disable=SC2086  # lists of words
-    make_array 2 -e "$format" --level="$level" --raid-devices=$# --assume-clean $nodes
-    # shellcheck disable=SC2086
-    check_status "$name" 2 clean NORMAL None "$word" $lines
-    # shellcheck disable=SC2086
-    drop_array 2 $nodes
+    array 2 "-e $format -l $level" "$@"
+    check_status "$name" 2 clean "$word" $lines
+    drop_arrays 2
 }
 
 level_case 'RAID 0 of two' raid0 'RAID 0' 1.2 sda1 sdb1
@@ -43,19 +39,20 @@ level_case 'linear of two' linear JBOD 1.2 sda1 sdb1
 level_case 'linear with a 0.90 superblock' linear JBOD 0.90 sda1 sdb1 sdc1
 
 # A 64 MiB partition under a 0.90 superblock gives its last 64 KiB, and no more.
-make_array 0 -e 0.90 --level=1 --raid-devices=2 --assume-clean /dev/sda2 /dev/sdb2
+array 0 '-e 0.90 -l 1' sda2 sdb2
 report 0 NORMAL None 'RAID 1' 67043328 sdb2:Normal sda2:Normal >"$EXPECTED"
-check_run 'the size of a small mirror to the byte' 0 arrayctl status 0
-drop_array 0 /dev/sda2 /dev/sdb2
+check 'report' answers 0 arrayctl status 0
+verdict 'the size of a small mirror to the byte'
+drop_arrays 0
 
-make_array 12 -e 1.2 --level=1 --raid-devices=2 --assume-clean /dev/sdc4 /dev/sdd4
-check_status 'a mirror of more than 4 GiB' 12 clean NORMAL None 'RAID 1' sdd4:Normal sdc4:Normal
-drop_array 12 /dev/sdc4 /dev/sdd4
+array 12 '-l 1' sdc4 sdd4
+check_status 'a mirror of more than 4 GiB' 12 clean 'RAID 1' sdd4:Normal sdc4:Normal
+drop_arrays 12
 
-make_array 3 -e 1.2 --level=0 --raid-devices=4 /dev/sda4 /dev/sdb4 /dev/sdc4 /dev/sdd4
-check_status 'a stripe of more than 16 GiB' 3 clean NORMAL None 'RAID 0' \
+array 3 '-l 0' sda4 sdb4 sdc4 sdd4
+check_status 'a stripe of more than 16 GiB' 3 clean 'RAID 0' \
     sdd4:Normal sdc4:Normal sdb4:Normal sda4:Normal
-drop_array 3 /dev/sda4 /dev/sdb4 /dev/sdc4 /dev/sdd4
+drop_arrays 3
 
 check_not_found 'an array without a node' 7
 
@@ -63,12 +60,12 @@ must mknod /dev/md9 b 9 9
 check_not_found 'a node without an array' 9
 
 # One member of two: the driver holds it, but does not start what it belongs to.
-make_array 5 -e 1.2 --level=1 --raid-devices=2 --assume-clean /dev/sda3 /dev/sdb3
-must mdadm --stop /dev/md5
+array 5 '-l 1' sda3 sdb3
+stop_arrays 5
 must mknod /dev/md5 b 9 5
 echo 'ARRAY /dev/md5 name=appliance:5' >/etc/mdadm/mdadm.conf
 must mdadm --incremental --no-degraded /dev/sda3
-grep -q '^md5 : inactive' /proc/mdstat || abort "md5 is not inactive: $(cat /proc/mdstat)"
+await grep -q '^md5 : inactive' /proc/mdstat
 check_not_found 'an inactive array' 5
 
 finish
