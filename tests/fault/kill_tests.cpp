@@ -10,6 +10,7 @@
 #include "pattern.h"
 #include "private_root.h"
 #include "sandbox.h"
+#include "situations.h"
 #include "storage_machine.h"
 #include "suite.h"
 #include "verdict.h"
@@ -35,12 +36,7 @@ namespace fs = std::filesystem;
 
 constexpr std::uint64_t MINIMUM = 1000;
 constexpr char MINIMUM_NAME[] = "minimum of kills";
-constexpr int RUN_BOUND = 30000; // milliseconds; the machine may be busy with something else
 constexpr char RUNNER[] = "ARRAYCTL_RUNNER";
-
-constexpr const char *TOOLS[] = {"/sbin/mdadm",    "/sbin/sfdisk",   "/sbin/pvs",
-                                 "/sbin/lvremove", "/sbin/vgremove", "/sbin/pvremove",
-                                 "/bin/umount",    "/bin/nurodd"};
 
 struct OPTIONS {
     bool fAll = false;
@@ -58,25 +54,138 @@ string FileText(const char *szPath)
     return text.str();
 }
 
+string Superblock(const string &szPartition)
+{
+    return "/state/superblock/" + szPartition;
+}
+
+struct PLACE {
+    int nPartition;
+    std::uint64_t start;
+    std::uint64_t size;
+    const char *szMade; // how the partitioner is told to make it
+};
+
+constexpr PLACE PLACES[] = {
+    {1, 2048, 4980480, "/sbin/sfdisk -N1 -uS -q -f -j2048 -z4980480 -tfd -F"},
+    {2, 4982528, 4194304, "/sbin/sfdisk -N2 -uS -q -f -j0 -z4194304 -tfd -F"},
+    {3, 9437184, 3145728, "/sbin/sfdisk -N3 * -uS -q -f -j260352 -z-1 -tfd -F"},
+};
+
+// What a machine remembers of partitions, superblocks, arrays and the volume on md2 is in files:
+//
+//     /sys/block/sda/sda1/{start,size}    a partition
+//     /sys/block/md2/md/dev-sda3          a member of a running array, whose node is /dev/md2
+//     /state/superblock/sda3              the number of the array that the partition belongs to
+//     /state/{lv,vg,pv}                   what is left of the volume
+//
+// Tools answer by what is there, and write and remove these files.
+void DiskRemembers(MACHINE &machine, const string &szDisk)
+{
+    const string szPath = " /dev/" + szDisk;
+    STRINGS system;
+    STRINGS data;
+    for (const PLACE &place : PLACES) {
+        const string szName = szDisk + to_string(place.nPartition);
+        const string szNode = "/dev/" + szName;
+        const string szFolder = "/sys/block/" + szDisk + "/" + szName;
+        const string szStart = szFolder + "/start";
+        const string szSize = szFolder + "/size";
+        MachineTool(machine, place.szMade + szPath,
+                    {.writes = {{szNode, ""},
+                                {szStart, to_string(place.start) + "\n"},
+                                {szSize, to_string(place.size) + "\n"}}});
+        MachineTool(machine, ListingCommand(szDisk, place.nPartition),
+                    {.szOut = Listing(szDisk, place.nPartition, place.start, place.size),
+                     .szWhileThere = szStart});
+        MachineTool(
+            machine, "/sbin/mdadm -E " + szNode,
+            {.szOut = Examination(place.nPartition - 1), .szWhileThere = Superblock(szName)});
+        MachineTool(machine, "/sbin/mdadm --zero-superblock " + szNode,
+                    {.removes = {Superblock(szName)}});
+        STRINGS &removed = place.nPartition < 3 ? system : data;
+        removed.insert(removed.end(), {szNode, szStart, szSize, szFolder});
+    }
+    MachineTool(machine, "/sbin/sfdisk --fast-delete 1:2" + szPath, {.removes = system});
+    MachineTool(machine, "/sbin/sfdisk --fast-delete 3:128" + szPath, {.removes = data});
+    system.insert(system.end(), data.begin(), data.end());
+    MachineTool(machine, "/sbin/sfdisk --fast-delete -1" + szPath, {.removes = system});
+}
+
+// An array of these members is made, unless it is there.
+void ArrayRemembers(MACHINE &machine, int nMd, const string &szOptions, const STRINGS &members)
+{
+    const string szMd = "/dev/md" + to_string(nMd);
+    const string szFolder = "/sys/block/md" + to_string(nMd) + "/md/";
+    const string szLast = szFolder + "sync_action"; // of what is written in the order of paths
+    string szCommand = "/sbin/mdadm -C " + szMd + " " + szOptions;
+    TOOL_ANSWER made = {.writes = {{szMd, ""}, {szLast, "idle\n"}}};
+    for (const string &szMember : members) {
+        szCommand += " /dev/" + szMember;
+        made.writes[Superblock(szMember)] = to_string(nMd) + "\n";
+        made.writes[szFolder + "dev-" + szMember + "/state"] = "in_sync\n";
+        made.writes[szFolder + "dev-" + szMember + "/slot"] = "0\n";
+    }
+    MachineTool(machine, szCommand + " ...", {.status = 1, .szWhileThere = szLast});
+    MachineTool(machine, szCommand + " ...", made);
+}
+
+void ArraysRemember(MACHINE &machine)
+{
+    const string szOptions = "-e 0.9 -amd -R -l1 ";
+    for (const int nMd : {0, 1}) {
+        const string szNumber = to_string(nMd + 1);
+        ArrayRemembers(machine, nMd, szOptions + "*", {"sda" + szNumber, "sdb" + szNumber});
+        ArrayRemembers(machine, nMd, szOptions + "-f *", {"sda" + szNumber});
+        ArrayRemembers(machine, nMd, szOptions + "-f *", {"sdb" + szNumber});
+    }
+    ArrayRemembers(machine, 2, "-amd -R -l1 *", {"sda3", "sdb3"});
+
+    const string szFolder = "/sys/block/md2/md";
+    STRINGS removed;
+    for (const string szMember : {"/dev-sda3", "/dev-sdb3"}) {
+        removed.insert(removed.end(), {szFolder + szMember + "/state",
+                                       szFolder + szMember + "/slot", szFolder + szMember});
+    }
+    removed.insert(removed.end(), {"/dev/md2", szFolder + "/sync_action",
+                                   szFolder + "/component_size", szFolder, "/sys/block/md2"});
+    const TOOL_ANSWER refused = {.szErr = "mdadm: cannot stop it\n", .status = 1};
+    MachineTool(machine, "/sbin/mdadm -S /dev/md2",
+                {.szErr = refused.szErr, .status = 1, .szWhileThere = "/state/lv"});
+    MachineTool(machine, "/sbin/mdadm -S /dev/md2", {.removes = removed, .szWhileThere = szFolder});
+    MachineTool(machine, "/sbin/mdadm -S /dev/md2", refused);
+}
+
+void VolumeRemembers(MACHINE &machine)
+{
+    const std::pair<string, string> parts[] = {{"lv", "vg1:lv1:"}, {"vg", "vg1::"}, {"pv", "::"}};
+    for (const auto &[szPart, szRow] : parts) {
+        const string szFile = "/state/" + szPart;
+        const string szRemove = "/sbin/" + szPart + "remove ...";
+        MachineTool(machine, "/sbin/pvs ...",
+                    {.szOut = "  /dev/md2:" + szRow + "\n", .szWhileThere = szFile});
+        MachineTool(machine, szRemove, {.removes = {szFile}, .szWhileThere = szFile});
+        MachineTool(machine, szRemove, {.status = 5});
+    }
+    MachineTool(machine, "/bin/umount ...",
+                {.writes = {{"/proc/mounts", "rootfs / rootfs rw 0 0\n"}}});
+}
+
 MACHINE Remembering(MACHINE machine)
 {
-    static const string szDisks = FileText(KILL_DISKS);
     static const string szStepper = FileText(KILL_STEPPER);
-    MachineFile(machine, "/disks", szDisks, 0755);
     MachineFile(machine, "/stepper", szStepper, 0755);
-    for (const char *const szTool : TOOLS) {
-        machine.tools[szTool] = TOOL_KIND::MISSING; // the stand-in of it, that is
-        MachineLink(machine, szTool, "/disks");
-    }
     MachineFolder(machine, "/state/superblock");
-    machine.rows.clear();
-    machine.msBound = RUN_BOUND;
-    return machine;
+    DiskRemembers(machine, "sda");
+    DiskRemembers(machine, "sdb");
+    ArraysRemember(machine);
+    VolumeRemembers(machine);
+    return Relaxed(std::move(machine));
 }
 
 void SuperblockAdd(MACHINE &machine, const string &szPartition, int nMd)
 {
-    MachineFile(machine, "/state/superblock/" + szPartition, to_string(nMd) + "\n");
+    MachineFile(machine, Superblock(szPartition), to_string(nMd) + "\n");
 }
 
 // Two disks of the newest layout, md2 on their data partitions.
@@ -105,15 +214,6 @@ MACHINE WithVolume()
     }
     machine.files["/proc/mounts"].szText += "/dev/vg1/lv1s1 /mnt/one ext4 rw 0 0\n";
     MachineFolder(machine, "/mnt/one");
-    return machine;
-}
-
-MACHINE WithBlankDisks(const string &szConf, const STRINGS &disks)
-{
-    MACHINE machine = MachineWithConf(szConf);
-    for (const string &szDisk : disks) {
-        MachineDiskAdd(machine, szDisk);
-    }
     return machine;
 }
 

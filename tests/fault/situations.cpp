@@ -22,29 +22,6 @@ constexpr const char *TOOLS[] = {"/sbin/mdadm",    "/sbin/sfdisk",   "/sbin/pvs"
 
 constexpr int RUN_BOUND = 30000; // milliseconds; the machine may be busy with something else
 
-std::string AbsentWords()
-{
-    return "mdadm: No md superblock detected.\n";
-}
-
-// Rows that answer once answer always; those that count on purpose keep their count.
-MACHINE Relaxed(MACHINE machine)
-{
-    for (TOOL_ROW &row : machine.rows) {
-        row.answer.nTimes = row.answer.nTimes == 1 ? ANY_TIMES : row.answer.nTimes;
-    }
-    for (const char *const szTool : TOOLS) {
-        const bool fExamines = std::string(szTool) == "/sbin/mdadm";
-        if (fExamines) {
-            MachineTool(machine, {szTool, "-E", ANY_REST},
-                        {.szErr = AbsentWords(), .status = 1, .nTimes = ANY_TIMES});
-        }
-        MachineTool(machine, {szTool, ANY_REST}, {.nTimes = ANY_TIMES});
-    }
-    machine.msBound = RUN_BOUND;
-    return machine;
-}
-
 void Add(std::vector<SITUATION> &situations, const std::string &szName, MACHINE machine,
          const STRINGS &words)
 {
@@ -224,15 +201,6 @@ void DestroySituations(std::vector<SITUATION> &all)
 
 // ---- newvol ------------------------------------------------------------------------------------
 
-MACHINE WithBlankDisks(const std::string &szConf, const STRINGS &disks)
-{
-    MACHINE machine = MachineWithConf(szConf);
-    for (const std::string &szDisk : disks) {
-        MachineDiskAdd(machine, szDisk);
-    }
-    return machine;
-}
-
 // Three disks behind an expansion unit beside two internal ones.
 MACHINE WithExpansionUnit(const std::string &szMore = "")
 {
@@ -391,6 +359,29 @@ void EnumerationSituations(std::vector<SITUATION> &all)
 }
 
 } // namespace
+
+MACHINE WithBlankDisks(const std::string &szConf, const STRINGS &disks)
+{
+    MACHINE machine = MachineWithConf(szConf);
+    for (const std::string &szDisk : disks) {
+        MachineDiskAdd(machine, szDisk);
+    }
+    return machine;
+}
+
+MACHINE Relaxed(MACHINE machine)
+{
+    for (TOOL_ROW &row : machine.rows) {
+        row.answer.nTimes = row.answer.nTimes == 1 ? ANY_TIMES : row.answer.nTimes;
+    }
+    MachineTool(machine, {"/sbin/mdadm", "-E", ANY_REST},
+                {.szErr = "mdadm: No md superblock detected.\n", .status = 1, .nTimes = ANY_TIMES});
+    for (const char *const szTool : TOOLS) {
+        MachineTool(machine, {szTool, ANY_REST}, {.nTimes = ANY_TIMES});
+    }
+    machine.msBound = RUN_BOUND;
+    return machine;
+}
 
 std::vector<SITUATION> SituationsMake()
 {

@@ -12,9 +12,9 @@
 #include "sandbox.h"
 #include "suite.h"
 #include "verdict.h"
-#include "wire.h"
 
 #include <algorithm>
+#include <csignal>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
@@ -104,6 +104,7 @@ TOOL_ANSWER AnswerOf(const ORACLE_REPLY &reply, int nTimes)
     answer.szOut = reply.szOut;
     answer.szErr = reply.szErr;
     answer.status = reply.nExit;
+    answer.signalCaller = reply.fKillCaller ? SIGKILL : 0;
     answer.nTimes = nTimes;
     return answer;
 }
@@ -114,6 +115,7 @@ void ToolsLayOut(const ORACLE_MACHINE &machine, MACHINE &made)
         for (size_t i = 0; i < replies.size(); i++) {
             const bool fLast = i + 1 == replies.size();
             MachineTool(made, KeyPattern(szKey), AnswerOf(replies[i], fLast ? ANY_TIMES : 1));
+            made.fMayLeaveChildren = made.fMayLeaveChildren || replies[i].fKillCaller;
         }
     }
     for (const char *szProgram : {ORACLE_MDADM, ORACLE_SFDISK, ORACLE_NURODD}) {
@@ -141,33 +143,6 @@ void ShellLayOut(const vector<ORACLE_ANSWER> &answers, MACHINE &made)
     MachineTool(made, vector<string>{"sh", ANY_REST}, AnswerOf({}, ANY_TIMES));
 }
 
-// A partitioner that is recorded as ever, and then kills who called it.
-void KillerLayOut(const ORACLE_MACHINE &machine, MACHINE &made)
-{
-    string patterns;
-    for (const auto &[szKey, replies] : machine.replies) {
-        if (replies[0].fKillCaller) {
-            const vector<string> words = OracleShellWords(szKey);
-            string arguments;
-            for (size_t i = 1; i < words.size(); i++) {
-                const bool fGap = i == 1 && words[1].compare(0, 2, "-N") == 0;
-                arguments += (i == 1 ? "" : " ") + words[i] + (fGap ? " '*'" : "");
-            }
-            patterns += (patterns.empty() ? "'" : "|'") + arguments + "'";
-        }
-    }
-    if (patterns.empty() || machine.missing.count(ORACLE_SFDISK) != 0) {
-        return;
-    }
-    const string szStandin = "exec -a " + string(ORACLE_SFDISK) + " " WIRE_STANDIN " \"$@\"";
-    made.tools[ORACLE_SFDISK] = TOOL_KIND::MISSING; // the stand-in of it, that is
-    made.fMayLeaveChildren = true;
-    MachineFile(made, ORACLE_SFDISK,
-                "#!/usr/bin/bash\ncase \"$*\" in\n" + patterns + ")\n    (" + szStandin +
-                    ")\n    kill -KILL $PPID ;;\n*) " + szStandin + " ;;\nesac\n",
-                0755);
-}
-
 MACHINE MachineLayOut(const ORACLE_CASE &subject, const vector<ORACLE_ANSWER> &answers)
 {
     const ORACLE_MACHINE &machine = subject.machine;
@@ -182,7 +157,6 @@ MACHINE MachineLayOut(const ORACLE_CASE &subject, const vector<ORACLE_ANSWER> &a
         MachineFile(made, szMarker, "");
     }
     ToolsLayOut(machine, made);
-    KillerLayOut(machine, made);
     if (ShellIsStandin(subject)) {
         ShellLayOut(answers, made);
     }

@@ -196,6 +196,20 @@ TEST(Harness, AToolCanDieBySignal)
                 [] { EXPECT_EQ(SpaceExecl("/sbin/mdadm", "-S", "/dev/md2", nullptr), SIGTERM); });
 }
 
+TEST(Harness, ARowCountsWhileItsFileIsThere)
+{
+    MACHINE machine = MachineMake();
+    MachineTool(
+        machine, "/sbin/mdadm -S /dev/md2",
+        {.status = 1, .nTimes = ANY_TIMES, .removes = {"/tmp/busy"}, .szWhileThere = "/tmp/busy"});
+    MachineTool(machine, "/sbin/mdadm -S /dev/md2", {.status = 0});
+    MachineFile(machine, "/tmp/busy", "");
+    MachineCall(machine, [] {
+        EXPECT_EQ(SpaceExecl("/sbin/mdadm", "-S", "/dev/md2", nullptr), 1 << 8);
+        EXPECT_EQ(SpaceExecl("/sbin/mdadm", "-S", "/dev/md2", nullptr), 0);
+    });
+}
+
 TEST(Harness, RowsAnswerOneAfterTheOther)
 {
     MACHINE machine = MachineMake();

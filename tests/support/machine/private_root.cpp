@@ -402,6 +402,7 @@ std::string RowRecord(const TOOL_ROW &row)
 {
     std::string szRecord;
     NumberAdd(szRecord, row.answer.nTimes);
+    FieldAdd(szRecord, row.answer.szWhileThere);
     NumberAdd(szRecord, row.argv.size());
     for (const std::string &szArgument : row.argv) {
         FieldAdd(szRecord, szArgument);

@@ -53,6 +53,7 @@ struct TOOL_ANSWER {
         {};                                // files it leaves on the machine, with their text
     std::vector<std::string> removes = {}; // files and folders it takes away
     int msGrandchild = 0;                  // leaves a grandchild that holds its streams so long
+    std::string szWhileThere = {};         // the row counts while this file or folder is there
 };
 
 constexpr int ANY_TIMES = -1;

@@ -111,6 +111,19 @@ bool UseTake(unsigned int *pUsed, long nTimes)
     return true;
 }
 
+void PathCopy(const FIELD &field, char *szPath, size_t cbPath)
+{
+    snprintf(szPath, cbPath, "%.*s", static_cast<int>(field.cb), field.pch);
+}
+
+// No path at all is always there.
+bool IsThere(const FIELD &path)
+{
+    char szPath[512] = "";
+    PathCopy(path, szPath, sizeof(szPath));
+    return szPath[0] == '\0' || access(szPath, F_OK) == 0;
+}
+
 // Finds the row of this call; `row` then stands at the answer.
 bool RowFind(int nArgument, char *const argv[], READER &row)
 {
@@ -131,7 +144,8 @@ bool RowFind(int nArgument, char *const argv[], READER &row)
     for (; FieldRead(rows, field); pUsed++) {
         row = {field.pch, field.pch + field.cb};
         const long nTimes = NumberNext(row);
-        if (PatternMatches(row, nArgument, argv) && UseTake(pUsed, nTimes)) {
+        const bool fNow = IsThere(FieldNext(row));
+        if (PatternMatches(row, nArgument, argv) && fNow && UseTake(pUsed, nTimes)) {
             return true;
         }
     }
@@ -218,11 +232,6 @@ void Flood(size_t cb)
     }
 }
 
-void PathCopy(const FIELD &field, char *szPath, size_t cbPath)
-{
-    snprintf(szPath, cbPath, "%.*s", static_cast<int>(field.cb), field.pch);
-}
-
 void FoldersMake(char *szPath)
 {
     for (char *pch = strchr(szPath + 1, '/'); pch != nullptr; pch = strchr(pch + 1, '/')) {
@@ -239,10 +248,14 @@ void FilesWrite(READER &row)
         PathCopy(FieldNext(row), szPath, sizeof(szPath));
         const FIELD text = FieldNext(row);
         FoldersMake(szPath);
-        const int fd = open(szPath, O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, 0644);
+        // A file is there as a whole or not at all, whenever this process is killed.
+        char szNew[64] = "";
+        snprintf(szNew, sizeof(szNew), WIRE_FOLDER "/new.%d", getpid());
+        const int fd = open(szNew, O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, 0644);
         if (fd >= 0) {
             BytesWrite(fd, text.pch, text.cb);
             close(fd);
+            (void)rename(szNew, szPath);
         }
     }
 }
