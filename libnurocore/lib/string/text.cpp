@@ -28,6 +28,13 @@ bool IsBehindStartOf(const char *szText, size_t cchText, const char *pch)
     return place > start && place <= start + cchText;
 }
 
+// Without strnlen, which nothing else in the tool needs: every function of libc that a program
+// names is looked up each time it starts.
+size_t LengthWithin(const char *szText, size_t cbText)
+{
+    return static_cast<size_t>(std::find(szText, szText + cbText, '\0') - szText);
+}
+
 } // namespace
 
 int NLIBCStrTrimSpace(char *szSrc, char *szDst)
@@ -87,11 +94,11 @@ int NLIBCStrTok(const char *szText, const char *szDelims, PNLIBSZLIST *ppList)
 
 size_t NLIBCStrAppend(char *szText, size_t cbText, const char *szMore)
 {
-    const size_t cchText = strnlen(szText, cbText);
+    const size_t cchText = LengthWithin(szText, cbText);
     if (cchText == cbText) {
         return cchText;
     }
-    const size_t cchMore = strnlen(szMore, cbText - cchText - 1);
+    const size_t cchMore = std::min(strlen(szMore), cbText - cchText - 1);
     memcpy(szText + cchText, szMore, cchMore);
     szText[cchText + cchMore] = '\0';
     return cchText + cchMore;
@@ -99,7 +106,7 @@ size_t NLIBCStrAppend(char *szText, size_t cbText, const char *szMore)
 
 int NLIBCStrAppendWhole(char *szText, size_t cbText, const char *szMore)
 {
-    if (strlen(szMore) >= cbText - strnlen(szText, cbText)) {
+    if (strlen(szMore) >= cbText - LengthWithin(szText, cbText)) {
         return 0;
     }
     (void)NLIBCStrAppend(szText, cbText, szMore);
