@@ -228,8 +228,8 @@ TEST(Popen, SetsACodeAndLogsNothingWhenItFails)
 
 // ---- lists -------------------------------------------------------------------------------------
 
-constexpr char PARAMETER_ERROR[] = "<11>szlist.cpp:# Parameter error\n";
-constexpr char OUT_OF_MEMORY[] = "<11>szlist.cpp:# Out of memory!!\n";
+constexpr char PARAMETER_ERROR[] = "<11>szlist_join.cpp:# Parameter error\n";
+constexpr char OUT_OF_MEMORY[] = "<11>szlist_join.cpp:# Out of memory!!\n";
 
 PNLIBSZLIST ListOfTwo()
 {
@@ -261,7 +261,7 @@ TEST(SzListJoin, LogsEachBadParameter)
         const RUN_RESULT result = MachineCall(MachineMake(), [&row, &achText] {
             EXPECT_FAILS(NLIBCSzListJoin(row.pList, row.szSeparator, row.pszText, row.pcbText), -1,
                          ERR_BAD_PARAMETER);
-            EXPECT_STREQ(NLIBCErrGetFile(), "szlist.cpp");
+            EXPECT_STREQ(NLIBCErrGetFile(), "szlist_join.cpp");
             EXPECT_STREQ(achText, "old");
         });
         EXPECT_EQ(LogText(result), PARAMETER_ERROR);
@@ -317,7 +317,7 @@ TEST(SzListJoin, LogsWhenItsBufferCannotGrow)
         int cbText = 4; // a byte less than it needs
         char *pszText = static_cast<char *>(malloc(4));
         EXPECT_FAILS(NLIBCSzListJoin(pList, ",", &pszText, &cbText), -1, ERR_OUT_OF_MEMORY);
-        EXPECT_STREQ(NLIBCErrGetFile(), "szlist.cpp");
+        EXPECT_STREQ(NLIBCErrGetFile(), "szlist_join.cpp");
         EXPECT_EQ(pszText, nullptr); // freed, which a sanitizer build proves
     });
     EXPECT_EQ(LogText(result), OUT_OF_MEMORY);

@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: MIT
 #pragma once
 
-#include "nurocore/szlist.h"
+#include "nurocore/szlist_base.h"
 
 // Creates an empty file unless a regular file is there already, which is never opened. Returns 0
 // when one is there afterwards, else -1 (ERR_BAD_PARAMETER for NULL, no code otherwise).

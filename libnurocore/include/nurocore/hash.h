@@ -4,7 +4,7 @@
 // A string-to-string map in one heap block: header, open-addressing slots and a pool of texts.
 // Only setting may move the block, and then the pointer that was handed in is updated.
 
-#include "nurocore/szlist.h"
+#include "nurocore/szlist_base.h"
 #include "nurocore/types.h"
 
 #include <memory>

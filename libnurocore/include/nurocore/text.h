@@ -3,7 +3,7 @@
 
 // Trimming, splitting, appending and decimal numbers.
 
-#include "nurocore/szlist.h"
+#include "nurocore/szlist_base.h"
 #include "nurocore/types.h"
 
 #include <cstddef>

@@ -16,11 +16,11 @@
 //     or replaced are dead, but count as strings until the next growth drops them;
 //   - the last byte of the block is 0; a slot that holds its offset is empty. The first string
 //     stored ends in that byte, so a first string of length 0 is an empty slot by identity.
-#include "nurocore/szlist.h"
+#include "nurocore/szlist_base.h"
 
 #include "nurocore/error.h"
 #include "nurocore/handle.h"
-#include "nurocore/log.h"
+#include "szlist_internal.h"
 
 #include <algorithm>
 #include <climits>
@@ -35,37 +35,9 @@ constexpr i32 LIST_SIZE_MIN = 512;
 constexpr i32 LIST_HEADER_SIZE = sizeof(NLIBSZLIST);
 constexpr i32 LIST_SLOT_SIZE = sizeof(i32);
 
-using COMPARE = int (*)(const char *, const char *);
-
-i32 *Slots(PNLIBSZLIST pList)
-{
-    return reinterpret_cast<i32 *>(pList + 1);
-}
-
-const i32 *Slots(const NLIBSZLIST *pList)
-{
-    return reinterpret_cast<const i32 *>(pList + 1);
-}
-
-char *At(PNLIBSZLIST pList, i32 offset)
-{
-    return reinterpret_cast<char *>(pList) + offset;
-}
-
-const char *At(const NLIBSZLIST *pList, i32 offset)
-{
-    return reinterpret_cast<const char *>(pList) + offset;
-}
-
-const char *Item(const NLIBSZLIST *pList, i32 index)
-{
-    return At(pList, Slots(pList)[index]);
-}
-
-bool IsEmptySlot(const NLIBSZLIST *pList, i32 index)
-{
-    return Slots(pList)[index] == pList->pszEmpty;
-}
+// Kept: the case-insensitive search and merge take a difference of exactly -2 for a failure, so
+// such lists may miss an item and hold it twice. Lists in use rely on their order.
+constexpr int COMPARE_FAILED = -2;
 
 bool IsIndexIn(const NLIBSZLIST *pList, int index)
 {
@@ -79,7 +51,7 @@ int LowerCase(char ch)
 }
 
 // Like strcasecmp, but the value returned is fixed: the difference of the first lower-cased bytes
-// that differ. The search and the merge below look at that value.
+// that differ. The binary search and the merge look at that value.
 int CompareNoCase(const char *szKey, const char *szItem)
 {
     while (*szKey != '\0' && LowerCase(*szKey) == LowerCase(*szItem)) {
@@ -89,15 +61,6 @@ int CompareNoCase(const char *szKey, const char *szItem)
     return LowerCase(*szKey) - LowerCase(*szItem);
 }
 
-// Kept on purpose: the case-insensitive search and merge take a difference of exactly -2 for a
-// failure, so such lists may miss an item and hold it twice. Lists in use rely on their order.
-constexpr int COMPARE_FAILED = -2;
-
-bool IsCompareFailed(COMPARE pCompare, int difference)
-{
-    return pCompare == CompareNoCase && difference == COMPARE_FAILED;
-}
-
 // Two's complement, so that 0 means "would be the first".
 i32 NotFoundAt(i32 low)
 {
@@ -105,18 +68,18 @@ i32 NotFoundAt(i32 low)
 }
 
 // Index of an item that equals szKey, else the complement of where it belongs; -1 when empty.
-i32 BinarySearch(const NLIBSZLIST *pList, const char *szKey, COMPARE pCompare)
+i32 BinarySearch(const NLIBSZLIST *pList, const char *szKey, SZLIST_COMPARE pCompare)
 {
     i32 low = 0;
     i32 high = pList->nItem - 1;
 
     while (low <= high) {
         const i32 middle = low + (high - low) / 2;
-        const int difference = pCompare(szKey, Item(pList, middle));
+        const int difference = pCompare(szKey, SzListItem(pList, middle));
         if (difference == 0) {
             return middle;
         }
-        if (IsCompareFailed(pCompare, difference)) {
+        if (SzListIsCompareFailed(pCompare, difference)) {
             break;
         }
         if (difference > 0) {
@@ -128,10 +91,10 @@ i32 BinarySearch(const NLIBSZLIST *pList, const char *szKey, COMPARE pCompare)
     return NotFoundAt(low);
 }
 
-i32 LinearSearch(const NLIBSZLIST *pList, const char *szKey, COMPARE pCompare)
+i32 LinearSearch(const NLIBSZLIST *pList, const char *szKey, SZLIST_COMPARE pCompare)
 {
     for (i32 i = 0; i < pList->nItem; i++) {
-        if (!IsEmptySlot(pList, i) && pCompare(szKey, Item(pList, i)) == 0) {
+        if (!SzListIsEmptySlot(pList, i) && pCompare(szKey, SzListItem(pList, i)) == 0) {
             return i;
         }
     }
@@ -155,7 +118,7 @@ PNLIBSZLIST BlockAlloc(i32 nSize)
     pList->nSize = nSize;
     pList->fMode = SZLIST_UNSORTED;
     pList->pszEmpty = nSize - 1;
-    *At(pList, pList->pszEmpty) = '\0';
+    *SzListAt(pList, pList->pszEmpty) = '\0';
     Reset(pList);
     return pList;
 }
@@ -164,7 +127,7 @@ PNLIBSZLIST BlockAlloc(i32 nSize)
 i32 StringStore(PNLIBSZLIST pList, const char *szItem, size_t cbItem)
 {
     pList->EndofFree -= static_cast<i32>(cbItem);
-    memmove(At(pList, pList->EndofFree), szItem, cbItem);
+    memmove(SzListAt(pList, pList->EndofFree), szItem, cbItem);
     return pList->EndofFree;
 }
 
@@ -183,12 +146,12 @@ PNLIBSZLIST Grow(const NLIBSZLIST *pList)
     pNew->fMode = pList->fMode;
     pNew->nFree -= pList->nItem * LIST_SLOT_SIZE;
     for (i32 i = 0; i < pList->nItem; i++) {
-        if (IsEmptySlot(pList, i)) {
-            Slots(pNew)[i] = pNew->pszEmpty;
+        if (SzListIsEmptySlot(pList, i)) {
+            SzListSlots(pNew)[i] = pNew->pszEmpty;
             continue;
         }
-        const size_t cbItem = strlen(Item(pList, i)) + 1;
-        Slots(pNew)[i] = StringStore(pNew, Item(pList, i), cbItem);
+        const size_t cbItem = strlen(SzListItem(pList, i)) + 1;
+        SzListSlots(pNew)[i] = StringStore(pNew, SzListItem(pList, i), cbItem);
         pNew->nFree -= static_cast<i32>(cbItem);
     }
     return pNew;
@@ -213,28 +176,18 @@ bool MakeRoom(PNLIBSZLIST *ppList, i64 nNeeded, HEAP_OWNER<NLIBSZLIST> &pStart)
     return true;
 }
 
-COMPARE CompareOf(int fMode)
-{
-    return fMode == SZLIST_CASE_SORTED ? CompareNoCase : strcmp;
-}
-
-bool IsSortedMode(int fMode)
-{
-    return fMode == SZLIST_SORTED || fMode == SZLIST_CASE_SORTED;
-}
-
 int InsertPlace(const NLIBSZLIST *pList, int index, const char *szItem)
 {
-    if (!IsSortedMode(pList->fMode)) {
+    if (!SzListIsSortedMode(pList->fMode)) {
         return index;
     }
-    const i32 found = BinarySearch(pList, szItem, CompareOf(pList->fMode));
+    const i32 found = BinarySearch(pList, szItem, SzListCompareOf(pList->fMode));
     return found < 0 ? ~found : found;
 }
 
 void SlotPut(PNLIBSZLIST pList, i32 index, i32 offset)
 {
-    i32 *const pSlots = Slots(pList);
+    i32 *const pSlots = SzListSlots(pList);
     if (index < pList->nItem) {
         std::copy_backward(pSlots + index, pSlots + pList->nItem, pSlots + pList->nItem + 1);
         pList->nItem++;
@@ -248,11 +201,11 @@ void SlotPut(PNLIBSZLIST pList, i32 index, i32 offset)
 // Compares slots by their strings.
 struct SLOT_LESS {
     const NLIBSZLIST *pList;
-    COMPARE pCompare;
+    SZLIST_COMPARE pCompare;
 
     bool operator()(i32 a, i32 b) const
     {
-        return pCompare(At(pList, a), At(pList, b)) < 0;
+        return pCompare(SzListAt(pList, a), SzListAt(pList, b)) < 0;
     }
 };
 
@@ -293,22 +246,28 @@ void SlotsSort(i32 *pFirst, i32 *pLast, SLOT_LESS isLess)
     NeighboursMerge(pFirst, pMiddle, pLast, isLess);
 }
 
-void Sort(PNLIBSZLIST pList, COMPARE pCompare)
+void Sort(PNLIBSZLIST pList, SZLIST_COMPARE pCompare)
 {
-    SlotsSort(Slots(pList), Slots(pList) + pList->nItem, {.pList = pList, .pCompare = pCompare});
-}
-
-bool PushAll(PNLIBSZLIST *ppResult, const NLIBSZLIST *pFrom)
-{
-    for (i32 i = 0; i < pFrom->nItem; i++) {
-        if (!IsEmptySlot(pFrom, i) && NLIBCSzListPush(ppResult, Item(pFrom, i)) < 0) {
-            return false;
-        }
-    }
-    return true;
+    SlotsSort(SzListSlots(pList), SzListSlots(pList) + pList->nItem,
+              {.pList = pList, .pCompare = pCompare});
 }
 
 } // namespace
+
+bool SzListIsSortedMode(int fMode)
+{
+    return fMode == SZLIST_SORTED || fMode == SZLIST_CASE_SORTED;
+}
+
+SZLIST_COMPARE SzListCompareOf(int fMode)
+{
+    return fMode == SZLIST_CASE_SORTED ? CompareNoCase : strcmp;
+}
+
+bool SzListIsCompareFailed(SZLIST_COMPARE pCompare, int difference)
+{
+    return pCompare == CompareNoCase && difference == COMPARE_FAILED;
+}
 
 PNLIBSZLIST NLIBCSzListAlloc(int nSize)
 {
@@ -362,7 +321,7 @@ const char *NLIBCSzListGet(const NLIBSZLIST *pList, int index)
         NLIBCErrSetHere(ERR_BAD_PARAMETER);
         return nullptr;
     }
-    return Item(pList, index);
+    return SzListItem(pList, index);
 }
 
 int NLIBCSzListFind(const NLIBSZLIST *pList, const char *szItem)
@@ -395,8 +354,8 @@ const char *NLIBCSzListRemove(PNLIBSZLIST pList, int index)
         NLIBCErrSetHere(ERR_BAD_PARAMETER);
         return nullptr;
     }
-    const char *const szRemoved = Item(pList, index);
-    i32 *const pSlots = Slots(pList);
+    const char *const szRemoved = SzListItem(pList, index);
+    i32 *const pSlots = SzListSlots(pList);
     std::copy(pSlots + index + 1, pSlots + pList->nItem, pSlots + index);
     pList->nItem--;
     pList->nFree += LIST_SLOT_SIZE;
@@ -411,18 +370,18 @@ int NLIBCSzListSet(PNLIBSZLIST *ppList, int index, const char *szItem)
     }
     NLIBSZLIST *const pList = *ppList;
     const size_t cbItem = strlen(szItem) + 1;
-    if (cbItem <= strlen(Item(pList, index)) + 1) {
-        memmove(At(pList, Slots(pList)[index]), szItem, cbItem);
+    if (cbItem <= strlen(SzListItem(pList, index)) + 1) {
+        memmove(SzListAt(pList, SzListSlots(pList)[index]), szItem, cbItem);
     } else {
         // Kept: no growth and no test for room here, callers see to nFree themselves.
-        Slots(pList)[index] = StringStore(pList, szItem, cbItem);
+        SzListSlots(pList)[index] = StringStore(pList, szItem, cbItem);
         pList->nFree -= static_cast<i32>(cbItem);
     }
-    if (!IsSortedMode(pList->fMode)) {
+    if (!SzListIsSortedMode(pList->fMode)) {
         return index;
     }
     // Found by its stored copy: sorting moves slots, not strings, so szItem may lie in the list.
-    Sort(pList, CompareOf(pList->fMode));
+    Sort(pList, SzListCompareOf(pList->fMode));
     return NLIBCSzListFind(pList, szItem);
 }
 
@@ -450,7 +409,7 @@ void NLIBCSzListCompact(PNLIBSZLIST pList)
         NLIBCErrSetHere(ERR_BAD_PARAMETER);
         return;
     }
-    i32 *const pSlots = Slots(pList);
+    i32 *const pSlots = SzListSlots(pList);
     i32 *const pEnd = std::remove(pSlots, pSlots + pList->nItem, pList->pszEmpty);
     const auto nKept = static_cast<i32>(pEnd - pSlots);
     pList->nFree += (pList->nItem - nKept) * LIST_SLOT_SIZE;
@@ -479,244 +438,6 @@ PNLIBSZLIST NLIBCSzListExpand(PNLIBSZLIST pList)
     return pNew;
 }
 
-namespace
-{
-
-// Enlarges the caller's buffer to cbNeeded bytes; without memory it is freed and NULL.
-bool JoinBufferEnlarge(char **pszBuf, int *pcbBuf, i64 cbNeeded)
-{
-    if (cbNeeded <= *pcbBuf) {
-        return true;
-    }
-    void *const pNew =
-        cbNeeded > INT_MAX ? nullptr : realloc(*pszBuf, static_cast<size_t>(cbNeeded));
-    if (pNew == nullptr) {
-        free(*pszBuf);
-        *pszBuf = nullptr;
-        return false;
-    }
-    *pszBuf = static_cast<char *>(pNew);
-    *pcbBuf = static_cast<int>(cbNeeded);
-    return true;
-}
-
-int JoinFailOutOfMemory()
-{
-    NLIBCErrSetHere(ERR_OUT_OF_MEMORY);
-    NLIBCLog(LOG_ERR, "Out of memory!!");
-    return -1;
-}
-
-} // namespace
-
-int NLIBCSzListJoin(const NLIBSZLIST *pList, const char *szSeparator, char **pszBuf, int *pcbBuf)
-{
-    if (pList == nullptr || szSeparator == nullptr || pszBuf == nullptr || *pszBuf == nullptr ||
-        pcbBuf == nullptr || *pcbBuf < 0) {
-        NLIBCErrSetHere(ERR_BAD_PARAMETER);
-        NLIBCLog(LOG_ERR, "Parameter error");
-        return -1;
-    }
-    if (pList->nItem == 0) {
-        return 0;
-    }
-    const size_t cchSeparator = strlen(szSeparator);
-    const HEAP_OWNER<size_t> pUnits(
-        static_cast<size_t *>(calloc(static_cast<size_t>(pList->nItem), sizeof(size_t))));
-    if (pUnits == nullptr) {
-        return JoinFailOutOfMemory();
-    }
-    i64 cbNeeded = 1;
-    for (i32 i = 0; i < pList->nItem; i++) {
-        pUnits.get()[i] = strlen(Item(pList, i)) + cchSeparator;
-        cbNeeded += static_cast<i64>(pUnits.get()[i]);
-    }
-    if (!JoinBufferEnlarge(pszBuf, pcbBuf, cbNeeded)) {
-        return JoinFailOutOfMemory();
-    }
-    memset(*pszBuf, 0, static_cast<size_t>(*pcbBuf));
-    char *pszNext = *pszBuf;
-    for (i32 i = 0; i < pList->nItem; i++) {
-        const size_t cchItem = pUnits.get()[i] - cchSeparator;
-        memcpy(pszNext, Item(pList, i), cchItem);
-        memcpy(pszNext + cchItem, szSeparator, cchSeparator);
-        pszNext += pUnits.get()[i];
-    }
-    *(pszNext - cchSeparator) = '\0';
-    return static_cast<int>(cbNeeded);
-}
-
-int NLIBCSzListDump2Str(const NLIBSZLIST *pList, const char *szSeparator, char *szOut, int cbOut)
-{
-    if (pList == nullptr || szSeparator == nullptr || szOut == nullptr || cbOut < 1) {
-        NLIBCErrSetHere(ERR_BAD_PARAMETER);
-        NLIBCLog(LOG_ERR, "Parameter error");
-        return -1;
-    }
-    const auto cbOutTotal = static_cast<size_t>(cbOut);
-    memset(szOut, 0, cbOutTotal);
-    size_t cchOut = 0;
-    for (i32 i = 0; i < pList->nItem; i++) {
-        const char *const szLead = i == 0 ? "" : szSeparator;
-        const size_t cchUnit = strlen(szLead) + strlen(Item(pList, i));
-        if (cchOut + cchUnit >= cbOutTotal) {
-            NLIBCErrSetHere(ERR_OUT_OF_SPACE);
-            return -1;
-        }
-        (void)snprintf(szOut + cchOut, cbOutTotal - cchOut, "%s%s", szLead, Item(pList, i));
-        cchOut += cchUnit;
-    }
-    return static_cast<int>(cchOut);
-}
-
-namespace
-{
-
-// Two lists in one order: the result gets what only pOther holds, in place or all of both.
-bool MergeSorted(const NLIBSZLIST *pThis, const NLIBSZLIST *pOther, COMPARE pCompare, bool fNew,
-                 PNLIBSZLIST *ppResult)
-{
-    const i32 nThis = pThis->nItem;
-    i32 i = 0;
-    i32 j = 0;
-    while (j < pOther->nItem || (fNew && i < nThis)) {
-        // In place, pThis is the result and may have moved.
-        const NLIBSZLIST *const pLeft = fNew ? pThis : *ppResult;
-        int difference = 0;
-        if (i == nThis) {
-            difference = 1;
-        } else if (j == pOther->nItem) {
-            difference = -1;
-        } else {
-            difference = pCompare(Item(pLeft, i), Item(pOther, j));
-            if (IsCompareFailed(pCompare, difference)) {
-                return false;
-            }
-        }
-        const bool fTakeOther = difference > 0;
-        const char *const szTaken = fTakeOther ? Item(pOther, j) : Item(pLeft, i);
-        if ((fTakeOther || fNew) && NLIBCSzListPush(ppResult, szTaken) < 0) {
-            return false;
-        }
-        i += difference <= 0 ? 1 : 0;
-        j += difference >= 0 ? 1 : 0;
-    }
-    return true;
-}
-
-bool OrSameOrder(PNLIBSZLIST *ppList, const NLIBSZLIST *pOther, bool fNew, PNLIBSZLIST *ppResult)
-{
-    const int fMode = (*ppList)->fMode;
-    if (!fNew) {
-        // Without a re-sort, so that what is pushed goes to the end and the walk stays in front.
-        (*ppResult)->fMode = SZLIST_UNSORTED;
-    }
-    const bool isMerged = MergeSorted(*ppList, pOther, CompareOf(fMode), fNew, ppResult);
-    // One that gave up leaves a list in no order, and says so by its mode.
-    if (isMerged) {
-        NLIBCSzListSort(*ppResult, fMode);
-    }
-    return isMerged;
-}
-
-int FindInOrderOf(const NLIBSZLIST *pOther, const char *szItem)
-{
-    return pOther->fMode == SZLIST_CASE_SORTED ? NLIBCSzListCaseFind(pOther, szItem)
-                                               : NLIBCSzListFind(pOther, szItem);
-}
-
-// All of the sorted pOther, then what only the unsorted list held.
-bool OrSortedOther(const NLIBSZLIST *pThis, const NLIBSZLIST *pOther, int flags,
-                   PNLIBSZLIST *ppResult)
-{
-    if (!IsSortedMode(pOther->fMode)) {
-        NLIBCErrSetHere(ERR_BAD_PARAMETER);
-        return false;
-    }
-    const i32 nThis = pThis->nItem;
-    if (!PushAll(ppResult, pOther)) {
-        return false;
-    }
-    if (flags == SZLIST_OR_NEW) {
-        for (i32 i = 0; i < nThis; i++) {
-            if (!IsEmptySlot(pThis, i) && FindInOrderOf(pOther, Item(pThis, i)) < 0 &&
-                NLIBCSzListPush(ppResult, Item(pThis, i)) < 0) {
-                return false;
-            }
-        }
-    } else if (flags == 0) {
-        // Backward, so that a removal does not shift what is still to be looked at.
-        for (i32 i = nThis - 1; i >= 0; i--) {
-            if (FindInOrderOf(pOther, Item(*ppResult, i)) >= 0) {
-                (void)NLIBCSzListRemove(*ppResult, i);
-            }
-        }
-    }
-    return true;
-}
-
-// pOther is unsorted and the result is in place or sorted: what it has not got yet is added.
-bool OrMissing(PNLIBSZLIST *ppResult, const NLIBSZLIST *pOther)
-{
-    for (i32 i = 0; i < pOther->nItem; i++) {
-        const char *const szItem = Item(pOther, i);
-        if (IsEmptySlot(pOther, i) || FindInOrderOf(*ppResult, szItem) >= 0) {
-            continue;
-        }
-        if (NLIBCSzListPush(ppResult, szItem) < 0) {
-            return false;
-        }
-    }
-    return true;
-}
-
-bool Or(PNLIBSZLIST *ppList, const NLIBSZLIST *pOther, int flags, PNLIBSZLIST *ppResult)
-{
-    const NLIBSZLIST *const pThis = *ppList;
-    const bool fNew = flags == SZLIST_OR_NEW;
-
-    if (pThis->fMode == SZLIST_UNSORTED && pOther->fMode != SZLIST_UNSORTED) {
-        return OrSortedOther(pThis, pOther, flags, ppResult);
-    }
-    if (pThis->fMode != SZLIST_UNSORTED && pOther->fMode != SZLIST_UNSORTED) {
-        return OrSameOrder(ppList, pOther, fNew, ppResult);
-    }
-    if (pThis->fMode == SZLIST_UNSORTED && fNew) {
-        return PushAll(ppResult, pThis) && PushAll(ppResult, pOther);
-    }
-    if (fNew) {
-        (*ppResult)->fMode = pThis->fMode;
-        return PushAll(ppResult, pThis) && OrMissing(ppResult, pOther);
-    }
-    return OrMissing(ppResult, pOther);
-}
-
-} // namespace
-
-PNLIBSZLIST NLIBCSzListOr(PNLIBSZLIST *ppList, const NLIBSZLIST *pOther, int flags)
-{
-    if (ppList == nullptr || *ppList == nullptr || pOther == nullptr ||
-        ((*ppList)->fMode != 0 && pOther->fMode != 0 && (*ppList)->fMode != pOther->fMode)) {
-        NLIBCErrSetHere(ERR_BAD_PARAMETER);
-        return nullptr;
-    }
-    if (flags != SZLIST_OR_NEW) {
-        NLIBCSzListCompact(*ppList);
-        return Or(ppList, pOther, flags, ppList) ? *ppList : nullptr;
-    }
-    const i64 nUsed =
-        static_cast<i64>((*ppList)->nSize) - (*ppList)->nFree + pOther->nSize - pOther->nFree;
-    PNLIBSZLIST pNew = NLIBCSzListAlloc(static_cast<int>(std::min<i64>(nUsed, INT_MAX)));
-    if (pNew == nullptr) {
-        return nullptr;
-    }
-    if (!Or(ppList, pOther, flags, &pNew)) {
-        NLIBCSzListFree(pNew);
-        return nullptr;
-    }
-    return pNew;
-}
-
 int NLIBCSzListDump(const NLIBSZLIST *pList)
 {
     if (pList == nullptr) {
@@ -725,10 +446,10 @@ int NLIBCSzListDump(const NLIBSZLIST *pList)
     }
     (void)printf("%p start address \n", static_cast<const void *>(pList));
     for (i32 i = 0; i < pList->nItem; i++) {
-        (void)printf("%p ,%p pszItem[%i]=%s\n", static_cast<const void *>(Item(pList, i)),
-                     static_cast<const void *>(Slots(pList) + i), i, Item(pList, i));
+        (void)printf("%p ,%p pszItem[%i]=%s\n", static_cast<const void *>(SzListItem(pList, i)),
+                     static_cast<const void *>(SzListSlots(pList) + i), i, SzListItem(pList, i));
     }
     return printf("nSize =%i \t nItem =%i \t nFree =%i \t fMode =%i \t EndofFree=%p\n",
                   pList->nSize, pList->nItem, pList->nFree, pList->fMode,
-                  static_cast<const void *>(At(pList, pList->EndofFree)));
+                  static_cast<const void *>(SzListAt(pList, pList->EndofFree)));
 }
