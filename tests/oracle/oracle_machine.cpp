@@ -5,7 +5,10 @@
 
 #include <algorithm>
 #include <cctype>
+#include <cstdio>
 #include <cstdlib>
+#include <fstream>
+#include <iterator>
 
 namespace
 {
@@ -241,106 +244,56 @@ void ConfMake(DICE &dice, const SKETCH &sketch, ORACLE_MACHINE &machine)
 
 // ------------------------------------------------------------------------------ superblocks
 
-string ReportOld(const string &szDevice, int nMd, const string &szVersion)
+const string &FixtureRead(const string &szName)
 {
-    return szDevice +
-           ":\n"
-           "          Magic : a92b4efc\n"
-           "        Version : " +
-           szVersion +
-           "\n"
-           "           UUID : 4f2a81b3:9c07d5e1:e368bf24:cafec0de (local to host appliance)\n"
-           "  Creation Time : Thu Mar  7 11:42:10 2024\n"
-           "     Raid Level : raid5\n"
-           "  Used Dev Size : 1048512 (1023.94 MiB 1073.68 MB)\n"
-           "     Array Size : 2097024 (2047.88 MiB 2147.35 MB)\n"
-           "   Raid Devices : 3\n"
-           "  Total Devices : 3\n"
-           "Preferred Minor : " +
-           to_string(nMd) +
-           "\n"
-           "\n"
-           "    Update Time : Thu Mar  7 11:43:02 2024\n"
-           "          State : clean\n"
-           "       Checksum : 5a1dbe34 - correct\n"
-           "         Events : 18\n"
-           "\n"
-           "      Number   Major   Minor   RaidDevice State\n"
-           "this     0       8        3        0      active sync   /dev/sda3\n"
-           "\n"
-           "   0     0       8        3        0      active sync   /dev/sda3\n"
-           "   1     1       8       19        1      active sync   /dev/sdb3\n";
+    static std::map<string, string> texts;
+    string &text = texts[szName];
+    if (text.empty()) {
+        std::ifstream file(ORACLE_FIXTURES "/examine/" + szName + ".txt", std::ios::binary);
+        text.assign(std::istreambuf_iterator<char>(file), {});
+    }
+    if (text.empty()) {
+        fprintf(stderr, "no fixture %s\n", szName.c_str());
+        abort();
+    }
+    return text;
 }
 
-string ReportNew(const string &szDevice, const string &szName, const string &szRole,
-                 const string &szVersion)
+// The last number of the first word behind the key, where there is one.
+void NumberReplace(string &text, const string &szKey, int number)
 {
-    return szDevice +
-           ":\n"
-           "          Magic : a92b4efc\n"
-           "        Version : " +
-           szVersion +
-           "\n"
-           "    Feature Map : 0x0\n"
-           "     Array UUID : 7c1d92ab:03f6e4d8:b1a05c7e:99d2f310\n" +
-           szName +
-           "  Creation Time : Thu Mar  7 11:42:10 2024\n"
-           "     Raid Level : raid1\n"
-           "   Raid Devices : 2\n"
-           "\n"
-           " Avail Dev Size : 2095104 sectors (1023.00 MiB 1072.69 MB)\n"
-           "     Array Size : 1047552 KiB (1023.00 MiB 1072.69 MB)\n"
-           "    Data Offset : 2048 sectors\n"
-           "          State : clean\n"
-           "    Device UUID : 1b2c3d4e:5f607182:93a4b5c6:d7e8f901\n"
-           "\n"
-           "    Update Time : Thu Mar  7 11:43:02 2024\n"
-           "       Checksum : 9b1c44f0 - correct\n"
-           "         Events : 17\n"
-           "\n"
-           "   Device Role : " +
-           szRole +
-           "\n"
-           "   Array State : AA ('A' == active, '.' == missing, 'R' == replacing)\n";
+    const size_t word = text.find(szKey) + szKey.size();
+    if (text.find(szKey) == string::npos) {
+        return;
+    }
+    const size_t end = text.find_first_of(" \n", word);
+    const size_t digits = text.find_last_not_of("0123456789", end - 1) + 1;
+    text.replace(digits, end - digits, digits == end ? "" : to_string(number));
 }
 
-// What the examination of a disk with a partition table says.
-string ReportTable(const string &szDevice)
-{
-    return szDevice + ":\n"
-                      "   MBR Magic : aa55\n"
-                      "Partition[0] :      4980480 sectors at         2048 (type fd)\n"
-                      "Partition[1] :      4194304 sectors at      4982528 (type fd)\n";
-}
-
-string ReportMake(DICE &dice, const string &szDevice, bool fWholeDisk)
+// A real report, of the array that is wanted here.
+string ReportMake(DICE &dice, bool fWholeDisk)
 {
     static const vector<int> data = {2, 2, 2, 2, 3, 99, 100, 101, 102, 127};
     static const vector<int> whole = {2, 99, 100, 100, 101, 101};
+    static const vector<string> old = {"mirror-0.90", "mirror-0.90", "spare-0.90",
+                                       "degraded-raid5-0.90", "level-linear-0.90"};
+    static const vector<string> named = {
+        "mirror-1.0",          "mirror-1.1",          "mirror-1.2",       "mirror-1.2",
+        "level-raid5",         "level-raid10",        "spare-1.0",        "spare-1.2",
+        "role-journal",        "role-replacement",    "name-with-umlaut", "name-with-two-colons",
+        "name-without-number", "name-without-host",   "container-ddf",    "container-imsm",
+        "failed-member",       "name-of-another-host"};
+    constexpr char VERSION[] = "0.90.00";
     const int nMd = Pick(dice, fWholeDisk ? whole : data);
-    if (Chance(dice, 40)) {
-        return ReportOld(szDevice, nMd, Chance(dice, 5) ? "90" : "0.90.00");
+    string report = FixtureRead(Pick(dice, Chance(dice, 40) ? old : named));
+    NumberReplace(report, "Preferred Minor : ", nMd);
+    NumberReplace(report, "           Name : ", nMd);
+    const size_t version = report.find(VERSION);
+    if (version != string::npos && Chance(dice, 5)) {
+        report.replace(version, sizeof(VERSION) - 1, "90"); // and nobody knows what that is
     }
-    const string szHead = "           Name : ";
-    string name = szHead + "appliance:" + to_string(nMd) + "  (local to host appliance)\n";
-    switch (Below(dice, 10)) {
-    case 0:
-        name = szHead + to_string(nMd) + "\n";
-        break;
-    case 1:
-        name = szHead + "appliance:volume\n";
-        break;
-    case 2:
-        name = "";
-        break;
-    default:
-        break;
-    }
-    static const vector<string> roles = {"Active device 0",      "Active device 1",
-                                         "Active device 12",     "spare",
-                                         "Replacement device 1", "Journal"};
-    static const vector<string> versions = {"1.2", "1.2", "1.2", "1.0", "1.1"};
-    return ReportNew(szDevice, name, Pick(dice, roles), Pick(dice, versions));
+    return report;
 }
 
 void ReportAdd(DICE &dice, ORACLE_MACHINE &machine, const string &szDevice, u64 percent)
@@ -348,7 +301,7 @@ void ReportAdd(DICE &dice, ORACLE_MACHINE &machine, const string &szDevice, u64 
     const string szKey = string(ORACLE_MDADM) + " -E " + szDevice;
     ORACLE_REPLY reply;
     if (Chance(dice, percent)) {
-        reply.szOut = ReportMake(dice, szDevice, isdigit(szDevice.back()) == 0);
+        reply.szOut = ReportMake(dice, isdigit(szDevice.back()) == 0);
     } else {
         reply.szErr = "mdadm: No md superblock detected on " + szDevice + ".\n";
         reply.nExit = 1;
@@ -484,7 +437,7 @@ void DisksMake(DICE &dice, const SKETCH &sketch, ORACLE_MACHINE &machine)
         ReportAdd(dice, machine, szPath, 30);
         if (Chance(dice, 20)) {
             ORACLE_REPLY reply;
-            reply.szOut = ReportTable(szPath);
+            reply.szOut = FixtureRead("mbr-only");
             machine.replies[string(ORACLE_MDADM) + " -E " + szPath] = {reply};
         }
     }
