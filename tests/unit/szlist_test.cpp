@@ -425,6 +425,33 @@ TEST(SzListExpand, RefusesNull)
     EXPECT_FAILS(NLIBCSzListExpand(nullptr), nullptr, ERR_BAD_PARAMETER);
 }
 
+// Growing stores the strings anew in slot order, and the first one ends in the block's last byte.
+TEST(SzListExpand, AnEmptyStringThatIsTheFirstOneTurnsIntoAnEmptySlot)
+{
+    TEST_LIST list({"a"}, SZLIST_UNSORTED);
+    ASSERT_EQ(NLIBCSzListPushHead(&list.p, ""), 0);
+    ASSERT_EQ(NLIBCSzListPush(&list.p, ""), 2);
+    EXPECT_QUIET(NLIBCSzListFind(list.p, ""), 0);
+    list.p = NLIBCSzListExpand(list.p);
+    EXPECT_TRUE(IsEmptySlot(list.p, 0));
+    EXPECT_FALSE(IsEmptySlot(list.p, 2));
+    EXPECT_QUIET(NLIBCSzListFind(list.p, ""), 2);
+    EXPECT_EQ(ItemsOf(list.p), (ITEMS{"", "a", ""}));
+    EXPECT_EQ(Defect(list.p), "");
+}
+
+// Slot 0 is skipped, so the empty string in slot 1 is the first one.
+TEST(SzListExpand, AnEmptyStringBehindSkippedSlotsTurnsIntoOneToo)
+{
+    TEST_LIST list;
+    ASSERT_EQ(NLIBCSzListInsert(&list.p, 1, "a"), 1);
+    ASSERT_EQ(NLIBCSzListInsert(&list.p, 1, ""), 1);
+    EXPECT_QUIET(NLIBCSzListFind(list.p, ""), 1);
+    list.p = NLIBCSzListExpand(list.p);
+    EXPECT_TRUE(IsEmptySlot(list.p, 1));
+    EXPECT_QUIET(NLIBCSzListFind(list.p, ""), -1);
+}
+
 TEST(SzListSet, CopiesAShorterStringOverTheOld)
 {
     TEST_LIST list({"abc", "def"}, SZLIST_UNSORTED);
