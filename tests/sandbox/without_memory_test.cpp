@@ -29,8 +29,8 @@ namespace
 constexpr int CALLS_MAX = 40;
 constexpr int LONG_LENGTH = 300; // two of them do not fit a new list
 
-// Fails each allocation in turn until the body has had one run without a fault, and says how many
-// different answers of the wanted kind there were. The body returns what it has seen.
+// Runs the body CALLS_MAX times, failing the first allocation, then the second and so on, and says
+// how many runs gave the wanted answer. The body returns what it has seen.
 int TimesSeen(MACHINE machine, const char *szFunction, const std::string &szWanted,
               const std::function<std::string()> &body)
 {

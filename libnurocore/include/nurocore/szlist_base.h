@@ -5,8 +5,14 @@
 //
 // The list owns copies of its strings. A function that may grow the list takes the address of the
 // caller's pointer, because growing moves the block; strings handed out stay valid until then.
-// Every failure leaves the list as it was and sets the last-error record: ERR_BAD_PARAMETER for
-// arguments, ERR_OUT_OF_MEMORY when the block cannot grow.
+// A failure sets the last-error record: ERR_BAD_PARAMETER for arguments, ERR_OUT_OF_MEMORY when the
+// block cannot grow. It leaves the items as they were, but an insertion that has doubled the block
+// once and cannot do it again leaves the larger block in the caller's pointer.
+//
+// A slot that was skipped holds no item: Find passes it and Compact drops it. So does a slot whose
+// empty string ends in the last byte of the block, because an empty slot is told by that address:
+// an empty string that is the first one stored in a fresh or cleared list, and, as soon as the
+// block grows, one that has no other string in a slot before it.
 
 #include "nurocore/types.h"
 
@@ -66,9 +72,11 @@ int NLIBCSzListCaseFind(const NLIBSZLIST *pList, const char *szItem);
 // NULL with ERR_BAD_PARAMETER outside the list.
 const char *NLIBCSzListRemove(PNLIBSZLIST pList, int index);
 
-// Replaces the string at index. The list never grows here: a string longer than the old one needs
-// its length + 1 bytes of nFree, and that is the caller's to know. Returns index, or the place
-// that NLIBCSzListFind tells in a sorted list; -1 on failure.
+// Replaces the string at index. The list never grows here, and nobody looks whether there is room:
+// a string longer than the old one needs its length + 1 bytes of nFree, which the caller has to
+// know, or it overwrites slots. Returns index, or in a sorted list what NLIBCSzListFind returns for
+// the string; -1 on failure, and always with SZLIST_CASE_SORTED (ERR_BAD_PARAMETER, although the
+// string was replaced).
 int NLIBCSzListSet(PNLIBSZLIST *ppList, int index, const char *szItem);
 
 // Puts the list into fMode. Only an unsorted list is compacted and sorted; from one sorted mode to

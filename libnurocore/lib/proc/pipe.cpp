@@ -32,6 +32,7 @@ struct PIPE_STREAM {
 };
 
 PIPE_STREAM *g_pStreams = nullptr; // newest first
+// The tool has one thread and never waits for this; a program with several may use the streams too.
 std::atomic<u32> g_streamsLock = 0;
 
 void StreamsLock()

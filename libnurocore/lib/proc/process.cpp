@@ -81,7 +81,7 @@ void ForkAgain()
     if (pid > 0) {
         _exit(0);
     }
-    (void)usleep(1);
+    (void)usleep(1); // lets the child that is left behind end first, which nothing relies on
 }
 
 void ChildPrepare(unsigned int flags)

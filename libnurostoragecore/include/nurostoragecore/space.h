@@ -8,8 +8,10 @@
 
 // Runs szPath with the arguments that follow, up to a NULL, and logs its standard error. Returns
 // the raw wait status: 0 for exit status 0, exit status * 256 otherwise (32512 when it cannot be
-// executed); -1 with the code of the pipe stream, with ERR_BAD_PARAMETER for NULL, without a code
-// when there is no memory for the arguments.
+// executed); -1 without a code when there is no memory for the arguments, with ERR_NO_SUCH_CHILD
+// when the tool's end is not to be had, with ERR_BAD_PARAMETER for NULL. ERR_BAD_PARAMETER stands
+// there too when the tool could not be started, whatever the reason: the log and the close are then
+// asked about a stream that is NULL, and write over the code of the pipe stream.
 [[gnu::sentinel]] int SpaceExecl(const char *szPath, ...);
 
 // The same for a vector of the caller's, argv[0] the path, ended by NULL. A caller that tells of a
