@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: MIT
 #pragma once
 
-// What one disk path says: which disk, in which container, which partition.
+// What a disk path says: which disk, in which container, which partition.
 
 #include "hwcontrol/disk_port.h"
 #include "nurocore/types.h"
@@ -21,7 +21,8 @@ struct DISK_PATH_INFO {
 
 static_assert(sizeof(DISK_PATH_INFO) == 16);
 
-// The container of a port type. Returns 0, or -1 (mask untouched) for a type that has none.
+// The container of a port type. Returns 0, or -1 (no code, mask untouched) for NULL and for a type
+// that has none.
 int DiskContainerFromPortType(DISK_PORT_TYPE type, u32 *pMask);
 
 // The same for the port type of a path.

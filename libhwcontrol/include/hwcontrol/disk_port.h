@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: MIT
 #pragma once
 
-// Which kind of port a disk hangs on. The model's configuration has a bit mask over disk letters
-// for each kind; expansion units report their disks in sysfs.
+// Which kind of port a disk is attached to. The model's configuration has a bit mask over disk
+// letters for each kind; expansion units report their disks in sysfs.
 
 #include "nurocore/szlist.h"
 
@@ -15,7 +15,7 @@ enum DISK_PORT_TYPE {
     BOOT_DEVICE = 5,
     ISD_DEVICE = 6,
     CACHE_DEVICE = 7,
-    OTHER_DEVICE = 8, // a disk that no mask names
+    OTHER_DEVICE = 8, // a disk that is in no mask
     MMC_DEVICE = 9,
 };
 
@@ -25,18 +25,18 @@ DISK_PORT_TYPE ExternalDiskPortCheck(const char *szPath);
 // The same for the bare name of a whole disk.
 DISK_PORT_TYPE ExternalDiskPortCheckName(const char *szName);
 
-// The port type of the disks that this machine builds its arrays of: those of the expansion unit
-// when it has two heads, else the internal ones.
+// The port type of the disks that this machine builds its arrays from: those of the expansion unit
+// on a dual-head model, else the internal ones.
 DISK_PORT_TYPE ExternalDiskPortOfArrays();
 
-// Appends the names (not paths) of all disks of a port type to the list and puts it in byte order.
-// Returns 0, also when there is none; -1 on failure, the list may have got some by then.
+// Appends the names (not paths) of all disks of a port type to the list and sorts it in byte order.
+// Returns 0, also when there is none; -1 on failure, when the list may already have some of them.
 int ExternalDiskPortEnum(DISK_PORT_TYPE type, PNLIBSZLIST *ppList);
 
 // Writes the disk names that expansion units report to szOut, a blank after each; with fCheckOpen
 // only those that can be opened. Returns 0 when there is at least one, else -1: ERR_BAD_PARAMETER,
-// or ERR_BAD_FORMAT when they do not fit.
+// ERR_BAD_FORMAT when they do not fit, no code of its own when there is none.
 int ExternalDiskPortEnumEunit(int fCheckOpen, char *szOut, int cbOut);
 
-// 1 when the model has SAS ports, else 0. Asked once per process.
+// 1 when the model has SAS ports, else 0. Read once per process.
 int IsSupportSas();

@@ -35,7 +35,7 @@ bool IsDecimal(char ch)
     return ch >= '0' && ch <= '9';
 }
 
-// The number at the start of szText as scanf's %d sees it; -1 when there is none.
+// The number at the start of szText as scanf's %d reads it; -1 when there is none.
 int ScanNumber(const char *szText)
 {
     const char *pch = szText + strspn(szText, " \t\n\v\f\r");
@@ -43,8 +43,8 @@ int ScanNumber(const char *szText)
     return IsDecimal(*pch) ? NLIBCStrToI32(szText) : -1;
 }
 
-// The first character that does not belong to the disk: a "p" that a digit follows, last in an
-// mmcblk path; the first digit in any other.
+// The length of the disk's part of a name. In an mmcblk name it ends at the last "p" if a digit
+// follows; in any other at the first digit.
 size_t DiskLength(const char *szPart)
 {
     if (!IsMmc(szPart)) {
@@ -64,8 +64,8 @@ bool IsPartitionRequestValid(const char *szDisk, int partNum, const char *szOut,
     return true;
 }
 
-// Kept: what begins with "/dev" loses five characters, whatever the fifth is; partitions have
-// always been named so.
+// Kept: a text that begins with "/dev" loses five characters, whatever the fifth is; partition
+// names have always been made this way.
 const char *DeviceNameBehindDev(const char *szDevice)
 {
     const bool fPath = std::string_view(szDevice).starts_with(DEVICE_DIRECTORY_NAME);
@@ -123,8 +123,8 @@ int DiskPartitionNumGet(const char *szName, char *szDisk, int cbDisk)
         NLIBCErrSetHere(ERR_BAD_PARAMETER);
         return -1;
     }
-    // Kept: the disk ends at the first 1 to 9 here, not at a 0 (sda10 is sda and 10; mmcblk0 is
-    // whole), while DiskPartitionNumRemove ends it at any digit.
+    // Kept: here the disk ends at the first digit from 1 to 9 (an mmcblk disk at the first "p"),
+    // while DiskPartitionNumRemove ends it at any digit.
     const bool fMmc = IsMmc(szName);
     const size_t cchDisk =
         std::min(strcspn(szName, fMmc ? "p" : "123456789"), static_cast<size_t>(cbDisk) - 1);

@@ -14,7 +14,7 @@ namespace
 
 constexpr u32 CONTAINER_NONE = 0;
 
-// By port type.
+// Indexed by port type.
 constexpr std::array<u32, 10> CONTAINERS = {
     CONTAINER_NONE,          // UNKNOWN_DEVICE
     DISK_CONTAINER_INTERNAL, // INTERNAL_DEVICE
@@ -28,7 +28,7 @@ constexpr std::array<u32, 10> CONTAINERS = {
     CONTAINER_NONE,          // MMC_DEVICE
 };
 
-// Kept: a parsed path tells other containers than DiskContainerFromPortType for the types that it
+// Kept: a parsed path has a container even for the port types that DiskContainerFromPortType
 // refuses. The boot device and isd disks count as internal, an MMC card as USB.
 u32 ParsedContainer(DISK_PORT_TYPE type)
 {
@@ -48,7 +48,7 @@ i32 DiskNumber(const char *szPath)
     return static_cast<i32>(static_cast<u32>(DiskIndexGet(szPath)) + 1U);
 }
 
-// Disks of an expansion unit are named by unit, then by bay: sdga is the first of the unit g. A
+// Disks of an expansion unit are named by unit, then by bay: sdga is the first disk of unit g. A
 // name of one letter stands for the unit itself.
 void UnitDiskPlace(const char *szPath, const char *szLetters, DISK_PATH_INFO *pInfo)
 {

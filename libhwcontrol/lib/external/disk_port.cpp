@@ -76,22 +76,22 @@ bool MasksLoad()
     return true;
 }
 
-// 1 shifted left in 32 bits; no bit where a 32-bit shift has none.
+// 1 shifted left in 32 bits; 0 when the shift is out of range.
 u32 PortBit(int shift)
 {
     return shift >= 0 && shift < 32 ? 1U << static_cast<u32>(shift) : 0;
 }
 
-// Kept: the 32-bit bit is widened with its sign, so the 32nd disk matches any of bits 31 to 63,
-// and disks beyond it match none.
+// Kept: the 32-bit value is sign-extended, so the 32nd disk matches any of bits 31 to 63, and disks
+// beyond it match none.
 bool IsInMask(MASK mask, int index)
 {
     const auto wide = static_cast<u64>(static_cast<i64>(static_cast<i32>(PortBit(index))));
     return (g_masks[mask] & wide) != 0;
 }
 
-// Behind an eSATA port an expansion unit's disks have names of two letters, the first of which is
-// the port's.
+// Disks of an expansion unit behind an eSATA port have names of two letters; the first letter is
+// that of the port.
 bool IsOnEsataPort(int index)
 {
     const auto ports = static_cast<u32>(g_masks[MASK_ESATA]);
@@ -104,7 +104,7 @@ DISK_PORT_TYPE EsataKind(const char *szName)
     if (ExternalDiskPortEnumEunit(0, szUnits, EUNIT_LIST_SIZE) != 0) {
         return ESATA_DEVICE;
     }
-    // Kept loose: sdg counts as reported when sdga is.
+    // Kept: any part of the text matches, so sdg counts as reported when sdga is.
     return strstr(szUnits, szName) != nullptr ? EUNIT_DEVICE : ESATA_DEVICE;
 }
 
@@ -156,7 +156,7 @@ int PushMatching(const glob_t &matches, DISK_PORT_TYPE type, PNLIBSZLIST *ppList
     return 0;
 }
 
-// The text that units report so far, and where the next name goes.
+// The caller's request and buffer, and whether the buffer has a name yet.
 struct EUNIT_OUTPUT {
     bool fCheckOpen;
     char *szOut;
@@ -175,8 +175,8 @@ int NameAppend(const char *szName, EUNIT_OUTPUT &output)
     if (output.fCheckOpen && !IsOpenable(szName)) {
         return 0;
     }
-    // Kept: the blank and the terminator do not count, so the last name may lose its blank, or its
-    // last letter too.
+    // Kept: this check ignores the blank and the terminator, so the last name may lose its blank,
+    // or its last letter as well.
     if (strlen(output.szOut) + strlen(szName) > output.cbOut) {
         NLIBCErrSetHere(ERR_BAD_FORMAT);
         return -1;
@@ -187,7 +187,7 @@ int NameAppend(const char *szName, EUNIT_OUTPUT &output)
     return 0;
 }
 
-// One host's list: "/dev/" and letters, again after each comma; anything else ends it.
+// One host's list is "/dev/" and letters, repeated after each comma; anything else ends it.
 int HostListAppend(const char *szList, EUNIT_OUTPUT &output)
 {
     const char *pch = szList;
@@ -228,7 +228,7 @@ int HostAppend(const char *szHost, EUNIT_OUTPUT &output)
     return HostListAppend(szList, output);
 }
 
-// What scandir hands out: an array of entries, each a block of its own.
+// The result of scandir: an array of entries, each allocated separately.
 struct DIRECTORY_ENTRIES {
     struct dirent **ppEntries = nullptr;
     int nEntry = 0;
