@@ -1,24 +1,25 @@
 // SPDX-License-Identifier: MIT
 #pragma once
 
-// Changing a disk's partition table with the system's partitioner. Nothing here sets a code of its
-// own: a program that ran and failed leaves the last-error record as it was, one that could not be
-// started what SpaceExecl says.
+// Changes a disk's partition table with the system's partitioner. Nothing here sets a code of its
+// own: when a program ran and failed, the last-error record is unchanged; when it could not be
+// started, the record is that of SpaceExecl.
 
 #include "nurocore/types.h"
 
 constexpr int PARTITION_KIND_SYSTEM = 1; // system and swap partitions
-constexpr int PARTITION_KIND_DATA = 2;   // alone, even when both bits are given
+constexpr int PARTITION_KIND_DATA = 2;   // takes precedence when both bits are given
 
 constexpr int PARTITION_CLEAN_SYSTEM = 1; // partitions 1 and 2
 constexpr int PARTITION_CLEAN_DATA = 2;   // partitions 3 to 128
 constexpr int PARTITION_CLEAN_ALL = 3;
 
-// Makes the partitions of a kind in the layout *pVersion; NULL takes the version the disk has, else
-// the machine's. Stops at the first command that fails. Returns 0 or -1.
+// Creates the partitions of a kind in layout version *pVersion; with NULL in the version that the
+// disk has, else in the machine's. Stops at the first command that fails. Returns 0 or -1.
 int PartitionCreate(const char *szDisk, int kind, const u32 *pVersion);
 
-// Deletes partitions. Returns 0 whatever the partitioner says, -1 for a NULL disk.
+// Deletes the partitions of a mode (PARTITION_CLEAN_*), then calls PartitionTableAdd. Returns 0
+// whether the partitioner succeeds or not, -1 for a NULL disk.
 int PartitionClean(const char *szDisk, int mode);
 
 // Writes an ms-dos signature. Returns 0 or -1.

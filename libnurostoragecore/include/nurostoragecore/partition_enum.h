@@ -11,6 +11,7 @@ struct PARTITION_ENUM_FILTER {
     u32 containerMask;    // DISK_CONTAINER_* to keep; 0 keeps all
 };
 
-// Adds "/dev/<name>" of every device that the filter (NULL: none) keeps to the list, which is put
-// in byte order first. Returns the number of items the list has then, or -1 (code of what failed).
+// Sorts the list in byte order, then adds "/dev/<name>" of every device that the filter keeps (NULL
+// keeps all). Returns the number of items that the list has then, or -1: no code for NULL or when
+// the kernel lists nothing, else the code of the call that failed.
 int PartitionPathEnum(const PARTITION_ENUM_FILTER *pFilter, PNLIBSZLIST *ppList);

@@ -10,7 +10,7 @@ constexpr u32 PARTITION_LAYOUT_NEWEST = 8;
 constexpr u64 PARTITION_NOT_FIXED = ~0ULL;
 
 struct PARTITION_PLACE {
-    u64 start; // PARTITION_NOT_FIXED when the disk decides
+    u64 start; // PARTITION_NOT_FIXED when it depends on the disk
     u64 size;
     u32 type; // MBR type code
 };
@@ -25,19 +25,21 @@ struct PARTITION_LAYOUT {
     u32 buildinStorage; // 1 for machines with built-in storage
 };
 
-// 1 when the model supports RAID, else 0. Asked once per process.
+// 1 when the model supports RAID, else 0. Read once per process.
 int IsSupportRaid();
 
-// The row of a version (0 is the newest) on this model, -1 when it has none.
+// The index of the table's row for a version (0 is the newest) on this model, -1 when there is
+// none.
 int PartitionLayoutIndexGet(u32 version, int raid);
 
-// A row of the table, NULL outside it.
+// A row of the table, NULL for an index outside it.
 const PARTITION_LAYOUT *PartitionLayoutAt(int row);
 
-// Where a partition of a disk lies. Returns 1, 0 when the disk has no such partition, -1 on
-// failure: ERR_BAD_PARAMETER, ERR_OPEN_FAILED, ERR_READ_FAILED.
+// The place of a partition on its disk. Returns 1, 0 when the disk has no such partition, -1 on
+// failure: ERR_BAD_PARAMETER for NULL, ERR_OPEN_FAILED, ERR_READ_FAILED, no code when
+// DiskDevicePartitionNameGet fails.
 int PartitionStartSizeGet(const char *szDisk, int partNum, u64 *pStart, u64 *pSize);
 
-// 1 when partitions 1 and 2 of the disk lie as in a row of the table, with its version in *pVersion
-// (may be NULL); 0 otherwise.
+// 1 when partitions 1 and 2 of the disk match a row of the table, with the row's version in
+// *pVersion (may be NULL); 0 otherwise.
 int PartitionCheckLayout(const char *szDisk, int raid, u32 *pVersion);

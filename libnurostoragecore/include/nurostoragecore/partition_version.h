@@ -5,9 +5,9 @@
 
 #include "nurocore/types.h"
 
-// The caller sets *pVersion to 0 before. Returns 0 with a version, or -1 (ERR_OUT_OF_MEMORY for
-// want of memory, else no code of its own). With fChooseBiggest the largest version of all data
-// disks decides, without it the first disk's.
+// The caller sets *pVersion to 0 first. The members of a running system array decide; without one
+// the largest version of all data disks with fChooseBiggest, else that of the first. Returns 0 with
+// a version, or -1 (ERR_OUT_OF_MEMORY when memory runs out, else no code of its own).
 int PartitionLayoutGetMax(u32 *pVersion, int fChooseBiggest);
 
 // PartitionLayoutGetMax without fChooseBiggest.

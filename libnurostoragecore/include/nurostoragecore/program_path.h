@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: MIT
 #pragma once
 
-// Where the programs are that change disks or tell of them. The appliance has them at these places;
-// nothing is looked up in PATH.
+// Paths of the programs that change disks or report on them. The appliance has them at these
+// places; PATH is not searched.
 
 inline constexpr char MDADM_PATH[] = "/sbin/mdadm";
 inline constexpr char SFDISK_PATH[] = "/sbin/sfdisk";

@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: MIT
 #pragma once
 
-// The state of an md array, asked of the driver. Nothing here changes it.
+// The state of an md array, as the driver reports it. Nothing here changes it.
 
 #include "nurocore/types.h"
 #include "nurostoragecore/raid_disk.h"
@@ -29,7 +29,7 @@ constexpr u32 REBUILD_WAITING = 2;
 
 struct RAID_REBUILD_STATUS {
     u32 state; // one of REBUILD_*
-    u64 done;  // both as the driver counts them, 0 when nothing runs
+    u64 done;  // both in the driver's unit, 0 when nothing runs
     u64 total;
 };
 
@@ -54,8 +54,8 @@ struct RAID_INFO {
 
 // The array behind "/dev/md%d". Returns 1 with a record that the caller frees with RAIDInfoFree, or
 // -1: ERR_BAD_PARAMETER, ERR_BAD_FORMAT for another path, ERR_OUT_OF_MEMORY, ERR_OPEN_FAILED, or
-// the code of the request that failed. 0 is reserved for an absent array, and callers are ready for
-// it, but it does not happen: a node without a running array gives -1 with ERR_SYSCALL_FAILED,
+// the code of the request that failed. 0 is reserved for an absent array, and callers handle it,
+// but it is never returned: a node without a running array gives -1 with ERR_SYSCALL_FAILED,
 // because RAIDIoctlInfo never leaves ERR_DEVICE_ABSENT.
 int RAIDInfoGet(const char *szMd, RAID_INFO **ppInfo);
 
@@ -72,10 +72,10 @@ void RAIDInfoFree(RAID_INFO *pInfo);
 //     RAIDIoctlStatus      | DEVICE_ABSENT      | INTERRUPTED        | SYSCALL_FAILED
 //     RAIDRebuildStatusGet | DEVICE_ABSENT      | SYSCALL_FAILED (!) | SYSCALL_FAILED
 //
-// (!) The two exceptions: RAIDIoctlInfo overwrites ERR_DEVICE_ABSENT, and neither size nor rebuild
-// tells an interruption from other failures. RAIDIoctlStatus gives ERR_SYSCALL_FAILED, too, for a
-// health that is none of the three. After a failure the size is 0 bytes, any other result
-// untouched.
+// (!) The exceptions: RAIDIoctlInfo overwrites ERR_DEVICE_ABSENT, and the requests for size and
+// rebuild do not distinguish an interruption from other failures. RAIDIoctlStatus also gives
+// ERR_SYSCALL_FAILED for a health that is none of the three. After a failure the size is 0 bytes,
+// any other result untouched.
 int RAIDIoctlInfo(int fd, mdu_array_info_t *pInfo);
 int RAIDIoctlSize(int fd, u64 *pcbArray);
 int RAIDIoctlStatus(int fd, u32 *pStatus);

@@ -11,6 +11,6 @@ int RAIDDiskSuperblockMdGet(const char *szDevice, int *pMd);
 // a free disk, -1 for NULL (no code).
 int RAIDDiskIsUsedByRAID(const char *szDisk, int *pMd);
 
-// Whether the array runs. Returns 1 or -1: ERR_BAD_PARAMETER, ERR_OPEN_FAILED, or the code of the
-// request; 0 is for an absent array, which the request reports as a failure.
+// Whether the array is running. Returns 1, or -1: ERR_BAD_PARAMETER, ERR_OPEN_FAILED, or the code
+// of the request. 0 is reserved for an absent array and never returned, see RAIDInfoGet.
 int RAIDIsDetected(const char *szMd);

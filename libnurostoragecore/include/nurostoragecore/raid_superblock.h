@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: MIT
 #pragma once
 
-// Which array a device belongs to, also when that array does not run: mdadm's examine report.
+// Which array a device belongs to, even when that array is not running: mdadm's examine report.
 
 #include "nurocore/types.h"
 #include "nurostoragecore/raid_info.h"
@@ -19,13 +19,13 @@ struct RAID_SUPERBLOCK {
     i32 events;
 };
 
-// Fills a record that the caller has zeroed with what the report on szDevice says. Returns 1, 0
-// when the device has no superblock (record untouched), -1 on failure (record unusable): bad
-// arguments, mdadm could not be started, a malformed line, or a read error before the end of the
-// report, half of which must not pass for an array without a UUID. Each failure is in the log; the
-// last-error record keeps what the start of mdadm left there, else it is untouched.
+// Fills a record, zeroed by the caller, from the report on szDevice. Returns 1, 0 when the device
+// has no superblock (record untouched), -1 on failure (record unusable): bad arguments, mdadm could
+// not be started, a malformed line, or a read error before the end of the report, since a partial
+// report must not be taken for that of an array without a UUID. Each failure is logged. The
+// last-error record has the code of a failed start of mdadm; other failures do not change it.
 int RAIDSuperblockGet(const char *szDevice, RAID_SUPERBLOCK *pSuperblock);
 
-// Takes one line of a report, which it cuts up, into the record. Returns 0, also for a line that
-// says nothing of use, or -1 for a malformed one.
+// Parses one line of a report into the record; szLine is modified. Returns 0, also for a line with
+// nothing of use, or -1 for a malformed one.
 int RAIDSuperblockLineParse(char *szLine, RAID_SUPERBLOCK *pSuperblock);

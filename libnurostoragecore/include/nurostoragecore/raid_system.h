@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: MIT
 #pragma once
 
-// A disk's share of the two system arrays. A pair is two records: the root array's, then the swap
+// A disk's state in the two system arrays. A pair is two records: the root array's, then the swap
 // array's.
 
 #include "nurocore/types.h"
@@ -10,9 +10,9 @@
 // Frees both records and sets both pointers to NULL; a NULL pair is ignored.
 void RAIDInfoPairFree(RAID_INFO **ppPair);
 
-// The disk's member state in each array, DISK_STATE_NONE where it is no member. Returns 1 when it
-// is in one of them at least, 0 when in neither, -1 with ERR_BAD_PARAMETER for a NULL pair, record
-// or disk.
+// The disk's member state in each array, DISK_STATE_NONE where it is not a member. Returns 1 when
+// it is in at least one of them, 0 when in neither, -1 with ERR_BAD_PARAMETER for NULL and for a
+// disk name of 128 characters or more.
 int RAIDSystemDiskStatusDetailGet(RAID_INFO *const *ppPair, const char *szDisk, u32 *pRootState,
                                   u32 *pSwapState);
 

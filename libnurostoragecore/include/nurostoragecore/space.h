@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: MIT
 #pragma once
 
-// The runner of tools that change disks. What such a tool writes to standard error is the record of
-// failed storage operations: one line a command in /var/log/space_operation_error.log.
+// Runs the tools that change disks. What such a tool writes to standard error is the record of
+// failed storage operations: one line per command in /var/log/space_operation_error.log.
 
 #include <cstdio>
 
@@ -14,11 +14,11 @@
 // asked about a stream that is NULL, and write over the code of the pipe stream.
 [[gnu::sentinel]] int SpaceExecl(const char *szPath, ...);
 
-// The same for a vector of the caller's, argv[0] the path, ended by NULL. A caller that tells of a
-// failed command makes its words of the same vector.
+// The same for a NULL-terminated vector that the caller owns, with the path in argv[0]. A caller
+// that logs a failed command makes the text from the same vector.
 int SpaceExecv(const char *const argv[]);
 
-// Reads the stream to its end and, when there was anything, appends a line with the time and
-// szCommand (NULL is an empty text). Returns 0, or -1: ERR_BAD_PARAMETER for a NULL stream, no code
-// when the log cannot be opened.
+// Reads the stream to its end and, unless it was empty, appends a line with the time, szCommand
+// (NULL is an empty text) and what was read to the log. Returns 0, or -1: ERR_BAD_PARAMETER for a
+// NULL stream, no code when the log cannot be opened.
 int SpaceErrorLog(FILE *pStream, const char *szCommand);

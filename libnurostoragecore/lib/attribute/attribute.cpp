@@ -13,7 +13,7 @@ ssize_t AttributeRead(const char *szFile, char *szText, size_t cbText)
     if (!fd) {
         return ATTRIBUTE_NOT_OPENED;
     }
-    // sysfs hands a line over in one piece; whatever else stands there may take several.
+    // sysfs returns a line in one read; a file of another kind may need several.
     size_t cbRead = 0;
     ssize_t cbMore = 1;
     const char *pchEnd = szText;

@@ -21,7 +21,7 @@ namespace
 constexpr int LINE_SIZE = 1024;
 constexpr int LV_PATH_SIZE = 256;
 constexpr int MOUNT_ENTRY_SIZE = 4096;
-// Whom -k killed gets time to end: until then the folder is in use.
+// Gives the processes that umount -k killed time to end: until then the mount point is in use.
 constexpr unsigned int UNMOUNT_PAUSE_SECONDS = 1;
 
 constexpr char MOUNTS_PATH[] = "/proc/mounts";
@@ -35,8 +35,8 @@ struct MOUNT_TABLE_DELETER {
 
 using MOUNT_TABLE_OWNER = std::unique_ptr<FILE, MOUNT_TABLE_DELETER>;
 
-// The last row that names the device; rows before it are dropped, so of several volumes the last
-// one is meant. Kept loose: a row of /dev/md20 names /dev/md2 too.
+// The last row that contains the device's path, so that the last of several volumes is used.
+// Kept: any part of a row matches, so a row of /dev/md20 counts for /dev/md2 too.
 bool LastRowGet(const char *szDevice, char *szRow)
 {
     const PIPE_OWNER pRows(NLIBCPopen(PVS_PATH, "r", "-o", "pv_name,vg_name,lv_name,origin",
@@ -91,7 +91,7 @@ int RowToLVPath(char *szRow, char *szOut, int cbOut)
 
 void RemoveWith(const char *szTool, const char *szTarget)
 {
-    // A result of -1 is on record already, by the runner.
+    // The runner has already recorded the reason for a result of -1.
     if (SpaceExecl(szTool, "-f", szTarget, nullptr) > 0) {
         NLIBCLog(LOG_ERR, "Failed to %s -f %s", szTool, szTarget);
     }
@@ -100,7 +100,7 @@ void RemoveWith(const char *szTool, const char *szTarget)
 void MountRemove(const struct mntent &entry)
 {
     if (NLIBCExecl(UMOUNT_PATH, "-R", "-A", "-k", entry.mnt_dir, nullptr) > 0) {
-        // Kept: the words are not the options.
+        // Kept: the message names other options than those used.
         NLIBCLog(LOG_ERR, "Failed to /bin/umount -f -k %s", entry.mnt_dir);
     }
     (void)sleep(UNMOUNT_PAUSE_SECONDS);

@@ -27,7 +27,7 @@ constexpr size_t PATH_SIZE = 128;
 constexpr size_t LISTED_PATH_SIZE = 64;
 constexpr int LISTED_LINE_SIZE = 257; // a line of at most 256 bytes
 
-// What the log says for a step that has no result of a command.
+// Logged in place of a command's result by steps that have none.
 constexpr int RESULT_TABLE_NOT_ADDED = 255;
 constexpr int RESULT_NO_KIND = -1;
 
@@ -45,7 +45,7 @@ OPTION SizeOption(const char *szName, u64 nSectors)
     return option;
 }
 
-// The table's own types are for the record; the model decides.
+// The types in the layout table are not used for this; the model decides.
 OPTION TypeOption(u32 typeWithoutRaid)
 {
     OPTION option;
@@ -80,7 +80,7 @@ int DataPartitionCreate(const char *szDisk, const PARTITION_LAYOUT &layout)
     const OPTION number = NumberOption(PARTITION_DATA);
     const OPTION gap = SizeOption("-j", layout.dataGap);
     const OPTION type = TypeOption(TYPE_LINUX);
-    // The empty argument is kept: the partitioner takes its place for an option's.
+    // Kept: the empty argument. The partitioner treats its position as that of an option.
     const char *const argv[] = {SFDISK_PATH, number.szText, "",          "-uS", "-q",   "-f",
                                 gap.szText,  "-z-1",        type.szText, "-F",  szDisk, nullptr};
     const int result = SpaceExecv(argv);
@@ -197,7 +197,7 @@ int PartitionClean(const char *szDisk, int mode)
     if (SpaceExecl(SFDISK_PATH, "--fast-delete", szRange, szDisk, nullptr) != 0) {
         NLIBCLog(LOG_DEBUG, "Failed to do '%s --fast-delete %s %s'", SFDISK_PATH, szRange, szDisk);
     }
-    // Whatever became of the partitions, the disk has a table afterwards if it can have one.
+    // Whether or not the partitions could be deleted, the disk should have a table afterwards.
     (void)PartitionTableAdd(szDisk);
     return 0;
 }

@@ -41,7 +41,7 @@ bool IsKept(const PARTITION_ENUM_FILTER *pFilter, const char *szName)
     return (container & pFilter->containerMask) != 0;
 }
 
-// The heading has four fields too and gives "/dev/name" without a filter; kept, callers filter.
+// Kept: the heading has four fields too and gives "/dev/name" without a filter; callers skip it.
 int LineAppend(const PARTITION_ENUM_FILTER *pFilter, const char *szLine, PNLIBSZLIST *ppFields,
                PNLIBSZLIST *ppList)
 {
@@ -52,7 +52,7 @@ int LineAppend(const PARTITION_ENUM_FILTER *pFilter, const char *szLine, PNLIBSZ
     }
     char szName[FIELD_SIZE];
     const char *const szField = NLIBCSzListGet(*ppFields, FIELD_NAME);
-    const size_t cchName = strlen(szField) - 1; // its last character is taken for the line's end
+    const size_t cchName = strlen(szField) - 1; // its last character is assumed to be the newline
     memcpy(szName, szField, cchName);
     szName[cchName] = '\0';
     if (!IsKept(pFilter, szName)) {

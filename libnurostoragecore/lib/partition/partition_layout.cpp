@@ -51,8 +51,8 @@ constexpr PARTITION_LAYOUT BuildinStorageRow(u32 version)
             .buildinStorage = 1};
 }
 
-// The product's own values, the odd ones too: there is no version 4, and 3 and 5 are without RAID
-// only. The first row that fits is taken.
+// These are the product's own values, including the irregular ones: there is no version 4, and
+// versions 3 and 5 exist without RAID only. The first row that matches is taken.
 constexpr std::array<PARTITION_LAYOUT, 14> LAYOUTS = {
     Row(1, 0, 63, 273042, 787185, 273042),
     Row(2, 0, 63, 4980087, 1044225, 257040),

@@ -25,7 +25,8 @@ constexpr int RAID_MACHINE = 1;
 constexpr int DATA_MD_LAST = 99;
 constexpr char SYSTEM_MEMBERS_PATTERN[] = "/sys/block/md0/md/dev-*";
 
-// A member of the system array is always partition 1: its name less one character is the disk's.
+// A member of the system array is always partition 1, so its name without the last character is the
+// disk's.
 void MemberDiskName(const char *szMember, char *szDisk)
 {
     const char *const pchDash = strrchr(szMember, '-'); // the pattern has one
@@ -34,8 +35,8 @@ void MemberDiskName(const char *szMember, char *szDisk)
     szDisk[cchDisk == 0 ? 0 : cchDisk - 1] = '\0';
 }
 
-// The running system array knows best: the first member with a known layout decides; no layout has
-// the version 0.
+// The first member of the running system array that has a known layout decides. 0 is no layout's
+// version, so it means that no member has one.
 void VersionOfMembers(const glob_t &members, u32 *pVersion)
 {
     for (size_t i = 0; i < members.gl_pathc; i++) {
@@ -50,7 +51,7 @@ void VersionOfMembers(const glob_t &members, u32 *pVersion)
     }
 }
 
-// Counts on a RAID machine only as a disk of a data array.
+// On a RAID machine a disk counts only if a data array uses it.
 bool IsCounted(const char *szDisk)
 {
     int nMd = 0;
@@ -87,8 +88,8 @@ u32 VersionOfDisks(const NLIBSZLIST *pDisks, int fChooseBiggest)
 
 int VersionWithoutArray(u32 *pVersion, int fChooseBiggest)
 {
-    // Before the disks are looked for: a lookup that fails leaves its code in the last-error
-    // record, and callers print what stands there in the end.
+    // Read before the disks are listed: a failed lookup leaves its code in the last-error record,
+    // and callers print the code that is there at the end.
     (void)IsSupportRaid();
     PNLIBSZLIST pDisks = NLIBCSzListAlloc(LIST_SIZE);
     const LIST_OWNER owner(&pDisks);

@@ -58,8 +58,8 @@ void CommentSkip(FILE *pFile)
     }
 }
 
-// Two shapes of the md driver's reports are straightened out: "active(auto-read-only)" is two
-// words, and the second has its parenthesis again.
+// The md driver's reports may have "active(auto-read-only)", which is read as two words; the second
+// gets its opening parenthesis back here.
 void WordFixUp(WORD &word)
 {
     constexpr char READ_ONLY_TORN[] = "auto-read-only)";
@@ -70,8 +70,8 @@ void WordFixUp(WORD &word)
 }
 
 // The next word of the stream: blanks, tabs and new lines end one, '#' begins a comment up to the
-// line's end, quotes group blanks and are dropped. False at the end of the stream and without
-// memory.
+// line's end, quotes group blanks and are dropped. False at the end of the stream and when memory
+// runs out.
 bool WordRead(FILE *pFile, WORD &word)
 {
     word = {};
@@ -82,7 +82,7 @@ bool WordRead(FILE *pFile, WORD &word)
             ch = '\n';
         }
         if (ch == '\n') {
-            chQuote = 0; // an odd quote spoils its own line alone
+            chQuote = 0; // an unmatched quote affects its own line only
         }
         const bool fSeparator = chQuote == 0 && (ch == ' ' || ch == '\t' || ch == '\n');
         const bool fTorn = chQuote == 0 && ch == '(' && EndsInActive(word);

@@ -5,7 +5,7 @@
 
 inline constexpr i32 MAJOR_UNKNOWN = -1;
 
-// The major number that the kernel gave the partitionable md driver, by the block devices of
-// /proc/devices; MAJOR_UNKNOWN when it is not there, or cannot be read. Nothing is logged, and the
-// last-error record is left alone.
+// The major number of the partitionable md driver among the block devices of /proc/devices;
+// MAJOR_UNKNOWN when it is not listed or the file cannot be read. Nothing is logged, and the
+// last-error record is not changed.
 i32 MdpMajorRead();

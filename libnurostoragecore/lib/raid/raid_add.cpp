@@ -14,7 +14,7 @@ namespace
 constexpr size_t COMMAND_TEXT_SIZE = 512;
 constexpr u32 LEVELS_WITH_REDUNDANCY = RAID_LEVEL_1 | RAID_LEVEL_5 | RAID_LEVEL_6 | RAID_LEVEL_10;
 
-// Runs the command; a failed one is told in its own words.
+// Runs the command; if it fails, logs its words and result.
 int AddCommandRun(const char *const argv[])
 {
     const int result = SpaceExecv(argv);

@@ -23,7 +23,7 @@ constexpr int SLOT_SIZE = 64;
 constexpr int ACTION_SIZE = 128;
 constexpr int DISK_NAME_SIZE = 64;
 
-// By SYNC_ACTION_*.
+// Indexed by SYNC_ACTION_*.
 constexpr const char *SYNC_ACTIONS[] = {"idle",  "frozen", "reshape", "resync",
                                         "check", "repair", "recover"};
 
@@ -62,7 +62,7 @@ int SlotGet(const char *szDir, i32 *pSlot)
     char szSlot[SLOT_SIZE];
     const ssize_t cbRead = AttributeRead(szFile, szSlot, SLOT_SIZE);
     if (cbRead == ATTRIBUTE_NOT_OPENED) {
-        // Kept: no code here, callers see the one that stood before.
+        // Kept: no code is set here, callers see the previous one.
         NLIBCLog(LOG_ERR, "failed to fopen %s, errno=%m", szFile);
         return -1;
     }
@@ -92,7 +92,8 @@ int MembersCollect(const glob_t &matches, RAID_DISK **ppDisks)
     return 0;
 }
 
-// Partition numbers aside. A name that is too long is told and equal to nothing, itself included.
+// Ignores partition numbers. A name that is too long is logged and matches nothing, not even
+// itself.
 bool IsSameDisk(const char *szPath, const char *szWanted)
 {
     char szDisk[DISK_NAME_SIZE];
@@ -135,7 +136,7 @@ int RAIDDiskStatusGet(const char *szDir, u32 *pState)
     if (AttrRead(szDir, "state", szState) != 0) {
         return -1;
     }
-    // The order decides a text of several words.
+    // A text of several words is decided by the order of these tests.
     if (Holds(szState, "faulty")) {
         *pState = DISK_STATE_FAILED;
     } else if (!Holds(szState, "write_error") && Holds(szState, "error")) {
@@ -269,7 +270,7 @@ int RAIDSyncActionGet(int nMd, int *pAction)
     }
     const size_t cchLine = strlen(szAction);
     const size_t cchWord = cchLine == 0 ? 0 : cchLine - 1;
-    // Kept: a prefix of a word is that word, so a line of its end alone is idle.
+    // Kept: a prefix of a word counts as that word, so an empty line is idle.
     for (int i = 0; i <= SYNC_ACTION_RECOVER; i++) {
         if (strncmp(szAction, SYNC_ACTIONS[i], cchWord) == 0) {
             *pAction = i;

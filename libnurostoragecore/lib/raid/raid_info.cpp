@@ -35,9 +35,8 @@ struct SYNC_STATUS {
 constexpr unsigned long MD_GET_SYNC_STATUS = _IOR(MD_MAJOR, 0x60, SYNC_STATUS);
 constexpr unsigned long MD_GET_ARRAY_STATUS = _IOR(MD_MAJOR, 0x61, i32);
 
-// Each platform builds the numbers from its own direction bits: 2 in the highest two bits, or 2 (on
-// one 1) in a field of three. The size of a size_t goes into one of them, though it always moves 64
-// bits.
+// The direction bits of a request number depend on the platform. The number of BLKGETSIZE64
+// contains the size of a size_t, though the request always returns 64 bits.
 constexpr u32 DIRECTION_READ = static_cast<u32>(_IOC_READ) << static_cast<u32>(_IOC_DIRSHIFT);
 static_assert(DIRECTION_READ == 0x80000000 || DIRECTION_READ == 0x40000000);
 static_assert(sizeof(SYNC_STATUS) == 24 && sizeof(mdu_array_info_t) == 72);
@@ -81,7 +80,7 @@ i32 MdpMajorGet()
     return mdpMajor;
 }
 
-// KiB used on each member. The driver's own field has 32 bits; beyond them sysfs knows.
+// KiB used on each member. The driver's own field has 32 bits; larger sizes are read from sysfs.
 u64 DeviceSizeKiB(int fd, const mdu_array_info_t &array, u64 arraySize)
 {
     constexpr u64 FIELD_LIMIT = 0xFFFFFFFF;
@@ -105,7 +104,7 @@ void GeometryStore(const mdu_array_info_t &array, RAID_INFO *pInfo)
     pInfo->nSpareDisks = array.spare_disks;
 }
 
-// The members are those of the path that was opened: the record's copy may be cut.
+// The members are looked up by szMd, the path that was opened: the record's copy may be truncated.
 int InfoFill(const char *szMd, int fd, RAID_INFO *pInfo)
 {
     mdu_array_info_t array = {};
@@ -123,8 +122,8 @@ int InfoFill(const char *szMd, int fd, RAID_INFO *pInfo)
     }
     const u64 nKiB = DeviceSizeKiB(fd, array, pInfo->arraySize);
     pInfo->deviceSize = HasDeviceSize(pInfo->level) ? nKiB * BYTES_PER_KIB : 0;
-    // Kept: a failed rebuild query is told in the words of the member list, a failed health query
-    // in those of the size.
+    // Kept: a failed rebuild query is logged with the message of the member list, a failed health
+    // query with that of the size.
     if (RAIDDiskListGet(szMd, &pInfo->pDisks) != 0 ||
         RAIDRebuildStatusGet(fd, &pInfo->rebuild) != 0) {
         NLIBCLog(LOG_DEBUG, "Failed to get disk list for /dev/md%d, errno=0X%X", pInfo->nMd,
@@ -196,7 +195,8 @@ int RAIDIoctlInfo(int fd, mdu_array_info_t *pInfo)
         return -1;
     }
     if (errno == ENODEV) {
-        // Kept: overwritten below, so an inactive array is a failure to all callers, not absent.
+        // Kept: overwritten below, so all callers see an inactive array as a failure, not as
+        // absent.
         NLIBCErrSetHere(ERR_DEVICE_ABSENT);
     }
     NLIBCLog(LOG_DEBUG, "Failed to ioctl for raid status, errno=%m");
@@ -239,7 +239,7 @@ int RAIDIoctlStatus(int fd, u32 *pStatus)
         NLIBCErrSetHere(ERR_SYSCALL_FAILED);
         return -1;
     }
-    // By what the driver answers.
+    // Indexed by the driver's answer.
     constexpr u32 STATUSES[] = {RAID_STATUS_NORMAL, RAID_STATUS_DEGRADE, RAID_STATUS_CRASHED};
     if (health < 0 || static_cast<size_t>(health) >= std::size(STATUSES)) {
         NLIBCLog(LOG_DEBUG, "unknown raid status, status=%d", health);
@@ -277,7 +277,7 @@ int RAIDRebuildStatusGet(int fd, RAID_REBUILD_STATUS *pRebuild)
 
 u64 RAIDComponentSizeGet(int fd)
 {
-    constexpr unsigned int MDP_MINOR_SHIFT = 6; // 64 minors an array, its partitions' among them
+    constexpr unsigned int MDP_MINOR_SHIFT = 6; // 64 minors per array, partitions included
     struct stat status = {};
     if (fstat(fd, &status) != 0) {
         return 0;

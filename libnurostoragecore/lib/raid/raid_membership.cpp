@@ -18,7 +18,8 @@ namespace
 constexpr int PARTITION_PATH_SIZE = 128;
 constexpr int DATA_PARTITIONS[] = {3, 5};
 
-// Superblocks of whole disks count from this number up; lower ones are left from other uses.
+// The superblock of a whole disk counts only with an array number from here up; lower numbers are
+// left over from earlier uses of the disk.
 constexpr int WHOLE_DISK_MD_FIRST = 101;
 
 bool IsMemberBySuperblock(const char *szDevice, int *pMd)

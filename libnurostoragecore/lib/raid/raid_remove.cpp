@@ -33,14 +33,14 @@ bool StopRetried(const char *szMd)
             return true;
         }
         NLIBCLog(LOG_ERR, "Fail to stop [%s], try again", szMd);
-        // After the last attempt too: scripts that look at the array next count on the pause.
+        // After the last attempt too: scripts that look at the array next rely on the pause.
         (void)sleep(STOP_PAUSE_SECONDS);
     }
     NLIBCLog(LOG_ERR, "Reach RAID stop retry limit");
     return false;
 }
 
-// Numbers 1 and 2 belong to the system arrays and are never examined, whatever they carry.
+// Numbers 1 and 2 belong to the system arrays and are never examined, whatever they contain.
 bool IsDataPartition(const char *szPath)
 {
     char szDisk[DISK_NAME_SIZE];
@@ -48,7 +48,8 @@ bool IsDataPartition(const char *szPath)
            DiskPartitionNumGet(szPath, szDisk, DISK_NAME_SIZE) > LAST_SYSTEM_PARTITION;
 }
 
-// An empty UUID is a value like any other: what reports none belongs to an array that has none.
+// An empty UUID is compared like any other: a partition that reports none belongs to an array that
+// has none.
 int WipeMatching(const NLIBSZLIST *pKeys, const NLIBHASH *pUuidHash, const char *szUuid)
 {
     for (int i = 0; i < pKeys->nItem; i++) {
@@ -138,7 +139,7 @@ int RAIDUUIDHashForRemoveGet(PNLIBHASH *ppUuidHash)
         const char *const szPartition = NLIBCSzListGet(pPartitions, i);
         RAID_SUPERBLOCK superblock = {};
         if (IsDataPartition(szPartition) && RAIDSuperblockGet(szPartition, &superblock) == 1) {
-            // A partition that does not fit in is not wiped; the others still are.
+            // A partition that does not fit into the map is not wiped; the others still are.
             (void)NLIBCHashSet(ppUuidHash, szPartition, superblock.szUuid);
         }
     }
@@ -198,8 +199,8 @@ int RAIDRemove(const RAID_INFO *pInfo, PNLIBHASH pUuidHash)
         NLIBCLog(LOG_ERR, "Bad parameters");
         return -1;
     }
-    // Read before the stop: it takes the running array to tell its members. They are asked as the
-    // driver tells no UUID, so the record of a query has none.
+    // Read before the stop, because only a running array lists its members. The driver does not
+    // report a UUID, so a queried record has none and a member's superblock is read.
     char szUuid[RAID_UUID_SIZE];
     (void)snprintf(szUuid, sizeof(szUuid), "%s", pInfo->szUuid);
     const bool fUuid = szUuid[0] != '\0' || RAIDUUIDGet(pInfo->szPath, szUuid, RAID_UUID_SIZE) == 1;

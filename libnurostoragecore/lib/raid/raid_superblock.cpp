@@ -39,7 +39,7 @@ int VersionTake(char *szValue, RAID_SUPERBLOCK *pSuperblock)
     return 0;
 }
 
-// A remark in parentheses may follow the UUID; the blank before it goes too.
+// A remark in parentheses may follow the UUID; it is cut off together with the blank before it.
 int UuidTake(char *szValue, RAID_SUPERBLOCK *pSuperblock)
 {
     char *const pchRemark = strchr(szValue, '(');
@@ -176,7 +176,7 @@ int RAIDSuperblockGet(const char *szDevice, RAID_SUPERBLOCK *pSuperblock)
         result = 1;
     }
     if (feof(pReport.get()) == 0) {
-        // Half a report would pass for one of an array without a UUID.
+        // A partial report could be taken for that of an array without a UUID.
         NLIBCLog(LOG_ERR, "Fail to read the report of mdadm -E %s", szDevice);
         return -1;
     }

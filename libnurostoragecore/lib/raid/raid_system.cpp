@@ -25,7 +25,7 @@ bool IsPairValid(RAID_INFO *const *ppPair, const char *szDisk)
     return true;
 }
 
-// 1 or 0 as RAIDDiskListSearch, and the state that goes with it.
+// Returns the result of RAIDDiskListSearch, with the member's state, if any, in *pState.
 int MemberStateGet(const RAID_INFO *pInfo, const char *szDisk, u32 *pState)
 {
     RAID_DISK *pMember = nullptr;

@@ -3,6 +3,6 @@
 
 #include <cstddef>
 
-// The words of a command as logs tell them: the arguments up to a NULL with a blank between, each
-// cut at cchArgumentMax characters, the whole where the buffer of cbText bytes ends.
+// Writes a command to szText as it is logged: the arguments up to a NULL, separated by blanks, each
+// truncated to cchArgumentMax characters, the whole text to the buffer of cbText bytes.
 void CommandTextBuild(const char *const argv[], size_t cchArgumentMax, char *szText, size_t cbText);

@@ -21,18 +21,18 @@ constexpr size_t ERROR_TEXT_SIZE = 2048;
 constexpr size_t LOG_LINE_SIZE = 2048;
 constexpr size_t TIME_STAMP_SIZE = 32;
 
-// What does not fit is left out of the text, not of the command.
+// Only the text is truncated if it does not fit, not the command that is run.
 void CommandLogText(const char *const argv[], char *szText)
 {
     CommandTextBuild(argv, COMMAND_TEXT_SIZE, szText, COMMAND_TEXT_SIZE);
-    // Kept: where the buffer ends behind an argument, its blank goes too.
+    // Kept: when the text is cut right after a blank, that blank is dropped as well.
     if (strlen(szText) == COMMAND_TEXT_SIZE - 1 && szText[COMMAND_TEXT_SIZE - 2] == ' ') {
         szText[COMMAND_TEXT_SIZE - 2] = '\0';
     }
 }
 
-// The first ERROR_TEXT_SIZE - 1 bytes as one line; the rest is read too, so that the tool never
-// waits for a reader. Returns false when there was nothing.
+// The first ERROR_TEXT_SIZE - 1 bytes as one line. The rest is read too, so that the tool never
+// blocks on a full pipe. Returns false when there was nothing.
 bool ErrorTextRead(FILE *pStream, char *szText)
 {
     size_t cchText = 0;
@@ -94,9 +94,9 @@ int SpaceExecv(const char *const argv[])
     }
     char szCommand[COMMAND_TEXT_SIZE];
     CommandLogText(argv, szCommand);
-    // execv takes the vector so, and does not write.
+    // execv takes the vector without const, but does not write to it.
     FILE *const pStream = NLIBCPopenV(argv[0], "rE", const_cast<char *const *>(argv));
-    // The log is a record, not a judge: the tool's own status decides.
+    // A failure to log is not a failure of the command: the tool's own status decides.
     (void)SpaceErrorLog(pStream, szCommand);
     return NLIBCPclose(pStream);
 }
