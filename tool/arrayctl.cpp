@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: MIT
 //
-// The command line: words in, words out. What is meant for people goes to standard output, what is
-// meant for developers to syslog, nothing to standard error.
+// The command line. Output for people goes to standard output, output for developers to syslog, and
+// nothing to standard error.
 #include "hwcontrol/disk_name.h"
 #include "hwcontrol/disk_path.h"
 #include "hwcontrol/disk_port.h"
@@ -58,9 +58,9 @@ int Usage()
 
 // --- status ------------------------------------------------------------------------------------
 
-// Kept: every word of the report lives in a field of 16 bytes, so its first 15 characters are
-// printed. The numbers of a running rebuild never show, and a crashing member's word ends early;
-// scripts compare with the words as they are.
+// Kept: every word of the report is limited to a field of 16 bytes, so at most 15 characters are
+// printed. The progress of a running rebuild is never shown, and a crashing member's word is cut
+// short; scripts compare with the words as they are printed.
 constexpr int WORD_FIELD_SIZE = 16;
 constexpr int WORD_LENGTH_MAX = WORD_FIELD_SIZE - 1;
 
@@ -110,7 +110,8 @@ void DisksPrint(const RAID_DISK *pDisks)
 {
     const char *szWord = "";
     for (const RAID_DISK *pDisk = pDisks; pDisk != nullptr; pDisk = pDisk->pNext) {
-        // Kept: one word field serves all members, so an unknown state shows the one before it.
+        // Kept: all members share one word field, so an unknown state shows the previous member's
+        // word.
         szWord = WordOf(DISK_WORDS, pDisk->state, szWord);
         (void)printf("\t [%s: %.*s]\n", pDisk->szPath, WORD_LENGTH_MAX, szWord);
     }
@@ -144,14 +145,14 @@ int StatusReport(const char *szMd)
 
 // --- destroy -----------------------------------------------------------------------------------
 
-// LVM that could not be removed may still hold the array: time for it to let go before the stop.
+// LVM that could not be removed may still hold the array; the pause gives it time to let go.
 constexpr unsigned int LVM_FAILED_PAUSE_SECONDS = 3;
 
-// Always 0: callers that need to know look at the array afterwards.
+// Always returns 0; callers that need to know the outcome look at the array afterwards.
 int ArrayDestroy(const char *szMd)
 {
     if (LVMRmLVPath(szMd) < 0) {
-        // Kept: this is said when the removal has failed, not when it went well.
+        // Kept: printed when the removal has failed, not when it has succeeded.
         (void)printf("Found LVM on %s, remove it \n", szMd);
         (void)sleep(LVM_FAILED_PAUSE_SECONDS);
     }
@@ -165,25 +166,25 @@ int ArrayDestroy(const char *szMd)
     return STATUS_OK;
 }
 
-// --- what the commands over all disks share ----------------------------------------------------
+// --- shared by the commands that work on all disks ---------------------------------------------
 
-// What becomes of a disk; the exit status of the child that decided it.
+// What is to be done with a disk; also the exit status of the child that decides it.
 constexpr int FORMAT_NONE = 0;         // left alone
-constexpr int FORMAT_WIPE = 1;         // all partitions go
-constexpr int FORMAT_KEEP_DATA = 2;    // the system partitions are renewed
-constexpr int FORMAT_UNRECOGNISED = 4; // as KEEP_DATA, unless some other disk keeps its data
+constexpr int FORMAT_WIPE = 1;         // all partitions are deleted
+constexpr int FORMAT_KEEP_DATA = 2;    // only the system partitions are made anew
+constexpr int FORMAT_UNRECOGNISED = 4; // as KEEP_DATA if no other disk keeps its data
 
 constexpr int PARTITION_SYSTEM = 1;
 constexpr int PARTITION_SWAP = 2;
 
 constexpr char FORCE_CLEAN_MARKER[] = "/.force_clean_all_disk";
 
-// The one pair of versions between which an upgrade keeps the data partitions.
+// The only pair of versions between which an upgrade keeps the data partitions.
 constexpr u32 UPGRADE_FROM_VERSION = 7;
 constexpr u32 UPGRADE_TO_VERSION = 8;
 constexpr u32 ALWAYS_WIPED_VERSION = 1;
 
-// One disk's child, and what its exit status has decided.
+// The child process of one disk, and the decision in its exit status.
 struct DISK_CHILD {
     pid_t pid;
     int type;
@@ -191,12 +192,12 @@ struct DISK_CHILD {
 
 constexpr pid_t NO_CHILD = -1;
 
-// A phase over all disks ends for this process with an exit status (a child's, or the parent's when
-// it cannot fork), or the parent goes on. A child returns through its callers, which release its
-// copies of their lists, and main ends it.
+// A function that forks a child per disk returns the exit status that this process has to end with
+// (in a child, and in a parent that cannot fork), else GOES_ON. A child returns through its
+// callers, which free its copies of their lists, and ends in main.
 constexpr int GOES_ON = -1;
 
-// Tells the log when there was no memory for a list of disks.
+// Logs that there was no memory for a list of disks.
 bool IsAllocated(const NLIBSZLIST *pDisks)
 {
     if (pDisks == nullptr) {
@@ -218,7 +219,7 @@ bool DisksEnum(PNLIBSZLIST *ppDisks)
     return true;
 }
 
-// One entry a disk, none of them with a child. NULL without memory.
+// One entry per disk, none of them with a child. NULL when memory runs out.
 DISK_CHILD *ChildrenAlloc(int nDisk)
 {
     const auto nEntry = static_cast<size_t>(std::max(nDisk, 1));
@@ -229,7 +230,7 @@ DISK_CHILD *ChildrenAlloc(int nDisk)
     return pChildren;
 }
 
-// What a disk needs to carry the system partitions of the wanted layout.
+// What has to be done with a disk so that it has the system partitions of the wanted layout.
 int DiskFormatTypeGet(const char *szDisk, u32 wanted)
 {
     constexpr int RAID_MACHINE = 1;
@@ -245,7 +246,7 @@ int DiskFormatTypeGet(const char *szDisk, u32 wanted)
     for (const int partNum : {PARTITION_SYSTEM, PARTITION_SWAP}) {
         u64 start = 0;
         u32 type = 0;
-        // Both are asked for, whatever the first answer is.
+        // Both are queried, whatever the first answer is.
         fSystem =
             PartitionGeometryGet(partNum, disk.sz, &start, &type) != PARTITION_ABSENT || fSystem;
     }
@@ -274,7 +275,7 @@ int DecideInChild(const char *szDisk, u32 version)
     return type;
 }
 
-// Starts the child of one disk. Returns false when it cannot be.
+// Forks the child of one disk. Returns false when that fails.
 bool ChildStart(DISK_CHILD &child)
 {
     child.pid = NLIBCForkCloseIo();
@@ -289,7 +290,7 @@ int DecideStart(const NLIBSZLIST *pDisks, u32 version, DISK_CHILD *pChildren)
 {
     for (int i = 0; i < pDisks->nItem; i++) {
         if (!ChildStart(pChildren[i])) {
-            return STATUS_FAILED; // the children already started are left to themselves
+            return STATUS_FAILED; // children already started are not waited for
         }
         if (pChildren[i].pid == 0) {
             return DecideInChild(NLIBCSzListGet(pDisks, i), version);
@@ -300,7 +301,7 @@ int DecideStart(const NLIBSZLIST *pDisks, u32 version, DISK_CHILD *pChildren)
 
 constexpr int CHILD_LOST = -1;
 
-// The exit status of a disk's child, CHILD_LOST when it has none.
+// Waits for a disk's child. Returns its exit status, CHILD_LOST when there is none.
 int ChildWait(pid_t pid, const char *szDisk)
 {
     int status = 0;
@@ -324,11 +325,11 @@ int ShellExitStatus(int result)
 // Partition paths with a blank after each, as many as there is room for.
 struct MEMBER_LIST {
     char sz[MEMBER_LIST_SIZE];
-    int nPartition; // those left out among them
+    int nPartition; // including those left out
     int nLeftOut;
 };
 
-// Whole or not at all: half a partition's path is often the path of a whole disk.
+// Appends the path whole or not at all: a truncated one is often the path of a whole disk.
 void MemberAppend(const char *szDisk, int partNum, MEMBER_LIST &members)
 {
     char szPartition[DEVICE_PATH_SIZE] = "";
@@ -339,7 +340,7 @@ void MemberAppend(const char *szDisk, int partNum, MEMBER_LIST &members)
     members.nLeftOut += NLIBCStrAppendWhole(members.sz, sizeof(members.sz), szEntry) == 1 ? 0 : 1;
 }
 
-// The command goes on with fewer partitions than it counts, so mdadm refuses it.
+// A create command still runs, with fewer partitions than its -n says, and mdadm refuses it.
 void LeftOutTell(int nLeftOut, int nPartition)
 {
     if (nLeftOut > 0) {
@@ -351,7 +352,7 @@ void LeftOutTell(int nLeftOut, int nPartition)
 // --- initsys, initsys-dd -----------------------------------------------------------------------
 
 constexpr int CHILD_PARTITIONED = 1;
-// Whoever looks at new devices may still hold the fresh partitions; mdadm wants them free.
+// Programs that probe new devices may still have the new partitions open; mdadm needs them free.
 constexpr unsigned int ARRAY_PAUSE_SECONDS = 3;
 constexpr size_t MISSING_TEXT_SIZE = 256;
 constexpr size_t DUPLICATE_COMMAND_SIZE = 512;
@@ -409,7 +410,7 @@ int PartitionStart(const NLIBSZLIST *pDisks, u32 version, std::span<DISK_CHILD> 
     return GOES_ON;
 }
 
-// The disks whose partitions stand, as members of the two system arrays.
+// The disks that were partitioned successfully, as members of the two system arrays.
 struct SYSTEM_MEMBERS {
     int nDisk;
     MEMBER_LIST system;
@@ -420,7 +421,8 @@ void SystemDiskTake(const char *szDisk, int nSlot, SYSTEM_MEMBERS &members)
 {
     const DEVICE_PATH disk = DevicePathOf(szDisk);
     if (members.nDisk >= nSlot) {
-        // One too many: it must not look like a member of an array that it is not in.
+        // There are more disks than slots: this one must not look like a member of an array that
+        // it is not in.
         (void)PartitionZeroSuperblock(disk.sz, PARTITION_SYSTEM);
         (void)PartitionZeroSuperblock(disk.sz, PARTITION_SWAP);
         return;
@@ -442,7 +444,7 @@ void PartitionCollect(const NLIBSZLIST *pDisks, const DISK_CHILD *pChildren, int
     }
 }
 
-// Appends the partitions of a list that have room, each with its blank. Returns how many have.
+// Appends the partitions of a list that fit, each with its blank. Returns how many did.
 int MembersAppend(const MEMBER_LIST &members, char *szText, size_t cbText)
 {
     int nTaken = 0;
@@ -456,7 +458,7 @@ int MembersAppend(const MEMBER_LIST &members, char *szText, size_t cbText)
     return nTaken;
 }
 
-// What the duplication tool makes of the partitions does not change the outcome.
+// A failure of the duplication tool is printed, but does not change the exit status.
 void PartitionsDuplicate(const SYSTEM_MEMBERS &members)
 {
     char szCommand[DUPLICATE_COMMAND_SIZE] = "";
@@ -476,8 +478,8 @@ void PartitionsDuplicate(const SYSTEM_MEMBERS &members)
     }
 }
 
-// The system arrays carry the old superblock format. Kept: compared over the given path's length,
-// so whatever the two paths begin with counts too.
+// The system arrays use the old superblock format.
+// Kept: compared over the length of the given path, so any prefix of the two paths matches too.
 const char *MetadataOption(const char *szMd)
 {
     const size_t cchMd = strlen(szMd);
@@ -515,7 +517,7 @@ int SystemRaidCreate(const char *szMd, int nDisk, int nSlot, const char *szMembe
     return 0;
 }
 
-// The arrays are attempted; the partitions alone decide the outcome.
+// Creating the arrays is best effort; the exit status depends only on whether there are members.
 int SystemArraysCreate(const SYSTEM_MEMBERS &members, int nSlot)
 {
     if (members.nDisk == 0) {
@@ -583,7 +585,7 @@ struct LEVEL_MARKER {
     int level;
 };
 
-// The first one that is there decides.
+// The first marker that exists decides.
 constexpr LEVEL_MARKER LEVEL_MARKERS[] = {
     {"/tmp/raid.0", 0},
     {"/tmp/raid.1", 1},
@@ -620,7 +622,7 @@ bool DataPartitionRenew(const char *szDisk)
     return true;
 }
 
-// Prepares the disks one after the other; the first that fails ends it. Returns how many are
+// Prepares the disks one after the other and stops at the first failure. Returns how many are
 // members, -1 on failure.
 int DataMembersPrepare(const NLIBSZLIST *pDisks, MEMBER_LIST &members)
 {
@@ -695,7 +697,7 @@ int DataVolumeCreate(int argc)
 
 constexpr size_t NUMBERS_TEXT_SIZE = 4096;
 constexpr size_t NUMBER_TEXT_SIZE = 16;
-constexpr int STATUS_PUSH_FAILED = -1; // 255 to whoever started the tool
+constexpr int STATUS_PUSH_FAILED = -1; // the tool's caller sees 255
 
 struct FORMAT_LISTS {
     PNLIBSZLIST pAll;
@@ -742,11 +744,11 @@ void NumbersBuild(const NLIBSZLIST *pDisks, char *szNumbers)
     }
 }
 
-// Prints the numbers and returns how many; one is also the status of a failure, and callers tell
-// them apart by what is printed.
+// Prints the numbers and returns how many there are. 1 is also the status of a failure; callers
+// distinguish the two by what is printed.
 int FormatAllPrint(const FORMAT_LISTS &lists, bool fDualHeadInstall)
 {
-    // Without any disk that keeps its data, all are formatted, the unrecognised ones too.
+    // If no disk keeps its data, all are formatted, including the unrecognised ones.
     const NLIBSZLIST *const pChosen = lists.pKeepData->nItem > 0 ? lists.pFormatAll : lists.pAll;
     char szNumbers[NUMBERS_TEXT_SIZE];
     NumbersBuild(pChosen, szNumbers);
@@ -793,11 +795,11 @@ int FormatAllDisksEnum(bool fDualHeadInstall)
 
 // --- dispatch ----------------------------------------------------------------------------------
 
-// What a command says about its RAID ID.
+// How a command takes a RAID ID.
 enum class RAID_ID {
-    NONE,            // it takes none; further arguments are its own business
-    EXACTLY_ONE,     // anything else is answered with the usage
-    ONE_AND_IGNORED, // without one, it says so; further arguments are ignored
+    NONE,            // not at all; the command checks further arguments itself
+    EXACTLY_ONE,     // any other number of arguments prints the usage
+    ONE_AND_IGNORED, // a missing one prints a message and the usage; more are ignored
 };
 
 struct COMMAND {
