@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: MIT
 #pragma once
 
-// The two requests that the appliance's md driver has more than the stock one, and what it would
-// answer for a device. Knows nothing of who asks, nor how.
+// The two requests that the appliance's md driver has in addition to those of the stock one, and
+// what it would answer for a device. Independent of who asks, and how.
 
 #include "md_health.h"
 
@@ -19,10 +19,10 @@ constexpr std::uint32_t MD_GET_ARRAY_STATUS = _IOR(MD_MAJOR, 0x61, std::int32_t)
 
 struct MD_ANSWER {
     unsigned char data[sizeof(MD_SYNC_STATUS)];
-    std::size_t cb; // so many bytes of it
+    std::size_t cb; // how many bytes of data are used
 };
 
 // What the driver answers to one of the two requests on a block device. Returns 1 with the answer
-// filled, 0 when the device is no md array and the request none of ours, -1 when it is one of the
-// md driver's that does not run: the driver then fails with ENODEV.
+// filled in, 0 when the device is not an md array and the request not for the md driver, -1 when it
+// is an md array that is not running: the driver then fails with ENODEV.
 int MdAnswerGet(dev_t device, std::uint32_t request, MD_ANSWER *pAnswer);

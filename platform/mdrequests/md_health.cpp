@@ -15,7 +15,7 @@ namespace
 
 enum class LOSS_RULE { NONE, ALL_BUT_ONE, FIXED, LAYOUT };
 
-// How many members each level can lose and still hand out all of its data.
+// How many members each level can lose and still return all of its data.
 struct LEVEL_RULE {
     const char *szLevel;
     LOSS_RULE rule;
@@ -31,10 +31,11 @@ constexpr LEVEL_RULE LEVEL_RULES[] = {
 
 constexpr LEVEL_RULE UNKNOWN_LEVEL = {"", LOSS_RULE::NONE, 0};
 
-// In these states the driver has members at most, but serves no data.
+// In these states the array may have members, but serves no data.
 constexpr const char *STOPPED_STATES[] = {"", "clear", "inactive"};
 
-// The driver's words while no thread works on the array. "frozen" holds work back on purpose.
+// The values of sync_action while no thread works on the array. "frozen" holds work back on
+// purpose.
 constexpr const char *IDLE_ACTIONS[] = {"", "idle", "frozen"};
 
 constexpr std::size_t PATH_SIZE = 256;
@@ -46,7 +47,7 @@ bool IsOneOf(const char *szWord, const char *const (&words)[N])
                        [szWord](const char *sz) { return std::strcmp(sz, szWord) == 0; });
 }
 
-// During a reshape the driver writes "new (old)"; the number in front is the one that counts.
+// During a reshape the driver writes "new (old)"; the first number is the one that counts.
 int NumberGet(const char *szText)
 {
     return static_cast<int>(std::clamp(std::strtol(szText, nullptr, 10), 0L, long{INT_MAX}));
@@ -67,10 +68,11 @@ const LEVEL_RULE &LevelRuleGet(const char *szLevel)
     return UNKNOWN_LEVEL;
 }
 
-// RAID10 bears the loss of any members as long as one copy of every chunk is left. Its layout holds
-// the number of near copies in bits 0 to 7 and of far copies in bits 8 to 15, and the copies of a
-// chunk lie on near x far neighbouring slots. Chunks start at every near-th slot, wrapping round at
-// the end when the slots are no multiple of it; so it is enough to walk those starts once round.
+// RAID10 tolerates the loss of any members as long as one copy of every chunk is left. Its layout
+// holds the number of near copies in bits 0 to 7 and of far copies in bits 8 to 15, and the copies
+// of a chunk lie on near x far neighbouring slots. Chunks start at every near-th slot, wrapping at
+// the end when the number of slots is not a multiple of it; so it is enough to visit each of those
+// starts once.
 bool Raid10HoldsAllChunks(const MD_ATTRIBUTES *pAttributes)
 {
     const int nSlots = SlotCountGet(pAttributes);
@@ -112,7 +114,7 @@ bool BearsLoss(const MD_ATTRIBUTES *pAttributes, int nLost)
     return false;
 }
 
-// Levels without redundancy have no "degraded" file; their slots tell.
+// Levels without redundancy have no "degraded" file; their slots are counted.
 int LostCountGet(const MD_ATTRIBUTES *pAttributes)
 {
     if (pAttributes->szDegraded[0] != '\0') {
@@ -122,8 +124,8 @@ int LostCountGet(const MD_ATTRIBUTES *pAttributes)
     return static_cast<int>(std::count(pAttributes->fInSync, pAttributes->fInSync + nSlots, false));
 }
 
-// A start that is a number is where a resync would go on: it is due, though no thread has begun,
-// as on an array that nobody has written to since it was assembled.
+// A resync_start that is a number is where a resync would continue: one is due, though no thread
+// has begun it, as on an array that has not been written to since it was assembled.
 bool IsResyncPending(const MD_ATTRIBUTES *pAttributes)
 {
     return pAttributes->szSyncAction[0] != '\0' && pAttributes->szResyncStart[0] >= '0' &&
@@ -201,9 +203,9 @@ int MdAttributesRead(const char *szMdDir, MD_ATTRIBUTES *p)
     AttributeRead(szMdDir, "sync_completed", p->szSyncCompleted, sizeof(p->szSyncCompleted));
     AttributeRead(szMdDir, "resync_start", p->szResyncStart, sizeof(p->szResyncStart));
     SlotsRead(szMdDir, p);
-    // An array that is stopped meanwhile leaves empty texts, which look like one in good health.
-    // Its state is there before the others and goes with them, so what counts is the state at the
-    // end.
+    // If the array is stopped while it is read, empty texts remain, which look like a healthy
+    // array. The state file appears before the others and disappears with them, so the state is
+    // read again at the end.
     (void)StateRead(szMdDir, p);
     return 0;
 }
@@ -238,8 +240,8 @@ MD_SYNC_STATUS MdSyncStatusGet(const MD_ATTRIBUTES *pAttributes)
         !IsOneOf(pAttributes->szSyncAction, IDLE_ACTIONS) || IsResyncPending(pAttributes) ? 1 : 0;
     if (status.activity != 0 &&
         std::sscanf(pAttributes->szSyncCompleted, "%llu / %llu", &done, &total) == 2) {
-        // The driver renews this number only every few seconds, and it begins at 0. A done of 0
-        // would say that the resync waits, but one that waits has no numbers at all.
+        // The driver updates this number only every few seconds, starting from 0. A done of 0 would
+        // mean that the resync is waiting, but a waiting one has no numbers at all.
         status.done = std::max(done, 1ULL);
         status.total = total;
     }

@@ -4,14 +4,14 @@
 // What the stock md driver publishes of an array in sysfs, turned into the two answers that the
 // appliance's own driver gives directly: the array's health and the progress of its resync.
 //
-// The attributes are text in, the answers are records out; reading the files is one function,
-// with the folder as its argument, so that a test can lay out an array without a driver.
+// Attributes are text, answers are records. Reading the files is one function that takes the
+// directory as its argument, so that a test can describe an array without a driver.
 
 #include <cstddef>
 #include <cstdint>
 
-// Slots beyond this are taken as in sync; the driver's 0.90 format ends at 27, real machines far
-// below it.
+// Slots beyond this count as in sync. The 0.90 format has 27 slots, and real machines stay far
+// below this number.
 constexpr int MD_MAX_SLOTS = 512;
 
 // Values of the health request.
@@ -23,7 +23,7 @@ constexpr std::int32_t MD_HEALTH_CRASHED = 2;
 struct MD_SYNC_STATUS {
     std::uint64_t activity; // 0 idle, 1 something runs, is delayed or is pending
     std::uint64_t done;     // 512-byte sectors; 0 while it waits
-    std::uint64_t total;    // 512-byte sectors; 0 when the driver does not tell it
+    std::uint64_t total;    // 512-byte sectors; 0 when the driver does not report it
 };
 
 // One array as its attribute files describe it. A file that is missing leaves an empty text: the
@@ -41,8 +41,8 @@ struct MD_ATTRIBUTES {
 };
 
 // Reads the attributes below szMdDir, e.g. "/sys/dev/block/9:0/md". Returns 0, or -1 when there is
-// no array_state file, which means no array at all. One that goes away during the call is left
-// with an empty state, in which nothing runs.
+// no array_state file, which means no array at all. One that disappears during the call is left
+// with an empty state, which counts as not running.
 int MdAttributesRead(const char *szMdDir, MD_ATTRIBUTES *pAttributes);
 
 // True when the state is one in which the driver serves the array.

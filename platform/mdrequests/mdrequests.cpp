@@ -3,10 +3,11 @@
 //   mdrequests PROGRAM [ARGUMENT...]
 //
 // Runs a program as on the appliance, whose md driver has two requests more than the stock one. The
-// kernel holds the program, and whatever it starts, at these two and nowhere else.
+// kernel suspends the program, and whatever it starts, at these two requests and nowhere else.
 //
-// This process becomes the program, so that its number, its signals and its end are its own. A
-// server that is nobody's child answers the requests, until the last of the programs has ended.
+// This process becomes the program, so that the program has the process ID, the signals and the
+// exit status of a direct start. A detached server answers the requests until the last of the
+// programs has ended.
 #include "request_filter.h"
 #include "request_server.h"
 
@@ -24,7 +25,7 @@
 namespace
 {
 
-// As env, nohup and timeout have them.
+// The same as those of env, nohup and timeout.
 constexpr int STATUS_FAILED = 125;
 constexpr int STATUS_NOT_EXECUTABLE = 126;
 constexpr int STATUS_NOT_FOUND = 127;
@@ -43,9 +44,9 @@ int ComplainOfKernel()
     return STATUS_FAILED;
 }
 
-// --- the listener on its way from the program to the server ------------------------------------
+// --- passing the listener from the program to the server ---------------------------------------
 
-// A descriptor travels beside a message, which has a byte at least.
+// A descriptor is sent along with a message, which must have at least one byte.
 struct LETTER {
     char byte;
     iovec data;
@@ -76,7 +77,7 @@ bool ListenerSend(int fdSocket, int fdListener)
     return sendmsg(fdSocket, &letter.message, MSG_NOSIGNAL) == 1;
 }
 
-// -1: the other side has none to send.
+// Returns -1 when the other side sent none.
 int ListenerReceive(int fdSocket)
 {
     LETTER letter;
@@ -96,11 +97,12 @@ int ListenerReceive(int fdSocket)
 
 constexpr int FD_SOCKET = STDERR_FILENO + 1;
 
-// Out of everybody's way: whoever reads what the program writes must see its end, its terminal may
-// close, and the folder that it works in may go. What is left open is the socket, as FD_SOCKET.
+// Lets go of all that the program uses: a reader of its output must see the end of it, its terminal
+// may close, and its working directory may be removed. Only the socket is left open, as FD_SOCKET,
+// besides three streams on /dev/null.
 bool PlaceLeave(int fdSocket)
 {
-    // Where the three streams were closed, the socket may lie in the place of one.
+    // If one of the three streams was closed, the socket may have its number.
     const int fdKept = fcntl(fdSocket, F_DUPFD, FD_SOCKET);
     const int fdNull = open("/dev/null", O_RDWR);
 
@@ -113,7 +115,7 @@ bool PlaceLeave(int fdSocket)
            chdir("/") == 0 && setsid() >= 0;
 }
 
-// Ends when there is nobody left who could ask.
+// Ends when no process is left that could make a request.
 [[noreturn]] void ServerBecome(int fdSocket)
 {
     if (!PlaceLeave(fdSocket)) {
@@ -128,8 +130,8 @@ bool PlaceLeave(int fdSocket)
     _exit(EXIT_SUCCESS);
 }
 
-// The child between the two ends at once, so that the program has no child it does not know of.
-// Returns the socket that takes the listener, or -1 with errno.
+// The intermediate child ends at once, so that the program has no child that it does not know of.
+// Returns the socket through which the listener is sent, or -1 with errno.
 int ServerStart()
 {
     int sockets[2];
@@ -159,7 +161,7 @@ int ServerStart()
 
 // --- the program -------------------------------------------------------------------------------
 
-// Returns 0, or the status to end with. Under another mdrequests the requests have their answers
+// Returns 0, or the status to exit with. Under another mdrequests the requests are answered
 // already, and the server that was started for this one ends.
 int RequestsHandOver()
 {

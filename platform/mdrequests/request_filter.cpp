@@ -21,7 +21,7 @@ struct IOCTL_CALL {
     std::uint32_t number;
 };
 
-// The call by each of its names: a kernel may run programs of more than one kind.
+// ioctl in each system call interface, since a kernel may run programs of more than one.
 #if defined(__x86_64__)
 constexpr IOCTL_CALL IOCTL_CALLS[] = {
     {AUDIT_ARCH_X86_64, 16},
@@ -49,7 +49,7 @@ constexpr std::uint32_t REQUEST = offsetof(seccomp_data, args[1]) + LOW_WORD;
 
 constexpr std::size_t STEPS_A_CALL = 4;
 constexpr std::size_t STEPS_OF_CALLS = STEPS_A_CALL * (sizeof(IOCTL_CALLS) / sizeof(*IOCTL_CALLS));
-// The end: let it pass; is it one of the two; let it pass; notify.
+// The last six: allow; load the request and compare it with the two; allow; notify.
 constexpr std::size_t STEPS = STEPS_OF_CALLS + 6;
 
 struct FILTER {
@@ -66,8 +66,8 @@ constexpr std::uint16_t LOAD = BPF_LD | BPF_W | BPF_ABS;
 constexpr std::uint16_t EQUAL = BPF_JMP | BPF_JEQ | BPF_K;
 constexpr std::uint16_t RETURN = BPF_RET | BPF_K;
 
-// Looks at nothing but the kind of program and the call's number before it knows that it is an
-// ioctl: so the kernel remembers for every other call that it passes, and runs no filter for it.
+// Looks at nothing but the architecture and the call's number until it knows that the call is an
+// ioctl: so the kernel can remember that every other call is allowed and run no filter for it.
 constexpr FILTER FilterMake()
 {
     FILTER filter = {};
@@ -100,8 +100,8 @@ int FilterSet()
         syscall(SYS_seccomp, SECCOMP_SET_MODE_FILTER, SECCOMP_FILTER_FLAG_NEW_LISTENER, &program));
 }
 
-// Linux 5.9 has both: it puts descriptors into other programs, and it tells a listener that nobody
-// is left. The first can be asked for without harm, as no notification has the number 0 yet.
+// Linux 5.9 brought two things: adding descriptors to other programs, and reporting to a listener
+// that no program is left. The first can be tried without harm, as no notification has the ID 0.
 bool IsNewEnough(int fdListener)
 {
     seccomp_notif_addfd addfd = {};
@@ -116,7 +116,7 @@ int RequestFilterInstall()
 {
     int fdListener = FilterSet();
 
-    // Who is not root may filter only programs that cannot become it.
+    // Without root, only programs that cannot gain privileges may be filtered.
     if (fdListener < 0 && errno == EACCES && prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0) == 0) {
         fdListener = FilterSet();
     }

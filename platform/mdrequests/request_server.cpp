@@ -15,7 +15,7 @@
 namespace
 {
 
-// The kernel writes as much as its own version of the message has; a newer one may have more.
+// The kernel writes its own version of the message, which may be longer in a newer kernel.
 constexpr std::size_t MESSAGE_SIZE = 1024;
 
 union MESSAGE {
@@ -24,8 +24,9 @@ union MESSAGE {
     unsigned char space[MESSAGE_SIZE];
 };
 
-// The process's folder in /proc stands for this very process: once the request is known to wait
-// still, nothing that is reached through the folder can be another's, whoever gets the number next.
+// An open directory of /proc stays bound to its process. Once the request is known to be waiting
+// still, nothing reached through the directory can belong to another process, even if the process
+// ID is used again.
 int TaskOpen(int fdListener, const seccomp_notif *pRequest)
 {
     char szTask[32];
@@ -39,8 +40,8 @@ int TaskOpen(int fdListener, const seccomp_notif *pRequest)
     return fdTask;
 }
 
-// Looks at what the descriptor stands for without holding it: a copy would keep the array busy for
-// a moment after the program has closed it.
+// Looks at the descriptor's file without holding it open: a copy would keep the array busy for a
+// moment after the program has closed it.
 bool DeviceGet(int fdTask, int fdAsked, dev_t *pDevice)
 {
     struct stat info;
@@ -66,7 +67,8 @@ int AnswerWrite(int fdTask, std::uint64_t address, const MD_ANSWER *pAnswer)
     return cb == static_cast<ssize_t>(pAnswer->cb) ? 0 : EFAULT;
 }
 
-// What only the kernel can answer (no descriptor, no array) goes on to it, as if nobody listened.
+// What only the kernel can answer (no descriptor, no array) is passed on to it, as if there were no
+// listener.
 void ResponseMake(int fdTask, const seccomp_notif *pRequest, seccomp_notif_resp *pResponse)
 {
     dev_t device;
@@ -100,7 +102,7 @@ void RequestServe(int fdListener)
     MESSAGE request = {};
     MESSAGE reply = {};
 
-    // The kernel wants a message of zeros, and it says so when the program is gone already.
+    // The kernel requires a zeroed message. The call fails when the program has already ended.
     if (ioctl(fdListener, SECCOMP_IOCTL_NOTIF_RECV, &request) != 0) {
         return;
     }

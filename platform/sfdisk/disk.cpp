@@ -13,7 +13,7 @@
 namespace
 {
 
-// Whoever probes a disk holds its lock for a moment; five seconds are somebody who stays.
+// A program that probes a disk holds its lock only for a moment, not for five seconds.
 constexpr int LOCK_TRIES = 250;
 constexpr timespec LOCK_PAUSE = {0, 20'000'000};
 
@@ -59,7 +59,7 @@ int DiskOpen(const char *szPath, bool fWrite, DISK *pDisk)
     struct stat status = {};
 
     pDisk->szPath = szPath;
-    // Looked at before it is opened: opening a tape, a pipe or a terminal is not harmless.
+    // Checked before it is opened: opening a tape, a pipe or a terminal is not harmless.
     if (stat(szPath, &status) != 0) {
         return Complain("cannot open %s: %s", szPath, strerror(errno));
     }
@@ -78,7 +78,7 @@ int DiskClaim(DISK *pDisk)
     if (!pDisk->fBlock) {
         return 0;
     }
-    // An exclusive opener of a partition counts as one of the whole disk, too.
+    // A partition that is open exclusively makes this fail, too.
     pDisk->claim.reset(DESCRIPTOR{open(pDisk->szPath, O_RDONLY | O_EXCL | O_CLOEXEC)});
     if (!pDisk->claim) {
         return Complain(errno == EBUSY ? "%s is in use" : "cannot claim %s", pDisk->szPath);

@@ -46,9 +46,9 @@ struct DISK {
 };
 
 // Opens the disk and holds the advisory lock of the whole disk until the program ends, shared
-// to read it and exclusive to change it. Everything that scans disks keeps away meanwhile.
+// to read it and exclusive to change it. Programs that scan disks respect that lock.
 int DiskOpen(const char *szPath, bool fWrite, DISK *pDisk);
 
-// Makes sure that nobody uses the disk, as a whole or one of its partitions, and that nobody
-// begins to before the program ends.
+// Makes sure that neither the whole disk nor one of its partitions is in use, and that this stays
+// so until the program ends. Does nothing for an image file.
 int DiskClaim(DISK *pDisk);

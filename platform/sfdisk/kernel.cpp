@@ -16,9 +16,9 @@
 namespace
 {
 
-// A partition that was let go of a moment ago, or that somebody only looks at, is free soon.
+// A partition that has just been released, or is only being probed, will be free soon.
 constexpr int DROP_TRIES = 50;
-// The node is there at once where the kernel makes it, and soon where a program does.
+// The node exists at once when the kernel makes it, and soon when a program does.
 constexpr int NODE_TRIES = 250;
 constexpr timespec PAUSE = {0, 20'000'000};
 
@@ -76,7 +76,7 @@ bool AttributeNumberRead(const char *szFolder, const char *szPartition, const ch
     return true;
 }
 
-// False for the folders that are no partition, and for one that vanishes while it is read.
+// False for directories that are not partitions, and for one that disappears while it is read.
 bool KernelPartitionRead(const char *szFolder, const char *szName, KERNEL_PARTITION *pItem)
 {
     char szDevice[NAME_SIZE];
@@ -115,8 +115,9 @@ int KernelListRead(const DISK *pDisk, PARTITION_LIST *pList)
     return 0;
 }
 
-// What the kernel makes of an entry: cut at the end of the disk, and of an extended partition
-// only the sectors where its chain begins, so that nobody formats it. 0: nothing at all.
+// The size that the kernel gives an entry's partition: cut at the end of the disk, and for an
+// extended partition only the sectors where its chain begins, so that nobody formats it. 0 when the
+// kernel makes no partition of the entry.
 u64 KernelSizeGet(const TABLE *pTable, const PARTITION &partition)
 {
     if (partition.start >= pTable->sectors) {
@@ -126,7 +127,7 @@ u64 KernelSizeGet(const TABLE *pTable, const PARTITION &partition)
     return partition.fContainer ? std::min(sectors, std::max<u64>(pTable->unit, 2)) : sectors;
 }
 
-// The size of an extended partition says nothing: it depends on the kernel's version.
+// The size of an extended partition is not compared: it depends on the kernel's version.
 bool IsSame(const TABLE *pTable, const PARTITION &known, const PARTITION *pPlanned)
 {
     return pPlanned && known.start == pPlanned->start &&
@@ -243,7 +244,7 @@ int KernelDrop(const DISK *pDisk, const TABLE *pTable, const PARTITION_LIST *pPl
                                            : "the kernel does not let go of partition %d of %s",
                             item.number, pDisk->szPath);
         }
-        (void)PartitionPush(&forgotten, item); // as large as the list it comes from
+        (void)PartitionPush(&forgotten, item); // has the capacity of the list it comes from
     }
     return 0;
 }

@@ -1,15 +1,15 @@
 // SPDX-License-Identifier: MIT
 #pragma once
 
-// What the kernel knows of the partitions of a disk, changed one partition at a time, so that
-// the others may be in use. Both do nothing for an image file.
+// Changes the kernel's own list of a disk's partitions one partition at a time, so that the others
+// may be in use. Both functions do nothing for an image file.
 
 #include "table.h"
 
-// Makes the kernel forget every partition that the plan does not have, or has elsewhere. When one
-// of them is in use the kernel gets those back that it had forgotten already: all or nothing.
+// Removes from the kernel every partition that the plan does not have, or has at another place. All
+// or nothing: when one of them is in use, those already removed are added again.
 int KernelDrop(const DISK *pDisk, const TABLE *pTable, const PARTITION_LIST *pPlan);
 
-// Tells the kernel of every partition of the plan that it does not know, and waits until their
-// nodes are in /dev.
+// Adds to the kernel every partition of the plan that it does not know, and waits until their nodes
+// are in /dev.
 int KernelAdd(const DISK *pDisk, const TABLE *pTable, const PARTITION_LIST *pPlan);

@@ -43,7 +43,7 @@ struct COMMAND_RULE {
     unsigned allowed;
 };
 
-// Nothing but digits of the base: no sign, no blank, no 0x, and no overflow.
+// Accepts only digits of the base: no sign, no blank, no 0x, and no overflow.
 bool NumberRead(const char *szText, int base, u64 max, u64 *pValue)
 {
     if (!isxdigit(static_cast<unsigned char>(szText[0])) || strpbrk(szText, "xX")) {
@@ -89,7 +89,7 @@ bool OptionSizeRead(const char *szValue, REQUEST *pRequest)
            pRequest->sectors != 0;
 }
 
-// These entries are no home for data: an empty slot, a protective entry, extended partitions.
+// Types that are not data partitions: an empty slot, extended partitions, a protective entry.
 bool OptionTypeRead(const char *szValue, REQUEST *pRequest)
 {
     constexpr u32 TYPES_REFUSED[] = {0x00, 0x05, 0x0f, 0x85, 0xee};
@@ -126,8 +126,8 @@ bool OptionRangeRead(const char *szValue, REQUEST *pRequest)
            pRequest->firstDeleted <= pRequest->lastDeleted;
 }
 
-// Quiet, force and -F change nothing here: this program prints nothing but failures, asks
-// nothing, and always has its work on the disk when it ends.
+// -q, -f and -F are accepted without effect: this program prints nothing but failures, asks
+// nothing, and always has its changes on the disk before it ends.
 constexpr OPTION OPTIONS[] = {
     {"-M1", OPTION_SIGN, VALUE_NONE, nullptr},
     {"--fast-delete", OPTION_DELETE, VALUE_NEXT, OptionRangeRead},

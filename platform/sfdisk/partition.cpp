@@ -36,7 +36,7 @@ int PartitionPush(PARTITION_LIST *pList, const PARTITION &partition)
 
 int Complain(const char *szFormat, ...)
 {
-    // One write for the whole line: several partitioners run side by side on one terminal.
+    // One write for the whole line: several partitioners may run at once on one terminal.
     char szLine[512];
     va_list args;
     va_start(args, szFormat);

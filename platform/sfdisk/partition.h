@@ -1,17 +1,17 @@
 // SPDX-License-Identifier: MIT
 #pragma once
 
-// What the partitioner knows of the partitions of one disk, and how it reports a failure.
+// The record of a disk's partitions, and how the partitioner reports a failure.
 
 #include <cstdint>
 
 using u32 = std::uint32_t;
 using u64 = std::uint64_t;
 
-// All counts are 512-byte sectors, the unit of sysfs, whatever the disk's own sector is.
+// All counts are 512-byte sectors, the unit of sysfs, whatever the disk's own sector size is.
 constexpr u64 SECTOR_SIZE = 512;
 
-// The kernel gives no disk more partitions than this.
+// The kernel makes no more partitions than this on a disk.
 constexpr int PARTITION_MAX = 256;
 
 struct PARTITION {
@@ -31,9 +31,9 @@ struct PARTITION_LIST {
 const PARTITION *PartitionFind(const PARTITION_LIST *pList, int number);
 const PARTITION *PartitionAtSector(const PARTITION_LIST *pList, u64 sector);
 
-// Returns 0, or 1 after a line when the list is full.
+// Returns 0, or 1 after a message when the list is full.
 int PartitionPush(PARTITION_LIST *pList, const PARTITION &partition);
 
-// Writes the one line that a failure is worth to standard error and returns 1, the status that
-// the program ends with. Every int function of the partitioner answers 0, or 1 after this line.
+// Writes one line about a failure to standard error and returns 1, the program's exit status. Every
+// int function of the partitioner returns 0, or 1 after such a line.
 [[gnu::format(printf, 1, 2)]] int Complain(const char *szFormat, ...);

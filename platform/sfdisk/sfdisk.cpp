@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: MIT
 //
 // The appliance's partitioner: makes, deletes and shows single entries of an ms-dos table.
-// Every command checks all it can before the first change; what it refuses changes nothing.
+// Every command checks all it can before the first change; one that is refused changes nothing.
 #include "disk.h"
 #include "kernel.h"
 #include "options.h"
@@ -34,8 +34,9 @@ int MsdosRequire(const DISK *pDisk, const TABLE *pTable)
                : Complain("%s has no ms-dos partition table", pDisk->szPath);
 }
 
-// The kernel forgets first and learns last, so that it never has a partition open that the table
-// on the disk does not name. A run that is cut short leaves a table that the next run mends.
+// The kernel drops partitions before the table is written and adds partitions after it, so that it
+// never offers one that is not in the table on the disk. A run that is cut short leaves a table
+// that the next run repairs.
 int Commit(const DISK *pDisk, const TABLE *pTable)
 {
     PARTITION_LIST plan = {};
@@ -46,8 +47,8 @@ int Commit(const DISK *pDisk, const TABLE *pTable)
     return KernelAdd(pDisk, pTable, &plan);
 }
 
-// An entry may reach over the end (of a disk that lost sectors, for instance), but not begin there
-// or on the table itself.
+// An entry may extend beyond the end of the disk (one that lost sectors, for instance), but must
+// not begin there or at the table itself.
 bool EntryIsValid(const TABLE *pTable, const PARTITION &entry)
 {
     return entry.type != 0 && entry.start != 0 && entry.start < pTable->sectors;
@@ -76,8 +77,8 @@ int CommandSign(DISK *pDisk, TABLE *pTable, const REQUEST *)
     if (pTable->label == TABLE_MSDOS && EntriesPrune(pTable, &nKept) != 0) {
         return 1;
     }
-    // With nothing to keep the disk starts over, so that no trace of its old life turns up among
-    // the new partitions; then nobody may be using it.
+    // With nothing to keep, the disk gets a new table and loses its old signatures, so that none of
+    // them turns up in the new partitions; it must not be in use then.
     if (nKept == 0 && (DiskClaim(pDisk) != 0 || TableRenew(pTable) != 0)) {
         return 1;
     }
@@ -85,7 +86,8 @@ int CommandSign(DISK *pDisk, TABLE *pTable, const REQUEST *)
     return Commit(pDisk, pTable);
 }
 
-// Where the new partition begins. The sector before the first partition is the table.
+// Where the new partition begins: counted from the end of the one before it, the first partition
+// from the start of the disk.
 int StartGet(const DISK *pDisk, const REQUEST *pRequest, const PARTITION_LIST *pList, u64 *pStart)
 {
     u64 before = 0;
@@ -145,7 +147,7 @@ int CommandCreate(DISK *pDisk, TABLE *pTable, const REQUEST *pRequest)
     if (MsdosRequire(pDisk, pTable) != 0 || TableRead(pTable, &list) != 0) {
         return 1;
     }
-    // Never replaced, not even by the same: who means to lose a partition deletes it first.
+    // A partition is never replaced, not even by an equal one; it has to be deleted first.
     if (PartitionFind(&list, made.number)) {
         return Complain("partition %d of %s exists already", made.number, pDisk->szPath);
     }
@@ -166,7 +168,7 @@ int CommandDelete(DISK *pDisk, TABLE *pTable, const REQUEST *pRequest)
     if (MsdosRequire(pDisk, pTable) != 0 || TableRead(pTable, &list) != 0) {
         return 1;
     }
-    // From the last to the first, since logical partitions move down when one before them goes.
+    // From the last to the first, since deleting a logical partition renumbers those after it.
     for (int i = list.nItem - 1; i >= 0; i--) {
         const int number = list.items[i].number;
         if (number >= pRequest->firstDeleted && number <= pRequest->lastDeleted &&

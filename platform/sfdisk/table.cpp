@@ -35,7 +35,7 @@ struct FDISK_TYPE_DELETER {
 using FDISK_PARTITION_OWNER = std::unique_ptr<fdisk_partition, FDISK_PARTITION_DELETER>;
 using FDISK_TYPE_OWNER = std::unique_ptr<fdisk_parttype, FDISK_TYPE_DELETER>;
 
-// libfdisk answers 0, or a negative error number.
+// libfdisk returns 0, or a negative error number.
 int FdiskCheck(const TABLE *pTable, int result, const char *szWhat)
 {
     if (result == 0) {
@@ -112,7 +112,7 @@ int PartitionRead(const TABLE *pTable, size_t slot, PARTITION *pPartition)
     return 0;
 }
 
-// libfdisk moves what it is given to places that it likes better, or so it may.
+// libfdisk may move a partition to a place that it prefers.
 int TableAddVerify(const TABLE *pTable, const PARTITION &wanted)
 {
     PARTITION_LIST list = {};
@@ -221,7 +221,7 @@ int TableAdd(TABLE *pTable, const PARTITION &partition)
     if (!pNew || !pType) {
         return Complain("out of memory");
     }
-    // Without this libfdisk refuses all that begins before the first mebibyte.
+    // Without this libfdisk refuses partitions that begin before the first mebibyte.
     fdisk_set_first_lba(pContext, 1);
     fdisk_parttype_set_code(pType.get(), static_cast<int>(partition.type));
     fdisk_partition_set_type(pNew.get(), pType.get());

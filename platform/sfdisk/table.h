@@ -9,7 +9,7 @@
 
 enum TABLE_LABEL {
     TABLE_NONE,    // nothing that the kernel would take for a partition table
-    TABLE_MSDOS,   // ours
+    TABLE_MSDOS,   // the only kind that is changed
     TABLE_FOREIGN, // GPT and the like, also an ms-dos table that only protects a GPT
 };
 
@@ -28,29 +28,30 @@ struct TABLE {
     u64 sectors;     // of the whole disk
     u64 unit;        // sectors of 512 bytes in one sector of the disk: 1, or 8
     bool fChanged;   // TableWrite has a table to write
-    bool fFindGhost; // TableWrite looks for the headers that an earlier GPT left
+    bool fFindGhost; // TableWrite wipes the headers that an earlier GPT left
 };
 
 int TableOpen(const DISK *pDisk, bool fWrite, TABLE *pTable);
 
-// The partitions as they stand in memory, the logical ones from 5 up. The type of a partition
-// whose label knows no ms-dos types is that of the protective entry, ee.
+// The partitions as they are in memory, the logical ones numbered from 5 up. A partition whose
+// label has no ms-dos types gets the type of the protective entry, ee.
 int TableRead(const TABLE *pTable, PARTITION_LIST *pList);
 
-// Starts over with an empty ms-dos table. TableWrite will wipe all that other programs take for
-// a signature of the whole disk.
+// Starts over with an empty ms-dos table. TableWrite will wipe everything that other programs take
+// for a signature of the whole disk.
 int TableRenew(TABLE *pTable);
 
-// The number is 1 to 4; the place is free and the disk has it (TableRoomGet).
+// The caller has made sure that the number is 1 to 4 and that the place is free and below
+// TableRoomGet.
 int TableAdd(TABLE *pTable, const PARTITION &partition);
 
-// Deleting an extended partition deletes the logical ones in it; deleting a logical one gives
-// those behind it the next lower number.
+// Deleting an extended partition deletes the logical ones in it; deleting a logical one lowers the
+// number of each one after it by 1.
 int TableDelete(TABLE *pTable, int number);
 
-// The first sector that no entry can name any more: the end of the disk, or 2 TiB on a disk with
+// The first sector that no entry can address any more: the end of the disk, or 2 TiB on a disk with
 // 512-byte sectors (an entry counts in 32 bits), whichever comes first.
 u64 TableRoomGet(const TABLE *pTable);
 
-// All is on the disk, not only in memory, when this returns.
+// When this returns, everything is on the disk, not only in memory.
 int TableWrite(const TABLE *pTable);
