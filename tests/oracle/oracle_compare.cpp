@@ -273,9 +273,7 @@ void ErrorLogCompare(const ORACLE_ANSWER &answer, const ORACLE_SEEN &seen, TEXTS
     BagCompare(ORACLE_ERROR_LOG_PATH, expected, seen.errorLog, differences);
 }
 
-} // namespace
-
-std::vector<std::string> OracleDifferences(const ORACLE_ANSWER &answer, const ORACLE_SEEN &seen)
+TEXTS AnswerCompare(const ORACLE_ANSWER &answer, const ORACLE_SEEN &seen)
 {
     const ORACLE_ANSWER expected = AnswerAsSeen(answer, seen.fShellText);
     TEXTS differences;
@@ -290,4 +288,28 @@ std::vector<std::string> OracleDifferences(const ORACLE_ANSWER &answer, const OR
     ErrorLogCompare(expected, seen, differences);
     ListCompare("problems", {}, seen.problems, differences);
     return differences;
+}
+
+} // namespace
+
+std::vector<ORACLE_ANSWER> OracleAnswers(ORACLE_MACHINE machine, const ORACLE_WORDS &words)
+{
+    vector<ORACLE_ANSWER> answers;
+    vector<string> &members = machine.md0Members;
+    std::sort(members.begin(), members.end());
+    do {
+        answers.push_back(OracleAnswer(machine, words));
+    } while (std::next_permutation(members.begin(), members.end()));
+    return answers;
+}
+
+std::vector<std::string> OracleDifferences(const std::vector<ORACLE_ANSWER> &answers,
+                                           const ORACLE_SEEN &seen)
+{
+    TEXTS nearest = AnswerCompare(answers[0], seen);
+    for (const ORACLE_ANSWER &answer : answers) {
+        const TEXTS differences = AnswerCompare(answer, seen);
+        nearest = differences.size() < nearest.size() ? differences : nearest;
+    }
+    return nearest;
 }

@@ -23,5 +23,9 @@ struct ORACLE_SEEN {
     std::vector<std::string> problems{}; // anything that is wrong by itself
 };
 
-// One text for each difference; none when model and run agree.
-std::vector<std::string> OracleDifferences(const ORACLE_ANSWER &answer, const ORACLE_SEEN &seen);
+// One answer for each order in which a directory may hand out the members of the system array.
+std::vector<ORACLE_ANSWER> OracleAnswers(ORACLE_MACHINE machine, const ORACLE_WORDS &words);
+
+// One text for each difference from the answer that comes nearest; none when model and run agree.
+std::vector<std::string> OracleDifferences(const std::vector<ORACLE_ANSWER> &answers,
+                                           const ORACLE_SEEN &seen);

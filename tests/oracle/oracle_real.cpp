@@ -5,7 +5,6 @@
 //
 //     oracle_real plan SEED N             the script of N machines, the first from SEED
 //     oracle_real compare SEED N FOLDER   their records
-//     oracle_real show SEED N FOLDER      the same, with the machines and what was seen
 #include "oracle_compare.h"
 #include "oracle_plan.h"
 #include "suite.h"
@@ -193,48 +192,6 @@ void SetUpCheck(const PLAN &plan, const RECORD &record, vector<string> &differen
     }
 }
 
-// The directory of the system array hands out its members in an order of its own.
-vector<string> NearestDifferences(const PLAN &plan, RECORD &record)
-{
-    vector<string> nearest;
-    vector<string> &members = record.machine.md0Members;
-    std::sort(members.begin(), members.end());
-    bool fFirst = true;
-    do {
-        const ORACLE_ANSWER answer = OracleAnswer(record.machine, plan.subject.words);
-        vector<string> differences = OracleDifferences(answer, record.seen);
-        if (fFirst || differences.size() < nearest.size()) {
-            nearest = differences;
-        }
-        fFirst = false;
-    } while (std::next_permutation(members.begin(), members.end()));
-    return nearest;
-}
-
-string WordsText(const vector<string> &words)
-{
-    string text;
-    for (const string &szWord : words) {
-        text += " [" + szWord + "]";
-    }
-    return text;
-}
-
-string SeenText(const ORACLE_SEEN &seen)
-{
-    string text;
-    for (const ORACLE_WORDS &words : seen.commands) {
-        text += "  runs" + WordsText(words) + "\n";
-    }
-    for (const auto &[priority, szLine] : seen.lines) {
-        text += "  logs " + to_string(priority) + " " + szLine + "\n";
-    }
-    for (const string &szLine : seen.errorLog) {
-        text += "  records " + szLine + "\n";
-    }
-    return text + "  prints [" + seen.szOut + "], exit status " + to_string(seen.nStatus) + "\n";
-}
-
 string Head(const PLAN &plan, const RECORD &record)
 {
     string text;
@@ -246,31 +203,26 @@ string Head(const PLAN &plan, const RECORD &record)
            " calls, status " + to_string(record.seen.nStatus);
 }
 
-void MachineCompare(u64 seed, const string &szRecords, bool fShow)
+void MachineCompare(u64 seed, const string &szRecords)
 {
     const PLAN plan = PlanMake(seed);
-    RECORD record = RecordTake(plan, szRecords + "/" + to_string(seed));
-    vector<string> differences = NearestDifferences(plan, record);
+    const RECORD record = RecordTake(plan, szRecords + "/" + to_string(seed));
+    ORACLE_CASE subject = plan.subject;
+    subject.machine = record.machine;
+    vector<string> differences =
+        OracleDifferences(OracleAnswers(subject.machine, subject.words), record.seen);
     SetUpCheck(plan, record, differences);
-    string szText;
-    if (!differences.empty() || fShow) {
-        ORACLE_CASE subject = plan.subject;
-        subject.machine = record.machine;
-        szText = OracleCaseText(subject) + "seen\n" + SeenText(record.seen);
-    }
-    if (differences.empty() && fShow) {
-        printf("%s", szText.c_str());
-    }
+    string szText = differences.empty() ? "" : OracleCaseText(subject);
     for (const string &szDifference : differences) {
         szText += "difference in " + szDifference;
     }
-    VerdictTell("seed " + to_string(seed), differences.empty() ? "" : szText, Head(plan, record));
+    VerdictTell("seed " + to_string(seed), szText, Head(plan, record));
 }
 
-int CompareAll(u64 first, u64 count, const string &szRecords, bool fShow)
+int CompareAll(u64 first, u64 count, const string &szRecords)
 {
     for (u64 seed = first; seed < first + count; seed++) {
-        MachineCompare(seed, szRecords, fShow);
+        MachineCompare(seed, szRecords);
     }
     return EXIT_SUCCESS;
 }
@@ -292,10 +244,10 @@ int main(int argc, char *argv[])
     const bool fPlan = szWord == "plan";
     u64 first = 0;
     u64 count = 0;
-    if ((!fPlan && szWord != "compare" && szWord != "show") || argc != (fPlan ? 4 : 5) ||
-        !NumberTake(argv[2], first) || !NumberTake(argv[3], count)) {
-        fprintf(stderr, "usage: oracle_real plan SEED N | compare|show SEED N FOLDER\n");
+    if ((!fPlan && szWord != "compare") || argc != (fPlan ? 4 : 5) || !NumberTake(argv[2], first) ||
+        !NumberTake(argv[3], count)) {
+        fprintf(stderr, "usage: oracle_real plan SEED N | compare SEED N FOLDER\n");
         return EXIT_FAILURE;
     }
-    return fPlan ? PlanAll(first, count) : CompareAll(first, count, argv[4], szWord == "show");
+    return fPlan ? PlanAll(first, count) : CompareAll(first, count, argv[4]);
 }

@@ -2,10 +2,10 @@
 //
 // Runs the finished program on random machines in the sandbox and asks the model what it must do.
 //
-//     oracle_tests [--machines N] [--seed S] [--show] [SEED]
+//     oracle_tests [--machines N] [--seed S] [SEED]
 //
 // Machine i is made from seed S + i (S is the environment's ORACLE_SEED unless given), so a failing
-// one comes back with its seed alone. --show prints machines and answers.
+// one comes back with its seed alone.
 #include "oracle_compare.h"
 #include "oracle_machine.h"
 #include "oracle_model.h"
@@ -35,7 +35,6 @@ constexpr const char MD0_MEMBER[] = "/sys/block/md0/md/dev-";
 struct OPTIONS {
     u64 machines = 2000;
     u64 seed = 1;
-    bool fShow = false;
 };
 
 // Half of the machines have a stand-in for the shell: the exact text that it is given is compared.
@@ -211,71 +210,20 @@ ORACLE_SEEN SeenTake(const ORACLE_CASE &subject, const RUN_RESULT &result)
     return seen;
 }
 
-// One answer for each order in which a directory may hand out the members of the system array.
-vector<ORACLE_ANSWER> AnswersMake(const ORACLE_CASE &subject)
-{
-    vector<ORACLE_ANSWER> answers;
-    ORACLE_MACHINE machine = subject.machine;
-    std::sort(machine.md0Members.begin(), machine.md0Members.end());
-    do {
-        answers.push_back(OracleAnswer(machine, subject.words));
-    } while (std::next_permutation(machine.md0Members.begin(), machine.md0Members.end()));
-    return answers;
-}
-
-// The differences from the answer that comes nearest.
 vector<string> CaseDifferences(const ORACLE_CASE &subject)
 {
-    const vector<ORACLE_ANSWER> answers = AnswersMake(subject);
+    const vector<ORACLE_ANSWER> answers = OracleAnswers(subject.machine, subject.words);
     const MACHINE machine = MachineLayOut(subject, answers);
     const ORACLE_SEEN seen = SeenTake(subject, MachineTry(machine, subject.words));
-    vector<string> nearest = OracleDifferences(answers[0], seen);
-    for (const ORACLE_ANSWER &answer : answers) {
-        const vector<string> differences = OracleDifferences(answer, seen);
-        nearest = differences.size() < nearest.size() ? differences : nearest;
-    }
-    return nearest;
-}
-
-string AnswerText(const ORACLE_ANSWER &answer)
-{
-    static const std::map<ORACLE_KIND, string> names = {{ORACLE_KIND::COMMAND, "runs"},
-                                                        {ORACLE_KIND::SHELL, "shell"},
-                                                        {ORACLE_KIND::SLEEP, "sleeps"},
-                                                        {ORACLE_KIND::LOG, "logs"},
-                                                        {ORACLE_KIND::ERROR_LOG, "records"}};
-    string text;
-    for (size_t i = 0; i < answer.phases.size(); i++) {
-        for (const ORACLE_STRAND &strand : answer.phases[i]) {
-            for (const ORACLE_ACTION &action : strand.actions) {
-                const string szWho = strand.szDisk.empty() ? "parent" : strand.szDisk;
-                text += "  " + to_string(i) + " " + szWho + " " + names.at(action.kind) + " ";
-                if (action.kind == ORACLE_KIND::COMMAND) {
-                    for (const string &szWord : action.words) {
-                        text += "[" + szWord + "]";
-                    }
-                } else {
-                    text += to_string(action.nNumber) + " " + action.szText;
-                }
-                text += "\n";
-            }
-        }
-    }
-    return text + "  prints [" + answer.szOut + "], exit status " + to_string(answer.nStatus) +
-           "\n";
+    return OracleDifferences(answers, seen);
 }
 
 // ------------------------------------------------------------------------------------- the suite
 
 // What is wrong with the machine of this seed; empty when nothing is.
-string CaseRun(const OPTIONS &options, u64 seed)
+string CaseRun(u64 seed)
 {
     const ORACLE_CASE subject = OracleCaseMake(seed);
-    if (options.fShow) {
-        const string szAnswer = AnswerText(OracleAnswer(subject.machine, subject.words));
-        printf("machine of seed %s\n%sits answer\n%s", to_string(seed).c_str(),
-               OracleCaseText(subject).c_str(), szAnswer.c_str());
-    }
     const vector<string> differences = CaseDifferences(subject);
     if (differences.empty()) {
         return "";
@@ -292,9 +240,8 @@ void MachinesTry(const OPTIONS &options)
     // Each machine is one worker's.
     SUITE suite = {.szDone = "", .work = [&](size_t test, size_t worker) {
                        TALLY tally;
-                       const string szWrong = test % VerdictWorkers() == worker
-                                                  ? CaseRun(options, options.seed + test)
-                                                  : "";
+                       const string szWrong =
+                           test % VerdictWorkers() == worker ? CaseRun(options.seed + test) : "";
                        if (!szWrong.empty()) {
                            tally.wrong.push_back(szWrong);
                        }
@@ -326,11 +273,9 @@ int main(int argc, char *argv[])
     const char *const szSeed = getenv("ORACLE_SEED");
     const bool fSeed = szSeed == nullptr || NumberTake(szSeed, options.seed);
     if (!fSeed ||
-        !OptionsTake(argc, argv,
-                     {{"--machines", &options.machines},
-                      {"--seed", &options.seed},
-                      {"--show", &options.fShow},
-                      {"", &szFilter}}) ||
+        !OptionsTake(
+            argc, argv,
+            {{"--machines", &options.machines}, {"--seed", &options.seed}, {"", &szFilter}}) ||
         !FilterTake(options, szFilter)) {
         return EXIT_FAILURE;
     }
