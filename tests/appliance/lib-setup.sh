@@ -19,14 +19,12 @@ WHOLE_8="$LAYOUT_8
 $LAYOUT_8_DATA"
 
 # Older ones, with the place for data that their own data partitions have.
-LAYOUT_7='1 256 4980480 fd
-2 4980736 4194304 fd'
-WHOLE_7="$LAYOUT_7
-3 9437184 131072 fd"
-LAYOUT_6='1 63 4980087 fd
-2 4980150 4192965 fd'
-WHOLE_6="$LAYOUT_6
-3 9430155 138101 fd"
+WHOLE_7='1 256 4980480 fd
+2 4980736 4194304 fd
+3 9437184 131072 fd'
+WHOLE_6='1 63 4980087 fd
+2 4980150 4192965 fd
+3 9430155 138101 fd'
 
 # --- the machine -------------------------------------------------------------------------------
 
@@ -102,23 +100,22 @@ only_dos() {
     [ "$(wipefs --noheadings -O TYPE "/dev/$1")" = dos ]
 }
 
-# How many writes a disk has seen. A partition's are counted with it.
-writes_of() {
-    for disk in "$@"; do
+# How many writes the watched disks have seen. A partition's are counted with its disk's.
+writes() {
+    sync
+    for disk in $watched; do
         awk -v disk="$disk" '{ print disk, $5, $7, $12 }' "/sys/block/$disk/stat"
     done
 }
 
 watch_writes() {
     watched=$*
-    sync
-    writes_of $watched >/tmp/writes
+    writes >/tmp/writes
 }
 
-# Not one sector of the watched disks was written or given up since.
+# Not one sector of them was written or given up since.
 nothing_written() {
-    sync
-    writes_of $watched | diff /tmp/writes -
+    writes | diff /tmp/writes -
 }
 
 # --- arrays ------------------------------------------------------------------------------------

@@ -14,9 +14,6 @@ RUNS=/tmp/runs
 SYSLOG=/var/log/messages
 OPERATION_ERRORS=/var/log/space_operation_error.log
 
-# Nobody waits longer than the condition takes; one that does not come true in this time hangs.
-SETTLE_SECONDS=$SILENCE
-
 # How many verdicts this file gives. Fewer or more mean that it went astray.
 plan() {
     echo "plan $1"
@@ -80,10 +77,10 @@ verdict() {
 
 # --- waiting -----------------------------------------------------------------------------------
 
-# wait_for SECONDS COMMAND...: polls a condition to a bound.
-wait_for() {
-    tenths=$(($1 * 10))
-    shift
+# comes CONDITION...: sooner or later. Nobody waits longer than it takes; one that does not come true
+# within the machine's silence hangs.
+comes() {
+    tenths=$((SILENCE * 10))
     until "$@" >/dev/null 2>&1; do
         tenths=$((tenths - 1))
         [ "$tenths" -gt 0 ] || return 1
@@ -91,11 +88,7 @@ wait_for() {
     done
 }
 
-# comes COMMAND...: sooner or later. await COMMAND...: what follows needs it.
-comes() {
-    wait_for "$SETTLE_SECONDS" "$@"
-}
-
+# await CONDITION...: what follows needs it.
 await() {
     comes "$@" || abort "it does not come to this: $*"
 }
@@ -107,10 +100,7 @@ partition_disks() {
     sizes=$1
     shift
     for disk in "$@"; do
-        for size in $sizes; do
-            echo ",$size"
-        done >/tmp/table
-        echo , >>/tmp/table
+        printf ',%s\n' $sizes '' >/tmp/table
         must sh -c "sfdisk.stock -q --wipe always /dev/$disk </tmp/table"
     done
 }
@@ -396,8 +386,9 @@ slept() {
     [ "$(grep -c "{tv_sec=$2, tv_nsec=0}" "$3")" = "$1" ]
 }
 
-# The command's exit status is 0 whatever happened.
+# check_output TAG TEXT: the command's exit status is 0 whatever happened.
 check_output() {
+    printf '%b' "$2" >"$EXPECTED"
     check "output of $1" as_expected "$RUNS/$1.out"
     check "exit status of $1" test "$(cat "$RUNS/$1.status")" = 0
 }
@@ -405,8 +396,7 @@ check_output() {
 # finds_nothing TAG MD: nothing but one line, with a blank at its end.
 finds_nothing() {
     run_destroy "$1" "$2"
-    printf 'Not found /dev/md%s \n' "$2" >"$EXPECTED"
-    check_output "$1"
+    check_output "$1" "Not found /dev/md$2 \n"
 }
 
 lines() {
@@ -421,8 +411,7 @@ wipes() {
     shift 3
     rm -f "$OPERATION_ERRORS"
     run_destroy "$tag" "$number"
-    : >"$EXPECTED"
-    check_output "$tag"
+    check_output "$tag" ''
     {
         lines "$complaining" | sed 's/^/err Failed to /'
         echo "err [Info] clean RAID superblock of /dev/md$number"

@@ -86,7 +86,7 @@ all_present() {
     for letter in $LETTERS; do
         is_present "$letter" || {
             must sh -c "echo '0 $target 0' >'$SCSI_HOSTS/host0/scan'"
-            wait_for "$SETTLE_SECONDS" is_present "$letter" || abort "sd$letter does not come back"
+            comes is_present "$letter" || abort "sd$letter does not come back"
         }
         target=$((target + 1))
     done
@@ -95,7 +95,7 @@ all_present() {
 stop_all() {
     for number in $(arrays_known); do
         must "$REAL/mdadm" -q --stop "/dev/md$number"
-        wait_for "$SETTLE_SECONDS" array_is_gone "$number" || abort "md$number does not go away"
+        comes array_is_gone "$number" || abort "md$number does not go away"
     done
 }
 
@@ -221,7 +221,7 @@ run() {
         arrayctl "$@" >"$CURRENT/out" 2>"$CURRENT/err"
     echo $? >"$CURRENT/status"
     logger -t oracle end
-    wait_for "$SETTLE_SECONDS" log_is_complete || abort 'no system log'
+    comes log_is_complete || abort 'no system log'
     cp "$SYSLOG" "$CURRENT/log"
     [ ! -e "$OPERATION_ERRORS" ] || cp "$OPERATION_ERRORS" "$CURRENT/errors"
     record_markers >"$CURRENT/markers"

@@ -29,26 +29,21 @@ file_is_whole() {
     [ "$(md5sum <"$1/file")" = "$(pattern "$1" | md5sum)" ]
 }
 
-# log_of_three_tries MD: a second's pause follows each.
-log_of_three_tries() {
-    for _ in 1 2 3; do
-        echo "err Failed to mdadm stop '/dev/md$1'"
-        echo "err Fail to stop [/dev/md$1], try again"
-    done
-    echo 'err Reach RAID stop retry limit'
-}
-
-# check_stayed TAG MD COMMANDS MEMBER...: after a run, with the LVM tools that fail in it.
+# check_stayed TAG MD COMMANDS MEMBER...: after a run, with the LVM tools that fail in it. It tries three
+# times, and a second's pause follows each.
 check_stayed() {
     tag=$1
     number=$2
     complaining=$3
     shift 3
-    : >"$EXPECTED"
-    check_output "$tag"
+    check_output "$tag" ''
     {
         lines "$complaining" | sed 's/^/err Failed to /'
-        log_of_three_tries "$number"
+        for _ in 1 2 3; do
+            echo "err Failed to mdadm stop '/dev/md$number'"
+            echo "err Fail to stop [/dev/md$number], try again"
+        done
+        echo 'err Reach RAID stop retry limit'
     } >"$EXPECTED"
     check_log "$tag"
     {

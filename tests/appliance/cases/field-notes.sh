@@ -35,8 +35,7 @@ for number in 12 1; do
     check_no_group stock
     check 'its array runs' array_is_clean 127
 done
-printf 'Not found /dev/md12 \n' >"$EXPECTED"
-check_output stock12
+check_output stock12 'Not found /dev/md12 \n'
 verdict 'destroy 12 without such an array, and destroy 1, remove the group on md127'
 drop_arrays 127
 

@@ -5,6 +5,7 @@
 # disks: 4
 # size: 4672M
 # boots: 2
+# core: yes
 # shellcheck disable=SC2317  # check must call the functions
 # shellcheck source=SCRIPTDIR/../lib-setup.sh
 . /appliance/lib-setup.sh
