@@ -270,6 +270,8 @@ TEST(ExternalDiskPortCheck, KnowsNoOtherNames)
                 {"3", ""},
                 {"xsda", "xsda"},
                 {"SDA", "SDA"},
+                {"/dev/SDA", "SDA"},
+                {"/dev", "/dev"}, // no further slash to look behind
                 {"xnuroboot", "xnuroboot"},
                 {"/dev/disk/sda", "disk/sda"}};
     for (const auto &row : rows) {
@@ -505,15 +507,20 @@ TEST(ExternalDiskPortEnumEunit, PassesHostsThatReportNothing)
     });
 }
 
-TEST(ExternalDiskPortEnumEunit, FailsWithoutTheFolderOfHosts)
+// As where there are none; nothing is said about it.
+TEST(ExternalDiskPortEnumEunit, FailsWhereHostsCannotBeListed)
 {
-    MACHINE machine = MachineMake();
-    MachineRemove(machine, "/sys/class");
-    QuietCall(machine, [] {
-        char szOut[64] = "old";
-        EXPECT_EQ(ExternalDiskPortEnumEunit(0, szOut, sizeof(szOut)), -1);
-        EXPECT_STREQ(szOut, "");
-    });
+    MACHINE missing = MachineMake();
+    MachineRemove(missing, "/sys/class");
+    MACHINE refused = MachineMake();
+    refused.faults = {{.szFunction = "scandir", .error = EACCES}};
+    for (const MACHINE &machine : {missing, refused}) {
+        QuietCall(machine, [] {
+            char szOut[64] = "old";
+            EXPECT_EQ(ExternalDiskPortEnumEunit(0, szOut, sizeof(szOut)), -1);
+            EXPECT_STREQ(szOut, "");
+        });
+    }
 }
 
 TEST(ExternalDiskPortEnumEunit, RefusesNull)
@@ -521,8 +528,10 @@ TEST(ExternalDiskPortEnumEunit, RefusesNull)
     MACHINE machine = MachineMake();
     UnitAdd(machine, "host0", "/dev/sdga");
     QuietCall(machine, [] {
+        char szOut[8] = "x";
         EXPECT_FAILS(ExternalDiskPortEnumEunit(0, nullptr, 1024), -1, ERR_BAD_PARAMETER);
-        EXPECT_STREQ(NLIBCErrGetFile(), "disk_port.cpp");
+        EXPECT_FAILS(ExternalDiskPortEnumEunit(0, szOut, 0), -1, ERR_BAD_PARAMETER);
+        EXPECT_STREQ(szOut, "x");
     });
 }
 

@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: MIT
+#include "steps.h"
 #include "storage_machine.h"
 
 #include <cerrno>
@@ -12,6 +13,7 @@ namespace
 constexpr char USAGE[] = "usage:\n\tarrayctl destroy <RAID ID> \n\tarrayctl status <RAID ID> \n"
                          "\tarrayctl newvol \n\tarrayctl initsys \n\tarrayctl initsys-dd \n";
 constexpr char NO_DISK[] = "No disk to create RAID... \n";
+constexpr char CREATING_1[] = "Creating RAID 1 volume... \n";
 
 struct DATA_PARTITION {
     std::string szGap = "-j260352"; // the newest layout's, whatever the disk has
@@ -260,33 +262,106 @@ TEST(Newvol, FailsWithoutMemoryForTheList)
 
 // ---- commands that fail ------------------------------------------------------------------------
 
-TEST(NewvolFails, AtTheFirstDiskThatCannotBePartitioned)
+struct FAILURE_CASE {
+    const char *szName;
+    MACHINE machine;
+    STEPS steps;
+    std::string szOut = "";
+    int status = 1;
+};
+
+STEPS Cleaned(const std::string &szDisk)
 {
-    MACHINE machine = MachineWithConf(std::string(CONF_RAID) + "support_dual_head=no\n"
-                                                               "cacheportcfg=0x0\n");
-    DataDiskAdd(machine, "sda");
-    MachineDiskAdd(machine, "sdb");
-    CleanExpect(machine, "sdb");
-    CreateExpect(machine, "sdb", {}, {.szErr = "does not fit\n", .status = 1});
-    MachineDiskAdd(machine, "sdc");
-    const RUN_RESULT result = RunEnds(machine, {"newvol"}, 1, "");
-    EXPECT_EQ(TranscriptText(result), RenewText("sda") + RenewText("sdb"));
-    EXPECT_EQ(LogText(result),
-              "<11>partition_edit.cpp:# Failed to [/sbin/sfdisk -N3  -uS -q -f -j260352 -z-1 -tfd "
-              "-F /dev/sdb], err=256\n"
-              "<11>arrayctl.cpp:# Failed to create data partition of /dev/sdb, errno=0x0\n");
+    return {{"/sbin/sfdisk --fast-delete 3:128 /dev/" + szDisk},
+            {"/sbin/sfdisk -M1 /dev/" + szDisk}};
 }
 
-// The lookup of the second head found no such key.
-TEST(NewvolFails, WithTheCodeThatStands)
+STEP Created(const std::string &szDisk, const TOOL_ANSWER &answer = {})
 {
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    MachineDiskAdd(machine, "sda");
-    CleanExpect(machine, "sda");
-    CreateExpect(machine, "sda", {}, {.status = 1});
-    const RUN_RESULT result = RunEnds(machine, {"newvol"}, 1);
-    EXPECT_EQ(LogOf(result, "arrayctl.cpp"),
-              "<11>arrayctl.cpp:# Failed to create data partition of /dev/sda, errno=0x2000\n");
+    return {"/sbin/sfdisk -N3 \"\" -uS -q -f -j260352 -z-1 -tfd -F /dev/" + szDisk, answer};
+}
+
+STEPS CleaningFailed(const std::string &szDisk)
+{
+    return {{"/sbin/sfdisk --fast-delete 3:128 /dev/" + szDisk, {.status = 1}},
+            {"<15>partition_edit.cpp:# Failed to do '/sbin/sfdisk --fast-delete 3:128 /dev/" +
+             szDisk + "'"},
+            {"/sbin/sfdisk -M1 /dev/" + szDisk, {.status = 1}},
+            {"<11>partition_edit.cpp:# Failed to add ms-dos signature to /dev/" + szDisk +
+             ", err=256"}};
+}
+
+STEP CreateFailed(const std::string &szDisk)
+{
+    return {"<11>partition_edit.cpp:# Failed to [/sbin/sfdisk -N3  -uS -q -f -j260352 -z-1 -tfd "
+            "-F /dev/" +
+            szDisk + "], err=256"};
+}
+
+// Blank disks of a model with, and of one without the key of the second head.
+MACHINE BlankDisks(const std::vector<std::string> &disks, const char *szMore = "")
+{
+    MACHINE machine = MachineWithConf(std::string(CONF_RAID) + szMore);
+    for (const std::string &szDisk : disks) {
+        MachineDiskAdd(machine, szDisk);
+    }
+    return machine;
+}
+
+constexpr char ONE_HEAD[] = "support_dual_head=no\ncacheportcfg=0x0\n";
+constexpr char ARRAY_OF_ONE[] = "/sbin/mdadm -C /dev/md2 -amd -R -l1 -f -n1 /dev/sda3";
+
+STEP ArrayFailed(const std::string &szCode)
+{
+    return {"<11>arrayctl.cpp:# Failed to create RAID '/dev/md2' on '/dev/sda3 ', errno=" + szCode};
+}
+
+TEST(NewvolFails, AtTheFirstDiskOrWithTheArray)
+{
+    const STEPS made = Cleaned("sda") + STEPS{Created("sda")};
+    MACHINE killed = BlankDisks({"sda"});
+    ShellKill(killed);
+    const FAILURE_CASE cases[] = {
+        {"the second disk", BlankDisks({"sda", "sdb", "sdc"}, ONE_HEAD),
+         made + Cleaned("sdb") +
+             STEPS{Created("sdb", {.szErr = "does not fit\n", .status = 1}),
+                   CreateFailed("sdb"),
+                   {"<11>arrayctl.cpp:# Failed to create data partition of /dev/sdb, errno=0x0"}}},
+        // The lookup of the second head found no such key.
+        {"the code that stands", BlankDisks({"sda"}),
+         Cleaned("sda") + STEPS{Created("sda", {.status = 1}),
+                                CreateFailed("sda"),
+                                {"<11>arrayctl.cpp:# Failed to create data partition of /dev/sda, "
+                                 "errno=0x2000"}}},
+        {"no array tool", WithTool(BlankDisks({"sda"}), "/sbin/mdadm", TOOL_KIND::MISSING),
+         made + STEPS{ArrayFailed("127")}, CREATING_1},
+        {"no shell", WithFault(BlankDisks({"sda"}), {.szFunction = "system", .error = EAGAIN}),
+         made + STEPS{{"fault system 1"}, ArrayFailed("255")}, CREATING_1},
+        {"status 1", BlankDisks({"sda"}),
+         made + STEPS{{ARRAY_OF_ONE, {.szOut = "noise\n", .szErr = "noise\n", .status = 1}},
+                      ArrayFailed("1")},
+         CREATING_1},
+        {"status 2", BlankDisks({"sda"}),
+         made + STEPS{{ARRAY_OF_ONE, {.status = 2}}, ArrayFailed("2")}, CREATING_1},
+        {"status 127", BlankDisks({"sda"}),
+         made + STEPS{{ARRAY_OF_ONE, {.status = 127}}, ArrayFailed("127")}, CREATING_1},
+        {"status 255", BlankDisks({"sda"}),
+         made + STEPS{{ARRAY_OF_ONE, {.status = 255}}, ArrayFailed("255")}, CREATING_1},
+        // Its exit status is that of the bits 8 to 15, and a signal stands below them.
+        {"not when the shell is killed", killed, made, CREATING_1, 0},
+        {"not when partitions cannot be deleted", BlankDisks({"sda", "sdb"}),
+         CleaningFailed("sda") + STEPS{Created("sda")} + CleaningFailed("sdb") +
+             STEPS{Created("sdb"), {"/sbin/mdadm -C /dev/md2 -amd -R -l1 -n2 /dev/sda3 /dev/sdb3"}},
+         CREATING_1, 0},
+    };
+    for (const FAILURE_CASE &row : cases) {
+        (void)ExpectRun({.szName = row.szName,
+                         .machine = row.machine,
+                         .arguments = {"newvol"},
+                         .szOut = row.szOut,
+                         .status = row.status,
+                         .steps = row.steps});
+    }
 }
 
 TEST(NewvolFails, WithoutARowForTheModel)
@@ -299,65 +374,6 @@ TEST(NewvolFails, WithoutARowForTheModel)
     const RUN_RESULT result = RunEnds(machine, {"newvol"}, 1);
     EXPECT_EQ(LogErrors(result).substr(0, LogErrors(result).find('\n') + 1),
               "<11>partition_edit.cpp:# Failed to get partition layout: version=0\n");
-}
-
-TEST(NewvolFails, NotWhenThePartitionsCannotBeDeleted)
-{
-    MACHINE machine = MachineWithDisks(CONF_RAID, FirstDisks(2));
-    for (TOOL_ROW &row : machine.rows) {
-        row.answer.status = row.argv[1] == "-N3" ? 0 : 1;
-    }
-    MachineTool(machine, "/sbin/mdadm -C /dev/md2 -amd -R -l1 -n2 /dev/sda3 /dev/sdb3");
-    const RUN_RESULT result = RunEnds(machine, {"newvol"}, 0);
-    EXPECT_EQ(LogText(result),
-              "<15>partition_edit.cpp:# Failed to do '/sbin/sfdisk --fast-delete 3:128 /dev/sda'\n"
-              "<11>partition_edit.cpp:# Failed to add ms-dos signature to /dev/sda, err=256\n"
-              "<15>partition_edit.cpp:# Failed to do '/sbin/sfdisk --fast-delete 3:128 /dev/sdb'\n"
-              "<11>partition_edit.cpp:# Failed to add ms-dos signature to /dev/sdb, err=256\n");
-}
-
-TEST(NewvolFails, WithTheExitStatusOfTheArrayTool)
-{
-    for (const int status : {1, 2, 127, 255}) {
-        SCOPED_TRACE(status);
-        MACHINE machine = MachineWithDisks(CONF_RAID, FirstDisks(3));
-        MachineTool(machine,
-                    "/sbin/mdadm -C /dev/md2 -amd -R -l5 -n3 /dev/sda3 /dev/sdb3 /dev/sdc3",
-                    {.szOut = "noise\n", .szErr = "noise\n", .status = status});
-        const RUN_RESULT result = RunEnds(machine, {"newvol"}, 1, "Creating RAID 5 volume... \n");
-        EXPECT_EQ(LogText(result),
-                  "<11>arrayctl.cpp:# Failed to create RAID '/dev/md2' on '/dev/sda3 /dev/sdb3 "
-                  "/dev/sdc3 ', errno=" +
-                      std::to_string(status) + "\n");
-    }
-}
-
-TEST(NewvolFails, WithoutAnArrayTool)
-{
-    MACHINE machine = MachineWithDisks(CONF_RAID, FirstDisks(1));
-    machine.tools["/sbin/mdadm"] = TOOL_KIND::MISSING;
-    const RUN_RESULT result = RunEnds(machine, {"newvol"}, 1);
-    EXPECT_EQ(LogText(result),
-              "<11>arrayctl.cpp:# Failed to create RAID '/dev/md2' on '/dev/sda3 ', errno=127\n");
-}
-
-TEST(NewvolFails, WithoutAShell)
-{
-    MACHINE machine = MachineWithDisks(CONF_RAID, FirstDisks(1));
-    machine.faults = {{.szFunction = "system", .nCall = 1, .error = EAGAIN}};
-    const RUN_RESULT result = RunEnds(machine, {"newvol"}, 1);
-    EXPECT_EQ(LogText(result),
-              "<11>arrayctl.cpp:# Failed to create RAID '/dev/md2' on '/dev/sda3 ', errno=255\n");
-}
-
-// Its exit status is that of the bits 8 to 15, and a signal stands below them.
-TEST(NewvolFails, NotWhenTheShellIsKilled)
-{
-    MACHINE machine = MachineWithDisks(CONF_RAID, FirstDisks(1));
-    ShellKill(machine);
-    const RUN_RESULT result = RunEnds(machine, {"newvol"}, 0);
-    EXPECT_EQ(TranscriptText(result), RenewText("sda"));
-    EXPECT_EQ(LogText(result), "");
 }
 
 // ---- dual-head machines ------------------------------------------------------------------------

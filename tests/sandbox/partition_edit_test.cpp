@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: MIT
 #include "nurostoragecore/partition_edit.h"
 
-#include "last_error.h"
 #include "nurocore/error.h"
+#include "steps.h"
 #include "storage_machine.h"
 
 #include <cerrno>
@@ -27,12 +27,6 @@ MACHINE MachineOfCommands(const std::string &szConf, const std::vector<std::stri
         MachineTool(machine, szCommand);
     }
     return machine;
-}
-
-// What the last of them answers instead.
-void LastFails(MACHINE &machine, const TOOL_ANSWER &answer)
-{
-    machine.rows.back().answer = answer;
 }
 
 RUN_RESULT Create(const MACHINE &machine, const char *szDisk, int kind, std::optional<u32> version,
@@ -106,53 +100,54 @@ TEST(PartitionCreateSystem, GivesTheToolsNothingToReadOrToSay)
     }
 }
 
-TEST(PartitionCreateSystem, EndsWithTheSignatureThatFails)
+long long CreateSystem8()
 {
-    MACHINE machine = MachineOfCommands(CONF_RAID, {"/sbin/sfdisk -M1 /dev/sdb"});
-    LastFails(machine, {.szErr = "no such disk\n", .status = 1});
-    const RUN_RESULT result = Create(machine, "/dev/sdb", 1, 8, -1);
-    EXPECT_EQ(LogText(result),
-              "<11>partition_edit.cpp:# Failed to add ms-dos signature to /dev/sdb, err=256\n"
-              "<11>partition_edit.cpp:# Failed to partition disk /dev/sdb, err=255\n");
-    const std::string szLog = MachineFileRead(ERROR_LOG).value_or("");
-    EXPECT_NE(szLog.find(" command=\"/sbin/sfdisk -M1 /dev/sdb\" Error=\"no such disk \"\n"),
-              std::string::npos)
-        << szLog;
+    const u32 version = 8;
+    return PartitionCreate("/dev/sdb", 1, &version);
 }
 
-TEST(PartitionCreateSystem, EndsWithTheFirstPartitionThatFails)
+TEST(PartitionCreateSystem, EndsWithTheCommandThatFails)
 {
-    MACHINE machine = MachineOfCommands(
-        CONF_RAID, {"/sbin/sfdisk -M1 /dev/sdb",
-                    "/sbin/sfdisk -N1 -uS -q -f -j2048 -z4980480 -tfd -F /dev/sdb"});
-    LastFails(machine, {.status = 3});
-    const RUN_RESULT result = Create(machine, "/dev/sdb", 1, 8, -1);
-    EXPECT_EQ(LogText(result), "<11>partition_edit.cpp:# Failed to partition disk /dev/sdb, "
-                               "err=768\n");
-    EXPECT_EQ(result.events.size(), 2U);
-}
-
-TEST(PartitionCreateSystem, TellsTheSecondCommandThatFails)
-{
-    MACHINE machine = MachineOfCommands(
-        CONF_NO_RAID,
-        {"/sbin/sfdisk -M1 /dev/sdb", "/sbin/sfdisk -N1 -uS -q -f -j256 -z4980480 -t83 -F /dev/sdb",
-         "/sbin/sfdisk -N2 -uS -q -f -j0 -z4194304 -t82 -F /dev/sdb"});
-    LastFails(machine, {.status = 1});
-    const RUN_RESULT result = Create(machine, "/dev/sdb", 1, 7, -1);
-    EXPECT_EQ(LogText(result),
-              "<11>partition_edit.cpp:# Failed to [/sbin/sfdisk -N2 -uS -q -f -j0 -z4194304 -t82 "
-              "-F /dev/sdb], err=256\n");
-}
-
-TEST(PartitionCreateSystem, TellsAMissingPartitioner)
-{
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    machine.tools["/sbin/sfdisk"] = TOOL_KIND::MISSING;
-    const RUN_RESULT result = Create(machine, "/dev/sdb", 1, 8, -1);
-    EXPECT_EQ(LogText(result),
-              "<11>partition_edit.cpp:# Failed to add ms-dos signature to /dev/sdb, err=32512\n"
-              "<11>partition_edit.cpp:# Failed to partition disk /dev/sdb, err=255\n");
+    const STEP signature = {"/sbin/sfdisk -M1 /dev/sdb"};
+    const STEP first = {"/sbin/sfdisk -N1 -uS -q -f -j2048 -z4980480 -tfd -F /dev/sdb"};
+    const STEP second = {"/sbin/sfdisk -N2 -uS -q -f -j0 -z4194304 -tfd -F /dev/sdb"};
+    const STEP unsigned255 = {
+        "<11>partition_edit.cpp:# Failed to partition disk /dev/sdb, err=255"};
+    const MACHINE machine = MachineWithConf(CONF_RAID);
+    ExpectCalls(
+        {{.szName = "no partitioner",
+          .machine = WithTool(machine, "/sbin/sfdisk", TOOL_KIND::MISSING),
+          .call = CreateSystem8,
+          .result = -1,
+          .steps = {{"<11>partition_edit.cpp:# Failed to add ms-dos signature to /dev/sdb, "
+                     "err=32512"},
+                    unsigned255}},
+         {.szName = "partition 1",
+          .machine = machine,
+          .call = CreateSystem8,
+          .result = -1,
+          .steps = {signature,
+                    {first.szText, {.status = 3}},
+                    {"<11>partition_edit.cpp:# Failed to partition disk /dev/sdb, err=768"}}},
+         {.szName = "partition 2",
+          .machine = machine,
+          .call = CreateSystem8,
+          .result = -1,
+          .steps = {signature,
+                    first,
+                    {second.szText, {.status = 1}},
+                    {"<11>partition_edit.cpp:# Failed to [/sbin/sfdisk -N2 -uS -q -f -j0 "
+                     "-z4194304 -tfd -F /dev/sdb], err=256"}}},
+         {.szName = "the signature",
+          .machine = machine,
+          .call = CreateSystem8,
+          .result = -1,
+          .steps = {{signature.szText, {.szErr = "no such disk\n", .status = 1}},
+                    {"<11>partition_edit.cpp:# Failed to add ms-dos signature to /dev/sdb, "
+                     "err=256"},
+                    unsigned255}}});
+    EXPECT_EQ(MachineFileRead(ERROR_LOG),
+              "Nov 05 01:02:03 command=\"/sbin/sfdisk -M1 /dev/sdb\" Error=\"no such disk \"\n");
 }
 
 // ---- the data partition ------------------------------------------------------------------------
@@ -196,62 +191,59 @@ TEST(PartitionCreateData, TakesTheRestOfTheDiskBehindTheGap)
 
 TEST(PartitionCreateData, TellsTheCommandThatFails)
 {
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    MachineTool(machine, DataCommand("-j260352", "-tfd", "/dev/sda"),
-                {.szErr = "does not fit\n", .status = 1});
-    const RUN_RESULT result = Create(machine, "/dev/sda", 2, 8, -1);
-    EXPECT_EQ(LogText(result), "<11>partition_edit.cpp:# Failed to [/sbin/sfdisk -N3  -uS -q -f "
-                               "-j260352 -z-1 -tfd -F /dev/sda], err=256\n");
-    const std::string szLog = MachineFileRead(ERROR_LOG).value_or("");
-    EXPECT_NE(szLog.find(" command=\"/sbin/sfdisk -N3  -uS -q -f -j260352 -z-1 -tfd -F /dev/sda\" "
-                         "Error=\"does not fit \"\n"),
-              std::string::npos)
-        << szLog;
-}
-
-TEST(PartitionCreateData, TellsACommandThatIsKilled)
-{
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    MachineTool(machine, DataCommand("-j260352", "-tfd", "/dev/sda"), {.signal = 9});
-    EXPECT_EQ(LogText(Create(machine, "/dev/sda", 2, 8, -1)),
-              "<11>partition_edit.cpp:# Failed to [/sbin/sfdisk -N3  -uS -q -f -j260352 -z-1 -tfd "
-              "-F /dev/sda], err=9\n");
+    const std::string szCommand = "/sbin/sfdisk -N3 \"\" -uS -q -f -j260352 -z-1 -tfd -F /dev/sda";
+    const std::string szTold = "<11>partition_edit.cpp:# Failed to [/sbin/sfdisk -N3  -uS -q -f "
+                               "-j260352 -z-1 -tfd -F /dev/sda], err=";
+    const auto call = [] {
+        const u32 version = 8;
+        return PartitionCreate("/dev/sda", 2, &version);
+    };
+    ExpectCalls(
+        {{.szName = "killed",
+          .machine = MachineWithConf(CONF_RAID),
+          .call = call,
+          .result = -1,
+          .steps = {{szCommand, {.signal = 9}}, {szTold + "9"}}},
+         {.szName = "refused",
+          .machine = MachineWithConf(CONF_RAID),
+          .call = call,
+          .result = -1,
+          .steps = {{szCommand, {.szErr = "does not fit\n", .status = 1}}, {szTold + "256"}}}});
+    EXPECT_EQ(MachineFileRead(ERROR_LOG),
+              "Nov 05 01:02:03 command=\"/sbin/sfdisk -N3  -uS -q -f -j260352 -z-1 -tfd -F "
+              "/dev/sda\" Error=\"does not fit \"\n");
 }
 
 // ---- which version -----------------------------------------------------------------------------
 
+// Of a disk that has none, or fits no row, the machine's.
 TEST(PartitionCreateVersion, IsThatOfTheDiskUnlessGiven)
 {
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    PartitionedDiskAdd(machine, "sda", PLACES_7);
-    MachineTool(machine, DataCommand("-j262144", "-tfd", "/dev/sda"));
-    EXPECT_EQ(LogText(Create(machine, "/dev/sda", 3, std::nullopt, 0)), "");
-
-    MACHINE machineNewest = MachineWithConf(CONF_RAID);
-    PartitionedDiskAdd(machineNewest, "sda", PLACES_8);
-    MachineTool(machineNewest, DataCommand("-j260352", "-tfd", "/dev/sda"));
-    EXPECT_EQ(LogText(Create(machineNewest, "/dev/sda", 3, std::nullopt, 0)), "");
-}
-
-TEST(PartitionCreateVersion, OfADiskWithoutLayoutIsTheMachines)
-{
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    MachineDiskAdd(machine, "sda");
-    PartitionedDiskAdd(machine, "sdb", PLACES_6);
-    SystemArrayAdd(machine, {{"sdb1"}});
-    MachineTool(machine, DataCommand("-j257040", "-tfd", "/dev/sda"));
-    const RUN_RESULT result = Create(machine, "/dev/sda", 2, std::nullopt, 0);
-    EXPECT_EQ(LogText(result), "<15>partition_layout.cpp:# /dev/sda: dont contain partition [1]\n");
-}
-
-TEST(PartitionCreateVersion, OfADiskThatFitsNoRowIsTheMachines)
-{
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    PartitionedDiskAdd(machine, "sda", PLACES_FOREIGN);
-    PartitionedDiskAdd(machine, "sdb", PLACES_6);
-    SystemArrayAdd(machine, {{"sdb1"}});
-    MachineTool(machine, DataCommand("-j257040", "-tfd", "/dev/sda"));
-    EXPECT_EQ(LogText(Create(machine, "/dev/sda", 2, std::nullopt, 0)), "");
+    MACHINE six = MachineWithConf(CONF_RAID);
+    PartitionedDiskAdd(six, "sdb", PLACES_6);
+    SystemArrayAdd(six, {{"sdb1"}});
+    const struct {
+        const char *szName;
+        MACHINE machine;
+        const DISK_PLACES *pPlaces;
+        const char *szGap;
+        const char *szLog = "";
+    } cases[] = {
+        {"7", MachineWithConf(CONF_RAID), &PLACES_7, "-j262144"},
+        {"8", MachineWithConf(CONF_RAID), &PLACES_8, "-j260352"},
+        {"no row", six, &PLACES_FOREIGN, "-j257040"},
+        {"blank", six, nullptr, "-j257040",
+         "<15>partition_layout.cpp:# /dev/sda: dont contain partition [1]\n"},
+    };
+    for (const auto &row : cases) {
+        SCOPED_TRACE(row.szName);
+        MACHINE machine = row.machine;
+        if (row.pPlaces != nullptr) {
+            PartitionedDiskAdd(machine, "sda", *row.pPlaces);
+        }
+        MachineTool(machine, DataCommand(row.szGap, "-tfd", "/dev/sda"));
+        EXPECT_EQ(LogText(Create(machine, "/dev/sda", 2, std::nullopt, 0)), row.szLog);
+    }
 }
 
 TEST(PartitionCreateVersion, ThatCannotBeFoundEndsIt)
@@ -306,12 +298,6 @@ TEST(PartitionCreateKind, WithNeitherBitIsFoundOutAtTheEnd)
     }
 }
 
-TEST(PartitionCreateKind, RefusesNull)
-{
-    const RUN_RESULT result = Create(MachineWithConf(CONF_RAID), nullptr, 1, 8, -1);
-    EXPECT_EQ(LogText(result), "<11>partition_edit.cpp:# Bad parameters\n");
-}
-
 // ---- cleaning ----------------------------------------------------------------------------------
 
 struct CLEAN_CASE {
@@ -327,112 +313,85 @@ TEST(PartitionClean, DeletesTheRangeOfTheModeAndWritesASignature)
 {
     for (const CLEAN_CASE &row : CLEAN_CASES) {
         SCOPED_TRACE(row.mode);
-        MACHINE machine = MachineMake();
-        MachineTool(machine, {"/sbin/sfdisk", "--fast-delete", row.szRange, "/dev/sda"});
-        MachineTool(machine, "/sbin/sfdisk -M1 /dev/sda");
-        const RUN_RESULT result =
-            QuietCall(machine, [&row] { EXPECT_EQ(PartitionClean("/dev/sda", row.mode), 0); });
-        const std::string szRange = *row.szRange == '\0' ? "\"\"" : row.szRange;
-        EXPECT_EQ(TranscriptText(result), "/sbin/sfdisk --fast-delete " + szRange +
-                                              " /dev/sda\n/sbin/sfdisk -M1 /dev/sda\n");
-    }
-}
-
-TEST(PartitionClean, GoesOnWhateverFails)
-{
-    for (const CLEAN_CASE &row : CLEAN_CASES) {
-        SCOPED_TRACE(row.mode);
-        MACHINE machine = MachineMake();
-        MachineTool(machine, {"/sbin/sfdisk", "--fast-delete", row.szRange, "/dev/sda"},
-                    {.status = 1});
-        MachineTool(machine, "/sbin/sfdisk -M1 /dev/sda", {.status = 2});
-        const RUN_RESULT result =
-            MachineCall(machine, [&row] { EXPECT_EQ(PartitionClean("/dev/sda", row.mode), 0); });
-        EXPECT_EQ(
-            LogText(result),
+        const std::string szCommand = "/sbin/sfdisk --fast-delete " +
+                                      std::string(*row.szRange == '\0' ? "\"\"" : row.szRange) +
+                                      " /dev/sda";
+        const std::string szTold =
             std::string("<15>partition_edit.cpp:# Failed to do '/sbin/sfdisk --fast-delete ") +
-                row.szRange +
-                " /dev/sda'\n"
-                "<11>partition_edit.cpp:# Failed to add ms-dos signature to /dev/sda, "
-                "err=512\n");
+            row.szRange + " /dev/sda'";
+        const auto call = [&row] { return PartitionClean("/dev/sda", row.mode); };
+        ExpectCalls({{.szName = "both succeed",
+                      .call = call,
+                      .steps = {{szCommand}, {"/sbin/sfdisk -M1 /dev/sda"}}},
+                     {.szName = "both fail",
+                      .call = call,
+                      .steps = {{szCommand, {.status = 1}},
+                                {szTold},
+                                {"/sbin/sfdisk -M1 /dev/sda", {.status = 2}},
+                                {"<11>partition_edit.cpp:# Failed to add ms-dos signature to "
+                                 "/dev/sda, err=512"}}}});
     }
-}
-
-TEST(PartitionClean, RefusesNull)
-{
-    const RUN_RESULT result =
-        MachineCall(MachineMake(), [] { EXPECT_QUIET(PartitionClean(nullptr, 3), -1); });
-    EXPECT_EQ(LogText(result), "<11>partition_edit.cpp:# Bad parameters\n");
-    EXPECT_EQ(TranscriptText(result), "");
 }
 
 TEST(PartitionTable, GetsAnMsDosSignature)
 {
-    MACHINE machine = MachineMake();
-    MachineTool(machine, "/sbin/sfdisk -M1 /dev/sdc");
-    QuietCall(machine, [] { EXPECT_EQ(PartitionTableAdd("/dev/sdc"), 0); });
-
-    LastFails(machine, {.status = 1});
-    const RUN_RESULT failed =
-        MachineCall(machine, [] { EXPECT_EQ(PartitionTableAdd("/dev/sdc"), -1); });
-    EXPECT_EQ(LogText(failed), "<11>partition_edit.cpp:# Failed to add ms-dos signature to "
-                               "/dev/sdc, err=256\n");
-
-    const RUN_RESULT null =
-        MachineCall(MachineMake(), [] { EXPECT_QUIET(PartitionTableAdd(nullptr), -1); });
-    EXPECT_EQ(LogText(null), "<11>partition_edit.cpp:# Bad parameters\n");
-}
-
-// The runner's own failure is no exit status.
-TEST(PartitionTable, TellsAPartitionerThatCannotBeStarted)
-{
-    MACHINE machine = MachineMake();
-    machine.faults = {{.szFunction = "fork", .nCall = 1, .error = EAGAIN}};
-    const RUN_RESULT result =
-        MachineCall(machine, [] { EXPECT_EQ(PartitionTableAdd("/dev/sdc"), -1); });
-    EXPECT_EQ(LogText(result), "<11>partition_edit.cpp:# Failed to add ms-dos signature to "
-                               "/dev/sdc, err=-1\n");
+    const STEP signature = {"/sbin/sfdisk -M1 /dev/sdc"};
+    const std::string szTold =
+        "<11>partition_edit.cpp:# Failed to add ms-dos signature to /dev/sdc, err=";
+    const auto call = [] { return PartitionTableAdd("/dev/sdc"); };
+    ExpectCalls({{.szName = "done", .call = call, .steps = {signature}},
+                 {.szName = "failed",
+                  .call = call,
+                  .result = -1,
+                  .steps = {{signature.szText, {.status = 1}}, {szTold + "256"}}},
+                 // The runner's own failure is no exit status.
+                 {.szName = "no process",
+                  .machine = WithFault(MachineMake(), {.szFunction = "fork", .error = EAGAIN}),
+                  .call = call,
+                  .result = -1,
+                  .code = ERR_BAD_PARAMETER,
+                  .steps = {{"fault fork 1"}, {szTold + "-1"}}}});
 }
 
 // ---- wiping a superblock -----------------------------------------------------------------------
 
 TEST(PartitionZero, WipesThePartitionsSuperblock)
 {
-    MACHINE machine = MachineMake();
-    MachineTool(machine, "/sbin/mdadm --zero-superblock /dev/sda1");
-    MachineTool(machine, "/sbin/mdadm --zero-superblock /dev/mmcblk0p2");
-    MachineTool(machine, "/sbin/mdadm --zero-superblock /dev/sdb5");
-    QuietCall(machine, [] {
-        EXPECT_EQ(PartitionZeroSuperblock("/dev/sda", 1), 0);
-        EXPECT_EQ(PartitionZeroSuperblock("/dev/mmcblk0", 2), 0);
-        EXPECT_EQ(PartitionZeroSuperblock("sdb", 5), 0);
-    });
+    ExpectCalls({{.szName = "sda1",
+                  .call = [] { return PartitionZeroSuperblock("/dev/sda", 1); },
+                  .steps = {{"/sbin/mdadm --zero-superblock /dev/sda1"}}},
+                 {.szName = "with a p",
+                  .call = [] { return PartitionZeroSuperblock("/dev/mmcblk0", 2); },
+                  .steps = {{"/sbin/mdadm --zero-superblock /dev/mmcblk0p2"}}},
+                 {.szName = "by its name",
+                  .call = [] { return PartitionZeroSuperblock("sdb", 5); },
+                  .steps = {{"/sbin/mdadm --zero-superblock /dev/sdb5"}}},
+                 {.szName = "it fails in silence",
+                  .call = [] { return PartitionZeroSuperblock("/dev/sda", 1); },
+                  .result = -1,
+                  .steps = {{"/sbin/mdadm --zero-superblock /dev/sda1", {.status = 1}}}},
+                 {.szName = "the boot device has none",
+                  .call = [] { return PartitionZeroSuperblock("/dev/nuroboot", 1); },
+                  .result = -1,
+                  .steps = {{"<11>disk_name.cpp:# we don't generate nuroboot partition name here"},
+                            {"<11>disk_name.cpp:# fail to get device partition name"}}}});
 }
 
-TEST(PartitionZero, FailsSilentlyWithTheCommand)
+TEST(PartitionEdit, BadArgumentsAreTold)
 {
-    MACHINE machine = MachineMake();
-    MachineTool(machine, "/sbin/mdadm --zero-superblock /dev/sda1", {.status = 1});
-    QuietCall(machine, [] { EXPECT_EQ(PartitionZeroSuperblock("/dev/sda", 1), -1); });
-}
-
-TEST(PartitionZero, RefusesNullAndNumbersThatAreNotPositive)
-{
-    const RUN_RESULT result = MachineCall(MachineMake(), [] {
-        RecordReset();
-        EXPECT_EQ(PartitionZeroSuperblock(nullptr, 1), -1);
-        EXPECT_EQ(PartitionZeroSuperblock("/dev/sda", 0), -1);
-        EXPECT_EQ(PartitionZeroSuperblock("/dev/sda", -1), -1);
-        EXPECT_EQ(PartitionZeroSuperblock("/dev/nuroboot", 1), -1);
-        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
-    });
-    EXPECT_EQ(LogErrors(result),
-              "<11>partition_edit.cpp:# Bad parameters\n"
-              "<11>partition_edit.cpp:# Bad parameters\n"
-              "<11>partition_edit.cpp:# Bad parameters\n"
-              "<11>disk_name.cpp:# we don't generate nuroboot partition name here\n"
-              "<11>disk_name.cpp:# fail to get device partition name\n");
-    EXPECT_EQ(TranscriptText(result), "");
+    const STEPS told = {{"<11>partition_edit.cpp:# Bad parameters"}};
+    const u32 version = 8;
+    const std::function<long long()> calls[] = {
+        [&version] { return PartitionCreate(nullptr, 1, &version); },
+        [] { return PartitionClean(nullptr, 3); },
+        [] { return PartitionTableAdd(nullptr); },
+        [] { return PartitionZeroSuperblock(nullptr, 1); },
+        [] { return PartitionZeroSuperblock("/dev/sda", 0); },
+        [] { return PartitionZeroSuperblock("/dev/sda", -1); }};
+    for (size_t i = 0; i < std::size(calls); i++) {
+        SCOPED_TRACE(i);
+        ExpectCalls({{.szName = "refused", .call = calls[i], .result = -1, .steps = told}});
+    }
 }
 
 // ---- asking for one partition ------------------------------------------------------------------

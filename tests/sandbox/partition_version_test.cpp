@@ -378,4 +378,29 @@ TEST(PartitionVersion, FailsWithoutMemoryForTheList)
     EXPECT_TRUE(fSeen);
 }
 
+TEST(PartitionVersion, AMemberWithoutANameIsNoDisk)
+{
+    MACHINE machine = MachineWithConf(CONF_RAID);
+    MachineFolder(machine, "/sys/block/md0/md/dev-");
+    const RUN_RESULT result = MachineCall(machine, [] {
+        u32 version = 0;
+        EXPECT_EQ(PartitionLayoutGetMax(&version, 1), 0);
+        EXPECT_EQ(version, 8U);
+    });
+    EXPECT_EQ(LogText(result), "<15>partition_layout.cpp:# : dont contain partition [1]\n");
+}
+
+// Only a version that is still none becomes the newest.
+TEST(PartitionVersion, AVersionThatTheCallerHasStaysWhereNoMemberIsKnown)
+{
+    MACHINE machine = MachineWithConf(CONF_RAID);
+    PartitionedDiskAdd(machine, "sda", PLACES_FOREIGN);
+    SystemArrayAdd(machine, {{"sda1"}});
+    MachineCall(machine, [] {
+        u32 version = 5;
+        EXPECT_EQ(PartitionLayoutGetMax(&version, 1), 0);
+        EXPECT_EQ(version, 5U);
+    });
+}
+
 } // namespace

@@ -560,7 +560,8 @@ TEST(SyncAction, TheTextIsAPrefixOfItsWord)
         {"check\n", 0, 4},
         {"repair\n", 0, 5},
         {"recover\n", 0, 6},
-        {"\n", 0, 0},  // empty text is a prefix of the first word
+        {"\n", 0, 0}, // empty text is a prefix of the first word
+        {std::string("\0idle\n", 6), 0, 0},
         {"r\n", 0, 2}, // of several words the first
         {"re\n", 0, 2},
         {"res\n", 0, 2},

@@ -492,6 +492,15 @@ TEST(ComponentSize, WithoutAListThereIsNoSuchDriver)
     QuietCall(machine, [] { EXPECT_QUIET(ComponentSizeOfMd9(), PLAIN); });
 }
 
+// Without memory for a word the kernel's list names no driver, so the array is not partitionable.
+TEST(ComponentSize, WithoutMemoryNoDriverIsKnown)
+{
+    MACHINE machine = PartitionableMake("Block devices:\n254 mdp\n");
+    MachineCall(machine, [] { EXPECT_EQ(ComponentSizeOfMd9(), PARTITIONABLE); });
+    machine.faults = {{.szFunction = "realloc", .error = ENOMEM}};
+    MachineCall(machine, [] { EXPECT_EQ(ComponentSizeOfMd9(), PLAIN); });
+}
+
 TEST(ComponentSize, TheDriverIsLookedUpUntilItIsFound)
 {
     MachineCall(PartitionableMake("Block devices:\n"), [] {
@@ -684,64 +693,89 @@ TEST(RaidRequest, TheArrayInformationIsTheDriversRecord)
 }
 
 struct REQUEST_FAILURE_CASE {
-    int error;
+    const char *szName;
+    MACHINE_MD md;
+    long long (*pAsk)(int fd);
     u32 code;
-    const char *szLog;
+    const char *szLog = "";
 };
 
-TEST(RaidRequest, TheArrayInformationFails)
+long long InfoAsk(int fd)
 {
-    for (const REQUEST_FAILURE_CASE &one : {
-             REQUEST_FAILURE_CASE{EINTR, 0xA700, ""},
-             {ENODEV, 0x8000,
-              "<15>raid_info.cpp:# Failed to ioctl for raid status, errno=No such device\n"},
-             {EFAULT, 0x8000,
-              "<15>raid_info.cpp:# Failed to ioctl for raid status, errno=Bad address\n"},
-         }) {
-        const RUN_RESULT result = WithArray({.nMd = 2, .errnoInfo = one.error}, [&](int fd) {
-            mdu_array_info_t array = {};
-            EXPECT_EQ(RAIDIoctlInfo(fd, &array), -1);
-            EXPECT_EQ(NLIBCErrGet(), one.code);
-        });
-        EXPECT_EQ(LogText(result), one.szLog);
-    }
+    mdu_array_info_t array = {};
+    return RAIDIoctlInfo(fd, &array);
 }
 
-TEST(RaidRequest, TheSizeFails)
+long long SizeAsk(int fd)
 {
-    for (const REQUEST_FAILURE_CASE &one : {
-             REQUEST_FAILURE_CASE{ENODEV, 0x0600, ""},
-             {EINTR, 0x8000,
-              "<15>raid_info.cpp:# Failed to ioctl for raid status, "
-              "errno=Interrupted system call\n"},
-             {EIO, 0x8000,
-              "<15>raid_info.cpp:# Failed to ioctl for raid status, errno=Input/output error\n"},
-         }) {
-        const RUN_RESULT result = WithArray({.nMd = 2, .errnoSize = one.error}, [&](int fd) {
-            u64 cb = 99;
-            EXPECT_EQ(RAIDIoctlSize(fd, &cb), -1);
-            EXPECT_EQ(cb, 0U); // written first
-            EXPECT_EQ(NLIBCErrGet(), one.code);
-        });
-        EXPECT_EQ(LogText(result), one.szLog);
-    }
+    u64 cb = 99;
+    const int result = RAIDIoctlSize(fd, &cb);
+    EXPECT_EQ(cb, 0U); // written first
+    return result;
 }
 
-TEST(RaidRequest, TheHealthFails)
+long long HealthAsk(int fd)
 {
-    for (const REQUEST_FAILURE_CASE &one : {
-             REQUEST_FAILURE_CASE{ENODEV, 0x0600, ""},
-             {EINTR, 0xA700, ""},
-             {ENOTTY, 0x8000,
-              "<15>raid_info.cpp:# Failed to ioctl for raid status, "
-              "errno=Inappropriate ioctl for device\n"},
-         }) {
-        const RUN_RESULT result = WithArray({.nMd = 2, .errnoHealth = one.error}, [&](int fd) {
-            u32 status = 99;
-            EXPECT_EQ(RAIDIoctlStatus(fd, &status), -1);
-            EXPECT_EQ(NLIBCErrGet(), one.code);
+    u32 status = 99;
+    return RAIDIoctlStatus(fd, &status);
+}
+
+long long ResyncAsk(int fd)
+{
+    RAID_REBUILD_STATUS rebuild = {97, 98, 99};
+    const int result = RAIDRebuildStatusGet(fd, &rebuild);
+    EXPECT_EQ(rebuild.state, 97U);
+    EXPECT_EQ(rebuild.done, 98U);
+    EXPECT_EQ(rebuild.total, 99U);
+    return result;
+}
+
+TEST(RaidRequest, FailsWithItsOwnCodeOrTheCallsOwn)
+{
+    const REQUEST_FAILURE_CASE cases[] = {
+        {"information, interrupted", {.errnoInfo = EINTR}, InfoAsk, 0xA700},
+        {"information, no array",
+         {.errnoInfo = ENODEV},
+         InfoAsk,
+         0x8000,
+         "raid status, errno=No such device"},
+        {"information", {.errnoInfo = EFAULT}, InfoAsk, 0x8000, "raid status, errno=Bad address"},
+        {"size, no array", {.errnoSize = ENODEV}, SizeAsk, 0x0600},
+        {"size, interrupted",
+         {.errnoSize = EINTR},
+         SizeAsk,
+         0x8000,
+         "raid status, errno=Interrupted system call"},
+        {"size", {.errnoSize = EIO}, SizeAsk, 0x8000, "raid status, errno=Input/output error"},
+        {"health, no array", {.errnoHealth = ENODEV}, HealthAsk, 0x0600},
+        {"health, interrupted", {.errnoHealth = EINTR}, HealthAsk, 0xA700},
+        {"health",
+         {.errnoHealth = ENOTTY},
+         HealthAsk,
+         0x8000,
+         "raid status, errno=Inappropriate ioctl for device"},
+        {"resync, no array", {.errnoSync = ENODEV}, ResyncAsk, 0x0600},
+        {"resync, interrupted",
+         {.errnoSync = EINTR},
+         ResyncAsk,
+         0x8000,
+         "sync status, errno=Interrupted system call"},
+        {"resync",
+         {.errnoSync = ENOTTY},
+         ResyncAsk,
+         0x8000,
+         "sync status, errno=Inappropriate ioctl for device"},
+    };
+    for (const REQUEST_FAILURE_CASE &row : cases) {
+        SCOPED_TRACE(row.szName);
+        const RUN_RESULT result = WithArray(row.md, [&row](int fd) {
+            EXPECT_EQ(row.pAsk(fd), -1);
+            EXPECT_EQ(NLIBCErrGet(), row.code);
         });
-        EXPECT_EQ(LogText(result), one.szLog);
+        EXPECT_EQ(LogText(result),
+                  *row.szLog == '\0'
+                      ? ""
+                      : std::string("<15>raid_info.cpp:# Failed to ioctl for ") + row.szLog + "\n");
     }
 }
 
@@ -762,29 +796,6 @@ TEST(RaidRequest, TheHealthIsMapped)
         });
         EXPECT_EQ(LogText(result), "<15>raid_info.cpp:# unknown raid status, status=" +
                                        std::to_string(health) + "\n");
-    }
-}
-
-TEST(RaidRequest, TheResyncFails)
-{
-    for (const REQUEST_FAILURE_CASE &one : {
-             REQUEST_FAILURE_CASE{ENODEV, 0x0600, ""},
-             {EINTR, 0x8000,
-              "<15>raid_info.cpp:# Failed to ioctl for sync status, "
-              "errno=Interrupted system call\n"},
-             {ENOTTY, 0x8000,
-              "<15>raid_info.cpp:# Failed to ioctl for sync status, "
-              "errno=Inappropriate ioctl for device\n"},
-         }) {
-        const RUN_RESULT result = WithArray({.nMd = 2, .errnoSync = one.error}, [&](int fd) {
-            RAID_REBUILD_STATUS rebuild = {97, 98, 99};
-            EXPECT_EQ(RAIDRebuildStatusGet(fd, &rebuild), -1);
-            EXPECT_EQ(rebuild.state, 97U);
-            EXPECT_EQ(rebuild.done, 98U);
-            EXPECT_EQ(rebuild.total, 99U);
-            EXPECT_EQ(NLIBCErrGet(), one.code);
-        });
-        EXPECT_EQ(LogText(result), one.szLog);
     }
 }
 

@@ -216,6 +216,21 @@ TEST(DiskUsed, GoesOnBehindASuperblockThatNamesNoArray)
     ExpectUsed(machine, 4);
 }
 
+// The boot device has no partition names, so only its own superblock can tell.
+TEST(DiskUsed, TheBootDeviceIsAskedAsAWhole)
+{
+    for (const int nMd : {100, 101}) {
+        MACHINE machine = MachineWithConf(CONF_RAID);
+        SuperblockExpect(machine, "nuroboot", nMd);
+        const RUN_RESULT result = MachineCall(machine, [nMd] {
+            int nFound = UNTOUCHED;
+            EXPECT_EQ(RAIDDiskIsUsedByRAID("/dev/nuroboot", &nFound), nMd >= 101 ? 1 : 0);
+            EXPECT_EQ(nFound, nMd >= 101 ? nMd : UNTOUCHED);
+        });
+        EXPECT_EQ(TranscriptText(result), "/sbin/mdadm -E /dev/nuroboot\n");
+    }
+}
+
 TEST(DiskUsed, RefusesNull)
 {
     const RUN_RESULT result = MachineCall(MachineMake(), [] {

@@ -85,6 +85,10 @@ TEST(SystemDiskDetail, RefusesNull)
             EXPECT_FAILS(RAIDSystemDiskStatusGet(row.ppPair, row.szDisk, &state), -1,
                          ERR_BAD_PARAMETER);
         }
+        EXPECT_FAILS(RAIDSystemDiskStatusDetailGet(pair, "sda", nullptr, &state), -1,
+                     ERR_BAD_PARAMETER);
+        EXPECT_FAILS(RAIDSystemDiskStatusDetailGet(pair, "sda", &state, nullptr), -1,
+                     ERR_BAD_PARAMETER);
         EXPECT_EQ(state, UNTOUCHED);
         RAIDInfoPairFree(pair);
     });
@@ -165,25 +169,23 @@ void ExpectStatus(const STATUS_CASE &row, u32 statusExpected)
     RAIDInfoPairFree(pair);
 }
 
+// From the root array's alone where swap is on no disk.
 TEST(SystemDiskStatus, FollowsFromBothStates)
 {
-    for (const char *const szNoSwap : {"", "no_disk_swap=no\n", "no_disk_swap=\n"}) {
-        QuietCall(MachineWithConf(szNoSwap), [] {
+    const struct {
+        const char *szConf;
+        bool fSwap;
+    } models[] = {{"", true},
+                  {"no_disk_swap=no\n", true},
+                  {"no_disk_swap=\n", true},
+                  {"no_disk_swap=yes\n", false},
+                  {"no_disk_swap=\"YES\"\n", false}};
+    for (const auto &model : models) {
+        SCOPED_TRACE(model.szConf);
+        QuietCall(MachineWithConf(model.szConf), [&model] {
             for (const STATUS_CASE &row : STATUS_CASES) {
                 SCOPED_TRACE(testing::Message() << row.root << ' ' << row.swap);
-                ExpectStatus(row, row.status);
-            }
-        });
-    }
-}
-
-TEST(SystemDiskStatus, FollowsFromTheRootArrayAloneWithoutSwapOnDisks)
-{
-    for (const char *const szNoSwap : {"no_disk_swap=yes\n", "no_disk_swap=\"YES\"\n"}) {
-        QuietCall(MachineWithConf(szNoSwap), [] {
-            for (const STATUS_CASE &row : STATUS_CASES) {
-                SCOPED_TRACE(testing::Message() << row.root << ' ' << row.swap);
-                ExpectStatus(row, row.statusWithoutSwap);
+                ExpectStatus(row, model.fSwap ? row.status : row.statusWithoutSwap);
             }
         });
     }

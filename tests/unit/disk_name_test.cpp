@@ -84,8 +84,13 @@ constexpr INDEX_CASE INDEX_CASES[] = {
     {"sdsda", 12948},       // s d a: ((18 + 1)·26 + 3 + 1)·26 + 0
     {"isdb", 171133},       // i s d b: (((8 + 1)·26 + 18 + 1)·26 + 3 + 1)·26 + 1
     {"/dev/isda1", 171132},
-    {"mmcblk0", 160452978},   // m m c b l k: 12 12 2 1 11 10
-    {"nuroboot", -1105745419} // 119153338869 modulo 2^32, with its sign
+    {"mmcblk0", 160452978},    // m m c b l k: 12 12 2 1 11 10
+    {"nuroboot", -1105745419}, // 119153338869 modulo 2^32, with its sign
+    // Only letters count, up to the first character that is none.
+    {"sda{", 0},
+    {"sdb`a", 1},
+    {"/dev/sdaB", 0},
+    {"sd~", -1},
 };
 
 TEST(DiskIndexGet, ReadsTheLettersAsANumber)

@@ -58,6 +58,7 @@ TEST(DiskContainerFromPortType, MapsThePortTypes)
             << row.type;
         EXPECT_EQ(mask, row.mask) << row.type;
     }
+    EXPECT_EQ(DiskContainerFromPortType(INTERNAL_DEVICE, nullptr), -1);
     EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
 }
 
