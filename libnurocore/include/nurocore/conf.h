@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: MIT
 #pragma once
 
-// What the appliance's model is like.
+// What the configuration file says about the appliance's model.
 
 inline constexpr char NUROINFO_CONF_PATH[] = "/etc.defaults/nuroinfo.conf";
 
@@ -15,6 +15,6 @@ int NLIBCConfMaxDisksGet();
 // The width of the system arrays: a key of its own, else the number of disks.
 int NLIBCConfMaxSysRaidDisksGet();
 
-// 1 on a machine with two heads, else 0. Asked once per process, and once per boot of the
-// configuration: the answer is left behind as a marker file in /tmp.
+// 1 on a machine with two heads, else 0. The answer is kept for the life of the process, and in a
+// marker file in /tmp until the next boot; the configuration file is read when there is neither.
 int NLIBCConfSupportDualHead();

@@ -4,7 +4,7 @@
 // The last-error record: what went wrong most recently in a library function, and where.
 //
 // One set of process-wide values, not per thread and not locked. It is never cleared: a success
-// leaves the last failure standing, so read it only right after a call that reported a failure.
+// leaves the last failure in place, so read it only right after a call that reported a failure.
 
 #include "nurocore/types.h"
 
@@ -23,11 +23,11 @@ constexpr u32 ERR_PIPE_FAILED = 0x8100;    // a pipe could not be made
 constexpr u32 ERR_FORK_FAILED = 0x9700;    // fork failed
 constexpr u32 ERR_TEXT_NOT_FOUND = 0x9A00; // an expected word is missing in a text from sysfs
 constexpr u32 ERR_INTERRUPTED = 0xA700;    // an md request answered EINTR
-constexpr u32 ERR_BAD_FORMAT = 0xBE00;     // a name has not the expected form
+constexpr u32 ERR_BAD_FORMAT = 0xBE00;     // a name does not have the expected form
 constexpr u32 ERR_OUT_OF_SPACE = 0xBF00;   // a joined text does not fit the caller's buffer
-constexpr u32 ERR_NO_SUCH_CHILD = 0xE300;  // not a pipe stream of ours, or its child is lost
+constexpr u32 ERR_NO_SUCH_CHILD = 0xE300;  // not from NLIBCPopen, or waiting for its child failed
 
-// Overwrites the record. szFile is kept by address, never copied: hand in a constant.
+// Overwrites the record. Only the address of szFile is stored, so it must be a constant.
 void NLIBCErrSet(u32 code, const char *szFile, int line);
 
 // The code of the last failure; 0 before any.
@@ -39,5 +39,5 @@ const char *NLIBCErrGetFile();
 // The line in that file; 0 before any failure.
 int NLIBCErrGetLine();
 
-// Records a failure at this very place.
+// Records a failure with the file and line of the call.
 #define NLIBCErrSetHere(code) NLIBCErrSet((code), __FILE_NAME__, __LINE__)

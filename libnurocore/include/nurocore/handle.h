@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: MIT
 #pragma once
 
-// Owners of what libc hands out: one deleter a kind, so that no way out of a function leaks. A type
-// of our own has its owner beside it.
+// Owners of what libc hands out: one deleter for each kind, so that no return path of a function
+// leaks. A type of our own has its owner beside it.
 
 #include <cstddef>
 #include <cstdio>

@@ -2,7 +2,7 @@
 #pragma once
 
 // A string-to-string map in one heap block: header, open-addressing slots and a pool of texts.
-// Only setting may move the block, and then the pointer that was handed in is updated.
+// Only NLIBCHashSet may move the block; it then updates the caller's pointer.
 
 #include "nurocore/szlist_base.h"
 #include "nurocore/types.h"
@@ -16,10 +16,10 @@ struct NLIBHASH_SLOT {
 
 struct NLIBHASH {
     i32 cbPool;      // bytes of the pool
-    i32 cbFree;      // bytes of the pool not taken yet
+    i32 cbFree;      // bytes of the pool not used yet
     i32 nSlot;       // slots
     i32 nEntry;      // keys stored
-    char *pPoolNext; // first byte of the pool not taken yet
+    char *pPoolNext; // first byte of the pool not used yet
 };
 
 static_assert(sizeof(NLIBHASH) == 4 * sizeof(i32) + sizeof(char *));
@@ -60,6 +60,6 @@ const char *NLIBCHashGet(const NLIBHASH *pHash, const char *szKey);
 // for a NULL table or when the list cannot grow.
 int NLIBCHashKeyListGet(const NLIBHASH *pHash, PNLIBSZLIST *ppList);
 
-// The slot where the search for a text begins: 0 to nSlot - 1, -1 for NULL or no slots. The same
-// on every processor, so the order of a key list is too.
+// The slot where the search for a text begins: 0 to nSlot - 1; -1 for NULL or no slots. It is the
+// same on every processor, and so is the order of a key list.
 int NLIBCHashIndex(const char *szText, int nSlot);

@@ -1,15 +1,16 @@
 // SPDX-License-Identifier: MIT
 #pragma once
 
-// Reading that is not put off by an interruption. errno is given back as it was at the call.
+// Reading that carries on after an interruption by a signal. errno is restored to its value at the
+// call.
 
 #include <cstdio>
 #include <sys/types.h>
 
-// fgets, tried up to three times while it is interrupted. NULL at the end of the stream, on
-// failure, and with ERR_BAD_PARAMETER for bad arguments.
+// fgets, with up to three attempts when it is interrupted. Returns NULL at the end of the stream,
+// on failure, and for bad arguments (ERR_BAD_PARAMETER).
 char *NLIBCFgets(char *szBuf, int cbBuf, FILE *pStream);
 
-// read, tried up to three times while it is interrupted. Bytes read, 0 at the end, -1 on failure,
-// with ERR_BAD_PARAMETER for bad arguments (0 bytes are one).
+// read, with up to three attempts when it is interrupted. Returns the bytes read, 0 at the end, -1
+// on failure; -1 with ERR_BAD_PARAMETER for bad arguments, among them a size of 0.
 ssize_t NLIBCRead(int fd, void *pBuf, size_t cbBuf);

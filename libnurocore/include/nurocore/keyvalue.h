@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: MIT
 #pragma once
 
-// Files of key=value lines. A line that begins with '#' or ';' is a comment; key and value lose
-// the white space around them and then one pair of enclosing double quotes.
+// Files of key=value lines. A line that begins with '#' or ';' is a comment; white space around key
+// and value is removed, and then one pair of enclosing double quotes.
 
 constexpr int KEYVALUE_FIRST_MATCH = 0; // the first line that holds the key decides
 constexpr int KEYVALUE_LAST_MATCH = 1;  // the last one does

@@ -14,12 +14,12 @@
 // ERR_OPEN_FAILED. The stream is closed with NLIBCPclose.
 [[gnu::sentinel]] FILE *NLIBCPopen(const char *szPath, const char *szMode, ...);
 
-// The same with a vector of the caller's, ended by NULL; it stays the caller's.
+// The same with an argument vector that ends with NULL; the caller keeps ownership of it.
 FILE *NLIBCPopenV(const char *szPath, const char *szMode, char *const argv[]);
 
 // Closes the stream and waits for its program. Returns the raw wait status (exit status 1 is 256),
-// 0 when somebody else has reaped it; -1 with ERR_BAD_PARAMETER for NULL, with ERR_NO_SUCH_CHILD
-// for a stream of another origin (it stays open) or a failed wait.
+// 0 when the child was already reaped elsewhere; -1 with ERR_BAD_PARAMETER for NULL, with
+// ERR_NO_SUCH_CHILD for a stream that NLIBCPopen did not open (it stays open) or a failed wait.
 int NLIBCPclose(FILE *pStream);
 
 // Closes a pipe stream at the end of a scope, for callers that do not ask how its program ended.

@@ -72,9 +72,9 @@ int NLIBCSzListCaseFind(const NLIBSZLIST *pList, const char *szItem);
 // NULL with ERR_BAD_PARAMETER outside the list.
 const char *NLIBCSzListRemove(PNLIBSZLIST pList, int index);
 
-// Replaces the string at index. The list never grows here, and nobody looks whether there is room:
-// a string longer than the old one needs its length + 1 bytes of nFree, which the caller has to
-// know, or it overwrites slots. Returns index, or in a sorted list what NLIBCSzListFind returns for
+// Replaces the string at index. The list never grows here, and room is not checked: a string longer
+// than the old one needs length + 1 bytes of nFree, which the caller must check, or it overwrites
+// slots. Returns index, or in a sorted list what NLIBCSzListFind returns for
 // the string; -1 on failure, and always with SZLIST_CASE_SORTED (ERR_BAD_PARAMETER, although the
 // string was replaced).
 int NLIBCSzListSet(PNLIBSZLIST *ppList, int index, const char *szItem);

@@ -12,7 +12,7 @@
 // Copies szSrc without the white space around it (blank, tab, line feed, carriage return) and
 // without one pair of enclosing double quotes to szDst, which has room for strlen(szSrc) + 1
 // bytes; works in place when szDst is NULL or szSrc. Returns the length left, 0 or more; -1 with
-// ERR_BAD_PARAMETER when szSrc is NULL or szDst points into it behind its first byte.
+// ERR_BAD_PARAMETER when szSrc is NULL or szDst points into it after its first byte.
 int NLIBCStrTrimSpace(char *szSrc, char *szDst);
 
 // The next field of *pszCursor that is not empty, split at any character of szDelims as strsep
@@ -32,7 +32,7 @@ size_t NLIBCStrAppend(char *szText, size_t cbText, const char *szMore);
 // terminator do not fit: szText is then as it was.
 int NLIBCStrAppendWhole(char *szText, size_t cbText, const char *szMore);
 
-// szText behind the prefix when it begins with it, else szText.
+// szText after the prefix if it begins with it, else szText.
 const char *NLIBCStrSkipPrefix(const char *szText, std::string_view prefix);
 
 // The decimal number that szText begins with, as strtol reads it (white space, sign, then digits

@@ -12,7 +12,7 @@
 namespace
 {
 
-// "yes" and its terminator, and one byte more: a longer value is a failed lookup and so a no.
+// "yes", its terminator and one byte more: a longer value makes the lookup fail, which means no.
 constexpr int YES_VALUE_SIZE = 5;
 constexpr int NUMBER_VALUE_SIZE = 64;
 
@@ -36,7 +36,7 @@ bool NumberGet(const char *szKey, int *pNumber)
     return true;
 }
 
-// Without its marker the next process asks again; the answer is the same either way.
+// Without the marker the next process reads the configuration again and gets the same answer.
 void MarkerLeave(const char *szMarker)
 {
     if (NLIBCFileTouch(szMarker) != 0) {

@@ -27,7 +27,7 @@ int NLIBCFileTouch(const char *szPath)
     }
     const STREAM_OWNER pFile(fopen(szPath, "w"));
     if (pFile == nullptr) {
-        // The words say the opposite of what happened; kept, log readers look for them.
+        // Kept: the words say the opposite of what happened, but log readers search for them.
         NLIBCLog(LOG_ERR, "file exist: %s, errno=%m", szPath);
         return -1;
     }

@@ -17,8 +17,8 @@ namespace
 
 constexpr int CHECKED_VALUE_SIZE = 512;
 
-// Where a lookup stands. szValue is the caller's buffer until a line without a value makes the
-// lookup forget it; cbNeeded is 0 until a value was seen.
+// The state of a lookup. szValue is the caller's buffer until a line without a value makes the
+// lookup forget it; cbNeeded is 0 until a value is found.
 struct LOOKUP {
     char *szValue;
     int cbValue;

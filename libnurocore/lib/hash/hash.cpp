@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: MIT
 //
 // One allocation, lowest address first: header, nSlot slots, cbPool bytes of texts. Texts are only
-// ever appended; a value that gives way to a longer one leaves its bytes behind. No key is deleted,
-// so a search may stop at the first free slot.
+// ever appended; a value that is replaced by a longer one leaves its bytes unused. No key is ever
+// deleted, so a search may stop at the first free slot.
 #include "nurocore/hash.h"
 
 #include "nurocore/error.h"
@@ -35,7 +35,7 @@ const NLIBHASH_SLOT *Slots(const NLIBHASH *pHash)
 // In 64 bits, so that a table that does not fit its fields or the address space is noticed.
 PNLIBHASH TableAlloc(i64 nSlot, i64 cbPool)
 {
-    // Kept: a crowded table of one slot cannot grow, 1 * 4 - 5 slots are fewer than none.
+    // Kept: a crowded table of one slot cannot grow: 1 * 4 - 5 is negative.
     const bool fFieldsFit = nSlot >= 0 && nSlot <= INT_MAX && cbPool <= INT_MAX;
     const i64 cbTable = HASH_HEADER_SIZE + nSlot * HASH_SLOT_SIZE + cbPool;
     const auto pHash = fFieldsFit && std::in_range<size_t>(cbTable)
@@ -85,8 +85,7 @@ void PairStore(PNLIBHASH pHash, int index, const char *szKey, const char *szValu
     pHash->nEntry++;
 }
 
-// The same pairs in a table of another size. A pair lost to a smaller table cannot be: both sizes
-// only ever grow.
+// The same pairs in a larger table. Every pair fits, because neither size ever shrinks.
 PNLIBHASH Rebuild(const NLIBHASH *pHash, i64 nSlot, i64 cbPool)
 {
     NLIBHASH *const pNew = TableAlloc(nSlot, cbPool);
@@ -173,7 +172,7 @@ int NLIBCHashSet(PNLIBHASH *ppHash, const char *szKey, const char *szValue)
         Slots(pHash)[index].pszValue = PoolAppend(pHash, szValue);
     }
     if (pHash != pOld) {
-        // Only now: key and value may have been texts of the old table.
+        // Freed last: key and value may be texts of the old table.
         NLIBCHashFree(pOld);
     }
     *ppHash = pHash;

@@ -11,11 +11,11 @@
 // A slot is the 32-bit offset of its string from the start of the block. Offsets, not pointers:
 // a block is moved by copying, and all sizes are the same on 32-bit and 64-bit machines.
 //
-// What holds between two calls:
+// Invariants between two calls:
 //   - 24 + 4 * nItem + nFree + (nSize - EndofFree) == nSize; the bytes of strings that were removed
-//     or replaced are dead, but count as strings until the next growth drops them;
+//     or replaced are unused, but count as strings until the next growth drops them;
 //   - the last byte of the block is 0; a slot that holds its offset is empty. The first string
-//     stored ends in that byte, so a first string of length 0 is an empty slot by identity.
+//     stored ends in that byte, so if it is empty, its slot counts as an empty one.
 #include "nurocore/szlist_base.h"
 
 #include "nurocore/error.h"
@@ -35,8 +35,8 @@ constexpr i32 LIST_SIZE_MIN = 512;
 constexpr i32 LIST_HEADER_SIZE = sizeof(NLIBSZLIST);
 constexpr i32 LIST_SLOT_SIZE = sizeof(i32);
 
-// Kept: the case-insensitive search and merge take a difference of exactly -2 for a failure, so
-// such lists may miss an item and hold it twice. Lists in use rely on their order.
+// Kept: the case-insensitive search and merge treat a difference of exactly -2 as a failure, so
+// such a list may miss an item and hold it twice. Existing lists rely on the resulting order.
 constexpr int COMPARE_FAILED = -2;
 
 bool IsIndexIn(const NLIBSZLIST *pList, int index)
@@ -123,7 +123,7 @@ PNLIBSZLIST BlockAlloc(i32 nSize)
     return pList;
 }
 
-// Copies szItem below the strings; nFree is the caller's to settle. szItem may lie in the block.
+// Copies szItem below the strings; the caller adjusts nFree. szItem may lie in the block.
 i32 StringStore(PNLIBSZLIST pList, const char *szItem, size_t cbItem)
 {
     pList->EndofFree -= static_cast<i32>(cbItem);
@@ -131,7 +131,7 @@ i32 StringStore(PNLIBSZLIST pList, const char *szItem, size_t cbItem)
     return pList->EndofFree;
 }
 
-// A copy of the list, without its dead bytes, in a block of twice the size.
+// A copy of the list, without its unused string bytes, in a block of twice the size.
 PNLIBSZLIST Grow(const NLIBSZLIST *pList)
 {
     if (pList->nSize > INT_MAX / 2) {
@@ -157,8 +157,8 @@ PNLIBSZLIST Grow(const NLIBSZLIST *pList)
     return pNew;
 }
 
-// Doubles the list until nNeeded bytes are free. The block it started from is handed out as
-// pStart instead of being freed: the string to be stored may lie in it.
+// Doubles the list until nNeeded bytes are free. The first block is not freed but handed to pStart,
+// because the string to be stored may lie in it.
 bool MakeRoom(PNLIBSZLIST *ppList, i64 nNeeded, HEAP_OWNER<NLIBSZLIST> &pStart)
 {
     while (nNeeded > (*ppList)->nFree) {
@@ -234,7 +234,7 @@ void NeighboursMerge(i32 *pFirst, i32 *pMiddle, i32 *pLast, SLOT_LESS isLess)
     NeighboursMerge(pJoint, pRight, pLast, isLess);
 }
 
-// Stable whatever libc's sort does, and without an allocation that could fail.
+// Not qsort: this is stable with every libc, and does not allocate memory, which could fail.
 void SlotsSort(i32 *pFirst, i32 *pLast, SLOT_LESS isLess)
 {
     if (std::is_sorted(pFirst, pLast, isLess)) {
@@ -373,14 +373,14 @@ int NLIBCSzListSet(PNLIBSZLIST *ppList, int index, const char *szItem)
     if (cbItem <= strlen(SzListItem(pList, index)) + 1) {
         memmove(SzListAt(pList, SzListSlots(pList)[index]), szItem, cbItem);
     } else {
-        // Kept: no growth and no test for room here, callers see to nFree themselves.
+        // Kept: the list does not grow here and room is not checked; callers look at nFree.
         SzListSlots(pList)[index] = StringStore(pList, szItem, cbItem);
         pList->nFree -= static_cast<i32>(cbItem);
     }
     if (!SzListIsSortedMode(pList->fMode)) {
         return index;
     }
-    // Found by its stored copy: sorting moves slots, not strings, so szItem may lie in the list.
+    // szItem may lie in the list: sorting moves slots, never strings.
     Sort(pList, SzListCompareOf(pList->fMode));
     return NLIBCSzListFind(pList, szItem);
 }

@@ -43,5 +43,5 @@ bool SzListIsSortedMode(int fMode);
 // By bytes, or without regard to case for SZLIST_CASE_SORTED.
 SZLIST_COMPARE SzListCompareOf(int fMode);
 
-// True for a result of that comparison that the binary search and the merge take for a failure.
+// True for a result of the comparison that the binary search and the merge treat as a failure.
 bool SzListIsCompareFailed(SZLIST_COMPARE pCompare, int difference);

@@ -14,7 +14,7 @@
 namespace
 {
 
-// Enlarges the caller's buffer to cbNeeded bytes; without memory it is freed and NULL.
+// Enlarges the caller's buffer to cbNeeded bytes. Without memory it is freed and set to NULL.
 bool JoinBufferEnlarge(char **pszBuf, int *pcbBuf, i64 cbNeeded)
 {
     if (cbNeeded <= *pcbBuf) {

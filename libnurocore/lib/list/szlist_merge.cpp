@@ -56,11 +56,12 @@ bool OrSameOrder(PNLIBSZLIST *ppList, const NLIBSZLIST *pOther, bool fNew, PNLIB
 {
     const int fMode = (*ppList)->fMode;
     if (!fNew) {
-        // Without a re-sort, so that what is pushed goes to the end and the walk stays in front.
+        // Not re-sorted, so that pushed items go to the end and do not shift what is still to be
+        // read.
         (*ppResult)->fMode = SZLIST_UNSORTED;
     }
     const bool isMerged = MergeSorted(*ppList, pOther, SzListCompareOf(fMode), fNew, ppResult);
-    // One that gave up leaves a list in no order, and says so by its mode.
+    // A merge that was given up leaves the list unsorted, and its mode says so.
     if (isMerged) {
         NLIBCSzListSort(*ppResult, fMode);
     }
@@ -93,7 +94,7 @@ bool OrSortedOther(const NLIBSZLIST *pThis, const NLIBSZLIST *pOther, int flags,
             }
         }
     } else if (flags == 0) {
-        // Backward, so that a removal does not shift what is still to be looked at.
+        // Backward, so that a removal does not shift the slots that are still to be read.
         for (i32 i = nThis - 1; i >= 0; i--) {
             if (FindInOrderOf(pOther, SzListItem(*ppResult, i)) >= 0) {
                 (void)NLIBCSzListRemove(*ppResult, i);
@@ -103,7 +104,7 @@ bool OrSortedOther(const NLIBSZLIST *pThis, const NLIBSZLIST *pOther, int flags,
     return true;
 }
 
-// pOther is unsorted and the result is in place or sorted: what it has not got yet is added.
+// pOther is unsorted: adds those of its items that the result does not hold yet.
 bool OrMissing(PNLIBSZLIST *ppResult, const NLIBSZLIST *pOther)
 {
     for (i32 i = 0; i < pOther->nItem; i++) {

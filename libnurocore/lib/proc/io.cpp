@@ -19,7 +19,7 @@ char *NLIBCFgets(char *szBuf, int cbBuf, FILE *pStream)
         NLIBCErrSetHere(ERR_BAD_PARAMETER);
         return nullptr;
     }
-    // Kept: callers' "errno=%m" after a failed read shows what stood before it.
+    // Kept: "errno=%m" in a caller's log line after a failed read shows the errno from before it.
     const int errnoAtEntry = errno;
     char *pszRead = nullptr;
     for (int i = 0; i < READ_ATTEMPTS; i++) {

@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: MIT
 #pragma once
 
-// The appliance's lock files as this process holds them. No command of the tool takes one; a child
-// lets go of whatever its parent may hold.
+// The appliance's lock files, and which of them this process holds. No command of the tool takes
+// one; a child releases those that its parent may hold.
 
 #include "nurocore/types.h"
 
@@ -19,5 +19,6 @@ struct LOCK_FILE {
 // The table's first row; the row with lockBit 0 ends it.
 LOCK_FILE *NLIBCLockFileTable();
 
-// Closes every open lock file and forgets every hold. 0, or -1 when one did not close.
+// Closes every open lock file and clears every hold count. Returns 0, or -1 when one could not be
+// closed.
 int NLIBCLockFilesRelease();

@@ -32,7 +32,7 @@ struct PIPE_STREAM {
 };
 
 PIPE_STREAM *g_pStreams = nullptr; // newest first
-// The tool has one thread and never waits for this; a program with several may use the streams too.
+// The tool has one thread and never waits here; the lock is for programs with several threads.
 std::atomic<u32> g_streamsLock = 0;
 
 void StreamsLock()
@@ -101,7 +101,7 @@ void CloseOnExecClear(int fd)
     }
 }
 
-// A tool whose output cannot go to its reader must not run: it would write to our own streams.
+// A tool must not run if its output cannot be redirected: it would write to our own streams.
 void MakeStandard(int fd, int fdStandard)
 {
     if (fd == fdStandard) {
@@ -137,7 +137,7 @@ void StandardStreamsSet(const PIPE_MODE &mode, int fdPipe)
     }
 }
 
-// The other streams are the parent's business; this program must not hold their ends open.
+// The parent's other streams: this program must not keep their pipes open.
 void OtherStreamsClose()
 {
     for (const PIPE_STREAM *p = g_pStreams; p != nullptr; p = p->pNext) {
@@ -176,7 +176,7 @@ FILE *StreamRegister(HEAP_OWNER<PIPE_STREAM> pRecord, const PIPE_MODE &mode, FD_
     return pStream;
 }
 
-// Takes the stream's record out of the registry; NULL when it has none. Under the lock.
+// Takes the stream's record out of the registry; NULL when it has none. The lock must be held.
 PIPE_STREAM *StreamUnlink(const FILE *pStream)
 {
     PIPE_STREAM **pp = &g_pStreams;
@@ -206,14 +206,14 @@ FILE *NLIBCPopenV(const char *szPath, const char *szMode, char *const argv[])
     }
     HEAP_OWNER<PIPE_STREAM> pRecord(static_cast<PIPE_STREAM *>(calloc(1, sizeof(PIPE_STREAM))));
     if (pRecord == nullptr) {
-        // Kept: the pipe stays open here. A process out of memory for 24 bytes is about to end.
+        // Kept: the pipe is not closed here. A process without memory for 24 bytes is about to end.
         NLIBCErrSetHere(ERR_OUT_OF_MEMORY);
         return nullptr;
     }
     FD_OWNER fdOurs(fdPipe[mode.fRead ? 0 : 1]);
     FD_OWNER fdTheirs(fdPipe[mode.fRead ? 1 : 0]);
 
-    // Forked under the lock, so that the child never inherits a list half changed.
+    // Forked under the lock, so that the child never inherits a half-changed registry.
     StreamsLock();
     const pid_t pid = fork();
     if (pid == 0) {

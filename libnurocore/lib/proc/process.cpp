@@ -19,7 +19,7 @@
 namespace
 {
 
-// Takes SA_NOCLDWAIT off SIGCHLD while it lives, so that a child can be waited for.
+// Clears SA_NOCLDWAIT of SIGCHLD during its lifetime, so that a child can be waited for.
 struct CHILD_WAIT_SCOPE {
     struct sigaction action = {};
     bool fCleared = false;
@@ -70,7 +70,7 @@ void DescriptorsClose()
     }
 }
 
-// Goes on in a grandchild; the child it leaves behind ends here.
+// Continues in a grandchild; the first child ends here.
 void ForkAgain()
 {
     const pid_t pid = fork();
@@ -81,7 +81,7 @@ void ForkAgain()
     if (pid > 0) {
         _exit(0);
     }
-    (void)usleep(1); // lets the child that is left behind end first, which nothing relies on
+    (void)usleep(1); // lets the first child end first; nothing relies on it
 }
 
 void ChildPrepare(unsigned int flags)
@@ -108,7 +108,7 @@ void ChildPrepare(unsigned int flags)
         (void)setsid();
     }
     if ((flags & FORK_CHDIR_ROOT) != 0) {
-        (void)!chdir("/"); // a child that cannot go there works where it is
+        (void)!chdir("/"); // a child that cannot go there stays where it is
     }
 }
 
@@ -141,11 +141,11 @@ void NLIBCStdioOccupy()
 {
     int fd = open(_PATH_DEVNULL, O_RDWR | O_CLOEXEC);
     while (fd >= 0 && fd <= STDERR_FILENO) {
-        (void)fcntl(fd, F_SETFD, 0); // for the tools, too
+        (void)fcntl(fd, F_SETFD, 0); // the tools inherit it
         fd = open(_PATH_DEVNULL, O_RDWR | O_CLOEXEC);
     }
-    // The one above the streams stays open: no tool gets it, and to close it would be a system call
-    // of every run.
+    // The descriptor above the standard streams stays open: no tool inherits it, and closing it
+    // would cost every run a system call.
 }
 
 void NLIBCStdioToNull()
@@ -167,7 +167,7 @@ char **NLIBCArgvAlloc(const char *szPath, va_list arguments)
     va_list counted;
     va_copy(counted, arguments);
     size_t nArgument = 0;
-    // The analyzer loses sight of what va_copy has set.
+    // The analyzer does not see that va_copy initialises it.
     // NOLINTNEXTLINE(clang-analyzer-valist.Uninitialized)
     while (va_arg(counted, char *) != nullptr) {
         nArgument++;
@@ -178,7 +178,7 @@ char **NLIBCArgvAlloc(const char *szPath, va_list arguments)
     if (argv == nullptr) {
         return nullptr;
     }
-    argv[0] = const_cast<char *>(szPath); // execv takes it so, and does not write
+    argv[0] = const_cast<char *>(szPath); // execv's type; it does not write to it
     for (size_t i = 1; i <= nArgument; i++) {
         argv[i] = va_arg(arguments, char *);
     }

@@ -13,7 +13,7 @@
 namespace
 {
 
-// Vertical tab and form feed are text.
+// Vertical tab and form feed count as text.
 constexpr char WHITE_SPACE[] = " \t\n\r";
 
 bool IsWhiteSpace(char ch)
@@ -28,8 +28,8 @@ bool IsBehindStartOf(const char *szText, size_t cchText, const char *pch)
     return place > start && place <= start + cchText;
 }
 
-// Without strnlen, which nothing else in the tool needs: every function of libc that a program
-// names is looked up each time it starts.
+// Not strnlen, which nothing else in the tool uses: each imported libc function is looked up every
+// time the tool starts.
 size_t LengthWithin(const char *szText, size_t cbText)
 {
     return static_cast<size_t>(std::find(szText, szText + cbText, '\0') - szText);
