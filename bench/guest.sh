@@ -6,6 +6,7 @@
 #
 #   guest.sh counts             what does not depend on the machine's mood
 #   guest.sh all RUNS ROUNDS    and times, and what the others take
+#   guest.sh launcher RUNS ROUNDS   a report under mdrequests beside one that is answered from outside
 # shellcheck source=SCRIPTDIR/../tests/appliance/lib.sh
 . /appliance/lib.sh
 
@@ -173,13 +174,49 @@ growth() {
     done
 }
 
+# all_calls KEY COMMAND...: those of everything that it starts, to the end of the last of them.
+all_calls() {
+    key=$1
+    shift
+    env -i PATH=/usr/bin strace -f -o /tmp/calls "$@" >/dev/null
+    echo "calls $key $(grep -vc -e resumed -e '+++' -e '---' /tmp/calls)"
+}
+
+hundredths() {
+    tr -d . </proc/uptime | cut -d' ' -f1
+}
+
+# timed KEY COMMAND...: milliseconds a run; as it is, since whoever looks on would cost more than a fork.
+timed() {
+    key=$1
+    shift
+    begin=$(hundredths)
+    for _ in $(seq "$RUNS"); do
+        env -i PATH=/usr/bin "$@" >/dev/null
+    done
+    echo "timed $key $((($(hundredths) - begin) * 10 / RUNS))"
+}
+
+# What is more is the launcher's start, and its server to the end.
+launcher() {
+    for _ in $(seq "$ROUNDS"); do
+        timed usage /sbin/arrayctl help
+        timed launched_usage /usr/sbin/mdrequests /sbin/arrayctl help
+    done
+    all_calls usage /sbin/arrayctl help
+    all_calls launched_usage /usr/sbin/mdrequests /sbin/arrayctl help
+    calls status /sbin/arrayctl status 2
+    all_calls launched_status /usr/sbin/mdrequests /sbin/arrayctl status 2
+}
+
 RUNS=${2:-1}
 ROUNDS=${3:-1}
 tables_make
 arrays_make
-if [ "$1" = counts ]; then
-    counts
-else
+case $1 in
+counts | launcher) "$1" ;;
+*)
     programs
     growth
-fi
+    ;;
+esac

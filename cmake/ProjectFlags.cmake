@@ -38,11 +38,31 @@ target_compile_options(project_product INTERFACE
     # Nothing unwinds: there are no exceptions, and a debugger has its own tables.
     $<$<CONFIG:Release>:-fno-unwind-tables;-fno-asynchronous-unwind-tables>)
 
-# A library of the product: NAME, the layers below it, and its sources.
+# A library of the product: NAME, the layers below it, and its sources. Other programs may link it, too:
+# it is installed with its headers, for pkg-config and for CMake, when the component dev is asked for.
 function(add_layer szName)
     cmake_parse_arguments(PARSE_ARGV 1 LAYER "" "" "SOURCES;USES")
+    string(REGEX REPLACE "^lib" "" szShort ${szName})
     add_library(${szName} STATIC ${LAYER_SOURCES})
-    set_target_properties(${szName} PROPERTIES OUTPUT_NAME ${szName} PREFIX "")
-    target_include_directories(${szName} PUBLIC include PRIVATE lib)
-    target_link_libraries(${szName} PUBLIC ${LAYER_USES} PRIVATE project_product)
+    set_target_properties(${szName} PROPERTIES
+        OUTPUT_NAME ${szName} PREFIX "" EXPORT_NAME ${szShort})
+    target_include_directories(${szName} PUBLIC
+        $<BUILD_INTERFACE:${CMAKE_CURRENT_SOURCE_DIR}/include>
+        $<INSTALL_INTERFACE:${CMAKE_INSTALL_INCLUDEDIR}/arrayctl> PRIVATE lib)
+    target_compile_features(${szName} INTERFACE cxx_std_20)
+    target_link_libraries(${szName}
+        PUBLIC ${LAYER_USES} PRIVATE $<BUILD_INTERFACE:project_product>)
+
+    install(TARGETS ${szName} EXPORT arrayctl-libraries
+        ARCHIVE DESTINATION ${CMAKE_INSTALL_LIBDIR} COMPONENT dev EXCLUDE_FROM_ALL)
+    install(DIRECTORY include/ DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/arrayctl
+        COMPONENT dev EXCLUDE_FROM_ALL)
+    # From the file's own place, so that it is right below any prefix.
+    file(RELATIVE_PATH szToPrefix "/${CMAKE_INSTALL_LIBDIR}/pkgconfig" "/")
+    list(TRANSFORM LAYER_USES REPLACE "^lib" "" OUTPUT_VARIABLE uses)
+    list(JOIN uses ", " szUses)
+    configure_file("${PROJECT_SOURCE_DIR}/cmake/library.pc.in"
+        "${PROJECT_BINARY_DIR}/${szShort}.pc" @ONLY)
+    install(FILES "${PROJECT_BINARY_DIR}/${szShort}.pc"
+        DESTINATION ${CMAKE_INSTALL_LIBDIR}/pkgconfig COMPONENT dev EXCLUDE_FROM_ALL)
 endfunction()

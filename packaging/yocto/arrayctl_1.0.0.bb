@@ -13,4 +13,8 @@ inherit cmake bash-completion
 
 EXTRA_OECMAKE = "-DARRAYCTL_BUILD_TESTS=OFF -DARRAYCTL_BUILD_PLATFORM=OFF"
 
+# Linked with a copy of the C library, for the small root of an installer.
+PACKAGECONFIG ??= ""
+PACKAGECONFIG[static] = "-DARRAYCTL_STATIC=ON,-DARRAYCTL_STATIC=OFF"
+
 RDEPENDS:${PN} = "lvm2 mdadm util-linux-umount"

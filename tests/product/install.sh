@@ -18,6 +18,15 @@ cd "$ROOT" || exit 1
 TOOL_FILES="usr/sbin/arrayctl
 usr/share/bash-completion/completions/arrayctl
 usr/share/man/man8/arrayctl.8"
+DEV_FILES="usr/lib/MULTIARCH/cmake/arrayctl/arrayctl-config-release.cmake
+usr/lib/MULTIARCH/cmake/arrayctl/arrayctl-config-version.cmake
+usr/lib/MULTIARCH/cmake/arrayctl/arrayctl-config.cmake
+usr/lib/MULTIARCH/libhwcontrol.a
+usr/lib/MULTIARCH/libnurocore.a
+usr/lib/MULTIARCH/libnurostoragecore.a
+usr/lib/MULTIARCH/pkgconfig/hwcontrol.pc
+usr/lib/MULTIARCH/pkgconfig/nurocore.pc
+usr/lib/MULTIARCH/pkgconfig/nurostoragecore.pc"
 PLATFORM_FILES="usr/libexec/arrayctl/sfdisk
 usr/sbin/mdrequests
 usr/share/man/man8/mdrequests.8.gz"
@@ -50,7 +59,9 @@ bytes_are_those_of_the_tested_build() {
     strip -o "$SCRATCH/tested" "$BUILD/tool/arrayctl" || return 1
     cmp "$SCRATCH/tested" "$AMD64/arrayctl/usr/sbin/arrayctl" || return 1
     strip -o "$SCRATCH/tested" "$BUILD/platform/sfdisk/sfdisk" || return 1
-    cmp "$SCRATCH/tested" "$AMD64/arrayctl-platform/usr/libexec/arrayctl/sfdisk"
+    cmp "$SCRATCH/tested" "$AMD64/arrayctl-platform/usr/libexec/arrayctl/sfdisk" || return 1
+    strip -o "$SCRATCH/tested" "$BUILD/bench/arrayctl_static" || return 1
+    cmp "$SCRATCH/tested" "$AMD64/arrayctl-static/usr/sbin/arrayctl"
 }
 
 no_build_path_in_the_program() {
@@ -60,8 +71,10 @@ no_build_path_in_the_program() {
 packing_again_gives_the_same() {
     mkdir -p "$SCRATCH/first"
     cp "$DEBS"/*_amd64.deb "$SCRATCH/first" && make_deb amd64 || return 1
-    cmp "$SCRATCH/first/arrayctl_${VERSION}_amd64.deb" "$DEBS/arrayctl_${VERSION}_amd64.deb" &&
-        cmp "$SCRATCH/first/arrayctl-platform_${VERSION}_amd64.deb" "$DEBS/arrayctl-platform_${VERSION}_amd64.deb"
+    local szPackage
+    for szPackage in arrayctl arrayctl-static arrayctl-dev arrayctl-platform; do
+        cmp "$SCRATCH/first/${szPackage}_${VERSION}_amd64.deb" "$DEBS/${szPackage}_${VERSION}_amd64.deb" || return 1
+    done
 }
 
 source_is_untouched() {
@@ -80,20 +93,87 @@ depends_are_right() {
     for szArch in amd64 powerpc; do
         same 'libc6 (>= 2.34), lvm2, mdadm, mount' "$(field arrayctl "$szArch" Depends)" || return 1
         same "$szArch" "$(field arrayctl "$szArch" Architecture)" || return 1
+        same 'lvm2, mdadm, mount' "$(field arrayctl-static "$szArch" Depends)" || return 1
+        same "arrayctl (= $VERSION)" "$(field arrayctl-static "$szArch" Provides)" || return 1
+        same arrayctl "$(field arrayctl-static "$szArch" Conflicts)" || return 1
+        same libc6-dev "$(field arrayctl-dev "$szArch" Depends)" || return 1
     done
+    same "glibc (= $(dpkg-query -W -f '${source:Version}' libc6-dev))" "$(field arrayctl-static amd64 Built-Using)" || return 1
+    [[ $(field arrayctl-static powerpc Built-Using) =~ ^glibc\ \(=\ [0-9].*\)$ ]] || return 1
     same "libfdisk1 (>= 2.35), libc6 (>= 2.34), arrayctl (= $VERSION)" "$(field arrayctl-platform amd64 Depends)"
 }
 
 packages_hold_what_they_should() {
     same "${TOOL_FILES}.gz" "$(package_files arrayctl amd64)" || return 1
     same "${TOOL_FILES}.gz" "$(package_files arrayctl powerpc)" || return 1
-    same "$PLATFORM_FILES" "$(package_files arrayctl-platform amd64)"
+    same "$PLATFORM_FILES" "$(package_files arrayctl-platform amd64)" || return 1
+    local szArch szHeaders
+    szHeaders=$(git ls-files 'lib*/include/*.h' | sed 's,^lib[a-z]*/include,usr/include/arrayctl,' | LC_ALL=C sort)
+    for szArch in amd64:x86_64-linux-gnu powerpc:powerpc-linux-gnu; do
+        same "${TOOL_FILES}.gz" "$(package_files arrayctl-static "${szArch%:*}" | grep -v '^usr/share/lintian/')" || return 1
+        same "$szHeaders
+${DEV_FILES//MULTIARCH/${szArch#*:}}" "$(package_files arrayctl-dev "${szArch%:*}")" || return 1
+    done
 }
 
 lintian_has_nothing_to_say() {
     local szSaid
     szSaid=$(lintian --fail-on info,warning,error "$DEBS"/*.deb 2>&1) && same \
         "running with root privileges is not recommended!" "$szSaid"
+}
+
+static_programs_are_static() {
+    "$ROOT/tests/style/hardening" "$AMD64-static/tool/arrayctl:static" \
+        "$DEBS/powerpc-static/tool/arrayctl:static-fixed"
+}
+
+# The arrays of a machine, as far as the libraries look at them.
+members_of_an_array() { # PROGRAM
+    # shellcheck disable=SC2016  # for the inner shell
+    unshare -m sh -c 'mount -t tmpfs none /sys/block && mkdir -p /sys/block/md7/md/dev-sda1 /sys/block/md7/md/dev-sdb1 &&
+        cd /sys/block/md7/md && echo in_sync | tee dev-sda1/state >dev-sdb1/state &&
+        echo 0 >dev-sda1/slot && echo 1 >dev-sdb1/slot &&
+        exec "$0" /dev/md7' "$1"
+}
+
+MEMBERS="/dev/sdb1 in slot 1
+/dev/sda1 in slot 0"
+
+# As pkg-config says it has to be compiled, with the package unpacked somewhere.
+another_program_by_pkg_config() {
+    local -x PKG_CONFIG_PATH=$AMD64/arrayctl-dev/usr/lib/x86_64-linux-gnu/pkgconfig
+    # shellcheck disable=SC2046  # words of a command
+    g++ -std=c++20 -Wall -Wextra -Wpedantic -Werror $(pkg-config --cflags nurostoragecore) \
+        -o "$SCRATCH/members" tests/product/members/members.cpp $(pkg-config --libs nurostoragecore) || return 1
+    same "$MEMBERS" "$(members_of_an_array "$SCRATCH/members")"
+}
+
+another_program_by_cmake() {
+    cmake -S tests/product/members -B "$SCRATCH/members-cmake" -G Ninja \
+        -DCMAKE_PREFIX_PATH="$AMD64/arrayctl-dev/usr" -DCMAKE_CXX_FLAGS="-Wall -Wextra -Wpedantic -Werror" &&
+        cmake --build "$SCRATCH/members-cmake" || return 1
+    same "$MEMBERS" "$(members_of_an_array "$SCRATCH/members-cmake/members")"
+}
+
+# Each alone and twice, all in order, and all the other way round.
+headers_stand_alone() {
+    local szInclude=$AMD64/arrayctl-dev/usr/include/arrayctl szUnits=$SCRATCH/units szHeader
+    mkdir -p "$szUnits"
+    local -a headers
+    mapfile -t headers < <(cd "$szInclude" && find . -name '*.h' -printf '%P\n' | LC_ALL=C sort)
+    [ "${#headers[@]}" -ge 20 ] || complain "only ${#headers[@]} headers" || return 1
+    for szHeader in "${headers[@]}"; do
+        printf '#include <%s>\n#include <%s>\n' "$szHeader" "$szHeader" >"$szUnits/${szHeader//\//-}.cpp"
+    done
+    printf '#include <%s>\n' "${headers[@]}" >"$szUnits/all.cpp"
+    tac "$szUnits/all.cpp" >"$szUnits/reversed.cpp"
+    # shellcheck disable=SC2016  # for the inner shell
+    printf '%s\n' "$szUnits"/*.cpp | xargs -P 2 -I UNIT sh -ec '
+        for compiler in g++ clang++-14; do
+            for standard in c++20 c++2b; do
+                $compiler -std=$standard -Wall -Wextra -Wpedantic -Werror -fsyntax-only -I "$0" UNIT
+            done
+        done' "$szInclude"
 }
 
 powerpc_program_is_one() {
@@ -134,6 +214,10 @@ recipes_fit_the_tree() {
     local szOptions='-DARRAYCTL_BUILD_TESTS=OFF -DARRAYCTL_BUILD_PLATFORM=OFF' szOption
     same "$szOptions" "$(sed -n 's/^ARRAYCTL_CONF_OPTS = //p' packaging/buildroot/arrayctl/arrayctl.mk)" || return 1
     same "$szOptions" "$(sed -n 's/^EXTRA_OECMAKE = "\(.*\)"/\1/p' "packaging/yocto/arrayctl_$VERSION.bb")" || return 1
+    same '-DARRAYCTL_STATIC=ON' "$(sed -n 's/^ARRAYCTL_CONF_OPTS += //p' packaging/buildroot/arrayctl/arrayctl.mk)" || return 1
+    same '-DARRAYCTL_STATIC=ON,-DARRAYCTL_STATIC=OFF' \
+        "$(sed -n 's/^PACKAGECONFIG\[static\] = "\(.*\)"/\1/p' "packaging/yocto/arrayctl_$VERSION.bb")" || return 1
+    grep -q '^option(ARRAYCTL_STATIC ' CMakeLists.txt || complain "no option ARRAYCTL_STATIC" || return 1
     for szOption in ARRAYCTL_BUILD_TESTS ARRAYCTL_BUILD_PLATFORM; do
         grep -q "^option($szOption " CMakeLists.txt || complain "no option $szOption" || return 1
         grep -q "^$szOption:BOOL=OFF" "$DEBS/powerpc/CMakeCache.txt" || complain "$szOption was on" || return 1
@@ -171,6 +255,10 @@ test_is "packing again gives the same bytes" packing_again_gives_the_same
 test_is "packages hold what they should" packages_hold_what_they_should
 test_is "packages depend on what they need" depends_are_right
 test_is "lintian has nothing to say" lintian_has_nothing_to_say
+test_is "static programs are static" static_programs_are_static
+test_is "another program uses the libraries by pkg-config" another_program_by_pkg_config
+test_is "another program uses the libraries by CMake" another_program_by_cmake
+test_is "headers stand alone, with either compiler" headers_stand_alone
 test_is "the PowerPC program is one" powerpc_program_is_one
 test_is "a package comes and goes without a trace" comes_and_goes_without_a_trace
 test_is "a plain install leaves the platform out" plain_install_is_without_platform
@@ -179,3 +267,4 @@ test_is "the recipes fit the tree" recipes_fit_the_tree
 test_is "a cross install into a staging tree" cross_install_into_a_staging_tree
 test_is "one version everywhere" one_version_everywhere
 test_is "the archive is reproducible" archive_is_reproducible
+summary
