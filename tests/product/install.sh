@@ -267,4 +267,3 @@ test_is "the recipes fit the tree" recipes_fit_the_tree
 test_is "a cross install into a staging tree" cross_install_into_a_staging_tree
 test_is "one version everywhere" one_version_everywhere
 test_is "the archive is reproducible" archive_is_reproducible
-summary
