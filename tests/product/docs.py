@@ -114,9 +114,11 @@ def by_bench(command):
 
 
 def by_gates(command):
-    """The gates are counts of the same run."""
-    assert f'"$BENCH_DIR/{os.path.basename(command)}" --counts' in read("bench/gates"), command
-    run("bash", "-n", command)
+    """The gates are counts of the same run; what it may be asked for stands in its head."""
+    program = command.split()[0]
+    assert f'"$BENCH_DIR/{os.path.basename(program)}" --counts' in read("bench/gates"), command
+    assert f"#   {command} " in read(program), command
+    run("bash", "-n", program)
 
 
 def by_install(command):
