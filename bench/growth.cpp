@@ -23,7 +23,6 @@ namespace
 constexpr int LETTERS = 26;
 constexpr int LIST_SIZE = 1024;
 constexpr int ROUNDS = 21;
-constexpr int BOUND_MS = 120000;
 
 std::string DiskName(int nDisk)
 {
@@ -89,7 +88,6 @@ TEST(Growth, OfTheEnumerationOfDisks)
     HeadPrint("disks", "processor time, us");
     for (const int nDisk : {4, 26, 702}) {
         MACHINE machine = MachineWithConf(CONF_RAID);
-        machine.msBound = BOUND_MS;
         for (int i = 0; i < nDisk; i++) {
             MachineDiskAdd(machine, DiskName(i));
         }
@@ -109,7 +107,6 @@ constexpr int PARTITION_FIRST = 3; // the first that holds data
 MACHINE MachineOfPartitions(int nPartition)
 {
     MACHINE machine = MachineWithConf(CONF_RAID);
-    machine.msBound = BOUND_MS;
     for (int i = 0; i < nPartition; i++) {
         const std::string szDisk = DiskName(i / PARTITIONS_OF_A_DISK);
         if (i % PARTITIONS_OF_A_DISK == 0) {
@@ -177,7 +174,6 @@ MACHINE MachineToPrepare(int nDisk)
                                       "usbportcfg=\"0x30000000\"\n"
                                       "esataportcfg=\"0x40000000\"\n"
                                       "internalportcfg=\"0xffffff\"\n");
-    machine.msBound = BOUND_MS;
     for (int i = 0; i < nDisk; i++) {
         BlankDiskAdd(machine, DiskName(i));
         RenewExpect(machine, DiskName(i), RANGE_ALL);

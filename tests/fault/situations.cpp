@@ -20,8 +20,6 @@ constexpr const char *TOOLS[] = {"/sbin/mdadm",    "/sbin/sfdisk",   "/sbin/pvs"
                                  "/sbin/lvremove", "/sbin/vgremove", "/sbin/pvremove",
                                  "/bin/umount",    "/bin/nurodd"};
 
-constexpr int RUN_BOUND = 30000; // milliseconds; the machine may be busy with something else
-
 void Add(std::vector<SITUATION> &situations, const std::string &szName, MACHINE machine,
          const STRINGS &words)
 {
@@ -379,7 +377,6 @@ MACHINE Relaxed(MACHINE machine)
     for (const char *const szTool : TOOLS) {
         MachineTool(machine, {szTool, ANY_REST}, {.nTimes = ANY_TIMES});
     }
-    machine.msBound = RUN_BOUND;
     return machine;
 }
 

@@ -28,7 +28,6 @@ using std::vector;
 using u64 = std::uint64_t;
 
 constexpr char SEED_OF[] = "seed ";
-constexpr int BOUND = 60000; // milliseconds; the machine may be busy with something else
 constexpr const char SHELL[] = "/bin/sh";
 constexpr const char MD0_MEMBER[] = "/sys/block/md0/md/dev-";
 
@@ -146,7 +145,6 @@ MACHINE MachineLayOut(const ORACLE_CASE &subject, const vector<ORACLE_ANSWER> &a
 {
     const ORACLE_MACHINE &machine = subject.machine;
     MACHINE made = MachineMake();
-    made.msBound = BOUND;
     if (machine.szConf) {
         MachineConf(made, *machine.szConf);
     }

@@ -561,10 +561,10 @@ TEST(HostileConf, APipeIsWaitedForUntilItsWriterCloses)
 {
     MACHINE machine = MachineMake();
     machine.fifos = {CONF_PATH};
-    machine.msBound = 1000;
+    machine.msSilence = 1000;
     EXPECT_TRUE(MachineTry(machine, {"newvol"}).fTimedOut);
 
-    machine.msBound = 10000;
+    machine.msSilence = 0;
     machine.fMayLeaveChildren = true;
     machine.prepare = [] {
         if (fork() != 0) {
@@ -745,7 +745,6 @@ TEST(HostileTools, AFloodOnBothStreamsBlocksNobody)
 {
     constexpr size_t FLOOD_SIZE = 50UL * 1024UL * 1024UL;
     MACHINE machine = MachineWithMirror();
-    machine.msBound = 60000;
     MachineTool(machine, PVS, {.cbFlood = FLOOD_SIZE});
     MachineTool(machine, STOP_MD2, {.cbFlood = FLOOD_SIZE});
     WipesExpect(machine);

@@ -13,8 +13,6 @@
 namespace
 {
 
-constexpr int MANY_COMMANDS_MS = 60000; // fifty of them, on a machine that may be shared
-
 // A map as a caller makes it, in the order of the pairs.
 PNLIBHASH MapOf(const std::vector<std::pair<std::string, std::string>> &pairs)
 {
@@ -258,7 +256,6 @@ TEST(RAIDUUIDHashForRemoveGet, LeavesOutWhatHasNoSuperblock)
 TEST(RAIDUUIDHashForRemoveGet, AddsToTheMapAndFollowsIt)
 {
     MACHINE machine = MachineMake();
-    machine.msBound = MANY_COMMANDS_MS;
     for (const char *const szDisk : {"sda", "sdb", "sdc", "sdd", "sde"}) {
         DiskWithPartitionsAdd(machine, szDisk, 8);
     }
@@ -331,7 +328,6 @@ TEST(RAIDCleanSuperblock, WipesEveryMemberOfALargeArray)
     constexpr int ORDER[] = {15, 25, 11, 21, 18, 14, 24, 10, 20, 17, 27, 13, 23,
                              3,  4,  26, 6,  5,  8,  7,  16, 9,  12, 22, 19};
     MACHINE machine = MachineMake();
-    machine.msBound = MANY_COMMANDS_MS;
     DiskWithPartitionsAdd(machine, "sda", 27);
     // The order of the questions is told elsewhere.
     MachineTool(machine, "/sbin/mdadm -E *", {.szOut = ReportOf(UUID_MD2), .nTimes = 25});

@@ -413,6 +413,7 @@ std::string RowRecord(const TOOL_ROW &row)
     NumberAdd(szRecord, row.answer.signal);
     NumberAdd(szRecord, row.answer.signalCaller);
     NumberAdd(szRecord, row.answer.msDelay);
+    NumberAdd(szRecord, row.answer.nMeet);
     NumberAdd(szRecord, row.answer.cbFlood);
     NumberAdd(szRecord, row.answer.msGrandchild);
     NumberAdd(szRecord, row.answer.writes.size());
@@ -560,6 +561,7 @@ void RoomAnswersWrite(const MACHINE &machine)
     TextWrite(Inside(WIRE_USED), std::string(machine.rows.size() * sizeof(std::uint32_t), '\0'),
               0644);
     TextWrite(Inside(WIRE_DRIVER), DriverText(machine), 0644);
+    TextWrite(Inside(WIRE_MEETING), "", 0666);
     TextWrite(Inside(WIRE_CALLS), "", 0666);
     LogLayOut(machine.fNoLog);
 }

@@ -4,6 +4,7 @@
 #include "interpose.h"
 #include "private_root.h"
 #include "transcript.h"
+#include "verdict.h"
 #include "wire.h"
 
 #include <gtest/gtest-spi.h>
@@ -37,7 +38,6 @@ namespace
 
 constexpr int STATUS_NOT_STARTED = 126;
 constexpr size_t LOG_LINE_SIZE = 65536;
-constexpr int EMULATOR_SLOWNESS = 10;
 
 // What the supervisor of a run tells at its end.
 struct CHILD_REPORT {
@@ -214,34 +214,39 @@ void ProcMount()
 
 // ---- and who watches both ----------------------------------------------------------------------
 
-void LogTake(RUN_RESULT &result)
+// Whether there was anything.
+bool LogTake(RUN_RESULT &result)
 {
     static char ach[LOG_LINE_SIZE];
+    bool fAny = false;
     for (ssize_t cb = 0; (cb = recv(RoomLogSocket(), ach, sizeof(ach), MSG_DONTWAIT)) > 0;) {
         DatagramTake({ach, static_cast<size_t>(cb)}, result);
+        fAny = true;
     }
+    return fAny;
 }
 
-bool ReportAwait(int fdReport, int msBound, RUN_RESULT &result, CHILD_REPORT &report)
+bool ReportAwait(int fdReport, int msSilence, RUN_RESULT &result, CHILD_REPORT &report)
 {
     using CLOCK = std::chrono::steady_clock;
     const CLOCK::time_point start = CLOCK::now();
+    CLOCK::time_point heard = start;
     struct pollfd polled[] = {{fdReport, POLLIN, 0}, {RoomLogSocket(), POLLIN, 0}};
     bool fReported = false;
     while ((polled[0].revents & (POLLIN | POLLHUP)) == 0) {
-        const auto spent = CLOCK::now() - start;
-        const auto msSpent = std::chrono::duration_cast<std::chrono::milliseconds>(spent).count();
-        if (msSpent >= msBound) {
+        const auto silent = CLOCK::now() - heard;
+        const auto msSilent = std::chrono::duration_cast<std::chrono::milliseconds>(silent).count();
+        if (msSilent >= msSilence) {
             result.fTimedOut = true;
             break;
         }
-        (void)poll(polled, std::size(polled), msBound - static_cast<int>(msSpent));
-        LogTake(result);
+        (void)poll(polled, std::size(polled), msSilence - static_cast<int>(msSilent));
+        heard = LogTake(result) ? CLOCK::now() : heard;
     }
     if (!result.fTimedOut) {
         fReported = read(fdReport, &report, sizeof(report)) == sizeof(report);
     }
-    LogTake(result);
+    (void)LogTake(result);
     result.seconds = std::chrono::duration<double>(CLOCK::now() - start).count();
     return fReported;
 }
@@ -257,15 +262,15 @@ void StatusTake(const CHILD_REPORT &report, RUN_RESULT &result)
     result.nRunning = report.nRunning;
 }
 
-int BoundOf(const MACHINE &machine)
+int SilenceOf(const MACHINE &machine)
 {
-    return machine.msBound * (getenv("ARRAYCTL_RUNNER") != nullptr ? EMULATOR_SLOWNESS : 1);
+    return machine.msSilence > 0 ? machine.msSilence : VerdictSilence();
 }
 
 void RunProblemsAdd(const MACHINE &machine, bool fReported, RUN_RESULT &result)
 {
     if (result.fTimedOut) {
-        result.problems.push_back("it hangs: not done after " + std::to_string(BoundOf(machine)) +
+        result.problems.push_back("it hangs: silent for " + std::to_string(SilenceOf(machine)) +
                                   " ms");
     } else if (!fReported) {
         result.problems.emplace_back("the sandbox itself broke down");
@@ -298,7 +303,7 @@ pid_t NamespaceFork()
 RUN_RESULT Watch(const MACHINE &machine, const BODY &body, std::string &szFailures)
 {
     RUN_RESULT leftBehind;
-    LogTake(leftBehind);
+    (void)LogTake(leftBehind);
     RUN_RESULT result;
     RUN_STREAMS streams = {};
     streams.fdIn = MemoryFile("in", machine.szInput);
@@ -318,7 +323,7 @@ RUN_RESULT Watch(const MACHINE &machine, const BODY &body, std::string &szFailur
     }
     close(fdReport[1]);
     CHILD_REPORT report = {};
-    const bool fReported = ReportAwait(fdReport[0], BoundOf(machine), result, report);
+    const bool fReported = ReportAwait(fdReport[0], SilenceOf(machine), result, report);
     (void)kill(pid, SIGKILL);
     (void)waitpid(pid, nullptr, 0);
     close(fdReport[0]);

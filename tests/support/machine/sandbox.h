@@ -47,6 +47,7 @@ struct TOOL_ANSWER {
     int signal = 0;       // ends by this signal instead, when not 0
     int signalCaller = 0; // and first ends by this one the process that ran it, when not 0
     int msDelay = 0;      // waits before it answers
+    int nMeet = 0;        // waits until so many that do so have been run; NEVER answers
     size_t cbFlood = 0;   // so many bytes on standard output and as many on standard error, first
     int nTimes = 1;       // how often it must be run; ANY_TIMES for "may be run, never or often"
     std::map<std::string, std::string> writes =
@@ -57,6 +58,7 @@ struct TOOL_ANSWER {
 };
 
 constexpr int ANY_TIMES = -1;
+constexpr int NEVER = 1000000;
 
 // In the argument list of a row: any one argument, and any number of arguments at the end.
 inline constexpr const char *ANY_ARGUMENT = "*";
@@ -143,7 +145,8 @@ struct MACHINE {
     bool fCallsTold = false;                // calls that can be made to fail, see MachineCalls
     bool fNoLog = false;                    // no /dev/log
     bool fMayLeaveChildren = false;
-    int msBound = 10000;
+    int msSilence =
+        0; // without a command, a pause and a line of the log it hangs; 0 is the common bound
     std::function<void()> prepare = {}; // runs in the program's process just before it starts
 };
 

@@ -277,6 +277,18 @@ void GrandchildLeave(long ms)
     }
 }
 
+// Each that comes adds a byte.
+void Meet(long nMeet)
+{
+    constexpr useconds_t LOOK_AGAIN = 1000;
+    const int fd = open(WIRE_MEETING, O_WRONLY | O_APPEND | O_CLOEXEC);
+    BytesWrite(fd, "+", 1);
+    for (struct stat info = {}; fstat(fd, &info) == 0 && info.st_size < nMeet;) {
+        (void)usleep(LOOK_AGAIN);
+    }
+    close(fd);
+}
+
 [[noreturn]] void Answer(READER row)
 {
     const FIELD out = FieldNext(row);
@@ -285,8 +297,12 @@ void GrandchildLeave(long ms)
     const long signal = NumberNext(row);
     const long signalCaller = NumberNext(row);
     const long msDelay = NumberNext(row);
+    const long nMeet = NumberNext(row);
     const long cbFlood = NumberNext(row);
     GrandchildLeave(NumberNext(row));
+    if (nMeet > 0) {
+        Meet(nMeet);
+    }
     if (msDelay > 0) {
         (void)usleep(static_cast<useconds_t>(msDelay) * 1000);
     }

@@ -13,10 +13,11 @@
 #include <unistd.h>
 
 #define WIRE_FOLDER "/.sandbox"
-#define WIRE_ROWS WIRE_FOLDER "/rows"     // the answers of the stand-ins
-#define WIRE_USED WIRE_FOLDER "/used"     // how often each row was run, 4 bytes a row
-#define WIRE_DRIVER WIRE_FOLDER "/driver" // what requests answer, which calls fail
-#define WIRE_CALLS WIRE_FOLDER "/calls"   // every call that can be made to fail, a line each
+#define WIRE_ROWS WIRE_FOLDER "/rows"       // the answers of the stand-ins
+#define WIRE_USED WIRE_FOLDER "/used"       // how often each row was run, 4 bytes a row
+#define WIRE_DRIVER WIRE_FOLDER "/driver"   // what requests answer, which calls fail
+#define WIRE_MEETING WIRE_FOLDER "/meeting" // a byte for each stand-in that waits for others
+#define WIRE_CALLS WIRE_FOLDER "/calls"     // every call that can be made to fail, a line each
 #define WIRE_PROGRAM WIRE_FOLDER "/arrayctl"
 #define WIRE_BODIES WIRE_FOLDER "/bodies" // bodies of another processor
 #define WIRE_INTERPOSE WIRE_FOLDER "/interpose.so"
