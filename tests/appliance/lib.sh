@@ -52,6 +52,8 @@ check() {
     failures=$((failures + 1))
     echo "    wrong: $what: $*"
     sed 's/^/        /' /tmp/check
+    # A text without a newline would swallow the verdict behind it.
+    [ -z "$(tail -c 1 /tmp/check)" ] || echo
 }
 
 is_not() {
@@ -286,8 +288,10 @@ answers() {
     "$@" >"$SEEN" 2>"$ERRORS"
     seen_status=$?
     [ "$seen_status" = "$status" ] && [ ! -s "$ERRORS" ] && cmp -s "$EXPECTED" "$SEEN" && return
-    echo "expected status $status, seen $seen_status; expected, seen and on standard error:"
-    cat -A "$EXPECTED" "$SEEN" "$ERRORS"
+    echo "expected status $status, seen $seen_status"
+    for text in "$EXPECTED" "$SEEN" "$ERRORS"; do
+        echo "$text: $(cat -A "$text")"
+    done
     return 1
 }
 
