@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: MIT
 #pragma once
 
-// Takes up what the machine says of devices and failing calls, in this process from now on. A
-// process that is no machine's has nothing to take up, and all calls pass through.
+// From now on, requests to devices and calls that shall fail are answered in this process as the
+// machine describes them. In a process that is not part of a machine all calls pass through.
 void InterposeActivate();
 
 void InterposeDeactivate();

@@ -1,14 +1,14 @@
 // SPDX-License-Identifier: MIT
 #pragma once
 
-// The private root: made once a test program, laid out anew for every run.
+// The private root: made once per test program, laid out again for every run.
 
 #include "sandbox.h"
 
 #include <string>
 
-// Goes into the private namespaces at the first call. Where the kernel refuses, the program ends
-// and says why: no test would mean anything.
+// Enters the private namespaces at the first call. If the kernel refuses, the program prints why
+// and ends: no test would mean anything.
 void RoomEnter();
 
 const std::string &RoomRoot();
@@ -19,5 +19,6 @@ int RoomLogSocket();
 // Empties the private root and lays the machine out in it.
 void RoomLayOut(const MACHINE &machine);
 
-// Writes what stand-ins and driver answer, and starts a new transcript; files are left alone.
+// Writes the answers of the stand-ins and the driver, and starts a new transcript. Files are not
+// changed.
 void RoomAnswersWrite(const MACHINE &machine);

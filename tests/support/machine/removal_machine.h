@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: MIT
 #pragma once
 
-// What the cases of taking an array down share: disks, reports of superblocks, the commands.
+// Shared by the tests of removing an array: disks, reports of superblocks, the commands.
 
 #include "steps.h"
 
@@ -13,7 +13,7 @@
 inline constexpr char UUID_MD2[] = "5b1f2c3d:4e5f6071:8293a4b5:00000002";
 inline constexpr char UUID_MD3[] = "5b1f2c3d:4e5f6071:8293a4b5:00000003";
 
-// A report that says no more than the UUID.
+// A report that has only the UUID.
 inline std::string ReportOf(const std::string &szUuid)
 {
     return "/dev/sdx3:\n          Magic : a92b4efc\n     Array UUID : " + szUuid + "\n";
@@ -45,7 +45,7 @@ inline STEPS WipeFailed(const std::string &szName, const TOOL_ANSWER &answer)
             {"<11>raid_remove.cpp:# Failed to clean suerblock of '/dev/" + szName + "'"}};
 }
 
-// One try that fails, and the second until the next.
+// One failed attempt, and the pause of a second before the next.
 inline STEPS StopFailed(const TOOL_ANSWER &answer)
 {
     return {{STOP_MD2, answer},
@@ -57,7 +57,7 @@ inline STEPS StopFailed(const TOOL_ANSWER &answer)
 inline const STEP LIMIT_TOLD = {"<11>raid_remove.cpp:# Reach RAID stop retry limit"};
 inline const STEP CLEAN_TOLD = {"<11>raid_remove.cpp:# [Info] clean RAID superblock of /dev/md2"};
 
-// What is left of a mirror of sda3 and sdb3 that has been stopped.
+// The steps after a mirror of sda3 and sdb3 has been stopped.
 inline STEPS MirrorWiped()
 {
     return STEPS{CLEAN_TOLD, Examined("sda3", UUID_MD2), Examined("sdb3", UUID_MD2)} +

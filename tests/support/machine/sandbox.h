@@ -3,8 +3,8 @@
 
 // The sandbox suite: the finished, unmodified program and its libraries inside a private root.
 //
-// A test says what the machine is like (MACHINE), runs the program on it (MachineRun) or a piece of
-// test code beside the libraries (MachineCall), and compares what came of it (RUN_RESULT):
+// A test describes the machine (MACHINE), runs the program on it (MachineRun) or a piece of test
+// code linked with the libraries (MachineCall), and compares the result (RUN_RESULT):
 //
 //     MACHINE machine = MachineMake();
 //     MachineMdAdd(machine, {.nMd = 2, .members = {{"sda3"}, {"sdb3"}}});
@@ -18,8 +18,8 @@
 // command that no row expects fails the test, and so does a row that was not run. So do a run that
 // hangs, one that leaves a child behind, and a report of a sanitizer.
 //
-// Nothing of the host can be reached: the root is a tmpfs of a private user and mount namespace,
-// every run has process numbers of its own, and /dev holds plain files.
+// Nothing of the host can be reached: the root is a tmpfs in a private user and mount namespace,
+// every run has its own PID namespace, and /dev contains plain files.
 
 #include <cstdint>
 #include <functional>
@@ -32,7 +32,7 @@
 #include <sys/types.h>
 #include <vector>
 
-// ---- what the machine is like ------------------------------------------------------------------
+// ---- the description of a machine --------------------------------------------------------------
 
 struct MACHINE_FILE {
     std::string szText = {};
@@ -45,15 +45,15 @@ struct TOOL_ANSWER {
     std::string szErr = {};
     int status = 0;       // exit status
     int signal = 0;       // ends by this signal instead, when not 0
-    int signalCaller = 0; // and first ends by this one the process that ran it, when not 0
+    int signalCaller = 0; // first kills the process that ran it with this signal, when not 0
     int msDelay = 0;      // waits before it answers
-    int nMeet = 0;        // waits until so many that do so have been run; NEVER answers
-    size_t cbFlood = 0;   // so many bytes on standard output and as many on standard error, first
-    int nTimes = 1;       // how often it must be run; ANY_TIMES for "may be run, never or often"
+    int nMeet = 0;        // waits until this many such stand-ins were run; NEVER: for ever
+    size_t cbFlood = 0;   // first writes this many bytes to standard output and standard error each
+    int nTimes = 1;       // how often it must be run; ANY_TIMES for any number, 0 included
     std::map<std::string, std::string> writes =
-        {};                                // files it leaves on the machine, with their text
-    std::vector<std::string> removes = {}; // files and folders it takes away
-    int msGrandchild = 0;                  // leaves a grandchild that holds its streams so long
+        {};                                // files it writes on the machine, with their text
+    std::vector<std::string> removes = {}; // files and folders it removes
+    int msGrandchild = 0;                  // leaves a grandchild that holds its streams this long
     std::string szWhileThere = {};         // the row counts while this file or folder is there
 };
 
@@ -80,7 +80,7 @@ struct MACHINE_MEMBER {
     std::string szSlot = "0\n";
 };
 
-// An array as the md driver tells of it. Each request can fail with an errno instead.
+// An array as the md driver reports it. Each request can fail with an errno instead.
 struct MACHINE_MD {
     int nMd = 0;
     int majorVersion = 1;
@@ -106,20 +106,21 @@ struct MACHINE_MD {
     std::optional<unsigned int> deviceMinor = {}; // N of mdN unless said otherwise
 };
 
-// What a request on another device node answers: its size in bytes.
+// The answer to the size request of another device node, in bytes.
 struct MACHINE_DEVICE_SIZE {
     std::string szPath;
     std::uint64_t cb = 0;
     int errnoSize = 0;
 };
 
-// The n-th call of a libc function fails with an errno; with fGoOn every later one too. Counted in
-// each process by itself, and told in the transcript as "fault NAME N". What can be made to fail is
-// the table in interpose.cpp; the function "*" is every one of them.
+// The n-th call of a libc function fails with an errno; with fGoOn every later one too. Calls are
+// counted in each process separately, and the transcript has "fault NAME N". The functions that can
+// be made to fail are in a table in interpose.cpp; "*" stands for every one of them.
 //
-// A fault of one process counts that one's calls only: "0" is the program, "0.2" the second process
-// that it forked, "0.2.1" the first one of that; told as "fault NAME N PROCESS OBJECT" in one word
-// after the name. What goes on failing does so in what the process forks from then on.
+// A fault of one process counts the calls of that process only: "0" is the program, "0.2" the
+// second process that it forked, "0.2.1" the first one forked by that. The transcript then has
+// "fault NAME N PROCESS OBJECT", where all after the name is one word. With fGoOn the calls also
+// fail in the processes that it forks from then on.
 struct MACHINE_FAULT {
     std::string szFunction = {};
     int nCall = 1;
@@ -139,14 +140,14 @@ struct MACHINE {
     std::map<std::string, TOOL_KIND> tools = {}; // only those that are not plain stand-ins
     std::vector<MACHINE_FAULT> faults = {};
     std::map<std::string, std::string> environment = {{"PATH", "/sbin:/bin"}};
-    std::int64_t when = 1793840523;         // what time() says: Nov 05 01:02:03 in UTC
+    std::int64_t when = 1793840523;         // what time() returns: Nov 05 01:02:03 in UTC
     std::string szInput = "the terminal\n"; // standard input of the program: never /dev/null
-    bool fRealSleep = false;                // sleeps are told in the transcript and slept too
-    bool fCallsTold = false;                // calls that can be made to fail, see MachineCalls
+    bool fRealSleep = false;                // sleeps are in the transcript and take their time
+    bool fCallsTold = false;                // lists calls that can be made to fail: MachineCalls
     bool fNoLog = false;                    // no /dev/log
     bool fMayLeaveChildren = false;
-    int msSilence =
-        0; // without a command, a pause and a line of the log it hangs; 0 is the common bound
+    // A run without a command, a sleep or a log line for this long hangs; 0 is the common bound.
+    int msSilence = 0;
     std::function<void()> prepare = {}; // runs in the program's process just before it starts
 };
 
@@ -159,10 +160,10 @@ void MachineFile(MACHINE &machine, const std::string &szPath, const std::string 
 void MachineFolder(MACHINE &machine, const std::string &szPath);
 void MachineLink(MACHINE &machine, const std::string &szPath, const std::string &szTarget);
 
-// Takes a file or folder, with all below it, out of the machine.
+// Removes a file or folder, with everything below it, from the machine.
 void MachineRemove(MACHINE &machine, const std::string &szPath);
 
-// /etc.defaults/nuroinfo.conf, and a machine that has nothing else.
+// Sets /etc.defaults/nuroinfo.conf; the second makes a machine that has nothing else.
 void MachineConf(MACHINE &machine, const std::string &szText);
 MACHINE MachineWithConf(const std::string &szText);
 
@@ -177,15 +178,15 @@ std::string MachinePartitionAdd(MACHINE &machine, const std::string &szDisk, int
 // An array: /dev/mdN, its sysfs files, its members, its answers to requests.
 void MachineMdAdd(MACHINE &machine, const MACHINE_MD &md);
 
-// The one-line answer of an expected command. The text form is split at single blanks; the list
-// form takes arguments with blanks in them and empty ones.
+// Adds an expected command and its answer. The text form is split at single blanks; the list forms
+// allow empty arguments and arguments with blanks.
 void MachineTool(MACHINE &machine, std::string_view szCommand, const TOOL_ANSWER &answer = {});
 void MachineTool(MACHINE &machine, const std::vector<std::string> &argv,
                  const TOOL_ANSWER &answer = {});
 void MachineTool(MACHINE &machine, std::initializer_list<std::string> argv,
                  const TOOL_ANSWER &answer = {});
 
-// ---- what came of it ---------------------------------------------------------------------------
+// ---- the result of a run -----------------------------------------------------------------------
 
 struct LOG_LINE {
     int priority = 0;        // as sent: 11 is LOG_ERR, 15 LOG_DEBUG
@@ -218,7 +219,7 @@ struct RUN_RESULT {
     std::vector<RUN_EVENT> events = {};
     bool fTimedOut = false;
     int nUnreaped = 0; // children that the program did not wait for
-    int nRunning = 0;  // and those that still ran when it ended
+    int nRunning = 0;  // children that were still running when it ended
     double seconds = 0;
     std::vector<std::string> problems = {}; // each fails the test, see MachineRun
 };
@@ -226,14 +227,14 @@ struct RUN_RESULT {
 // One line each: "<11>file.cpp:# message".
 std::string LogText(const RUN_RESULT &result);
 
-// One line each: the argument list with blanks between, "sleep 3", "fault calloc 1". An argument
-// that is empty or holds blanks or quotes stands in double quotes.
+// One line each: the argument list separated by blanks, "sleep 3", "fault calloc 1". An argument
+// that is empty or contains blanks or quotes is in double quotes.
 std::string TranscriptText(const RUN_RESULT &result);
 
-// Both in the order in which they came; of processes that run side by side, in any.
+// Both in the order in which they came; those of parallel processes in any order.
 std::string OrderText(const RUN_RESULT &result);
 
-// What is expected of these, one line each.
+// Joins expected lines in the form of these texts, one line each.
 std::string Lines(const std::vector<std::string> &lines);
 
 // ---- running -----------------------------------------------------------------------------------
@@ -254,13 +255,13 @@ RUN_RESULT MachineTry(const MACHINE &machine, const std::vector<std::string> &ar
 RUN_RESULT MachineRunAgain(const MACHINE &machine, const std::vector<std::string> &arguments);
 RUN_RESULT MachineTryAgain(const MACHINE &machine, const std::vector<std::string> &arguments);
 
-// Lays the machine out and runs the body in a process of its own inside it, beside the libraries.
-// EXPECT and ASSERT failures of the body fail the test. What the body prints is in szOut. Where
-// bodies run in the test program of another processor, that program has no results of the calls
-// before: a test must reach its later calls whatever came of the earlier ones.
+// Lays the machine out and runs the body in a process of its own inside it, linked with the
+// libraries. EXPECT and ASSERT failures of the body fail the test. What the body prints is in
+// szOut. When bodies run in a test program for another processor, that program does not have the
+// results of earlier calls: a test must reach its later calls whatever the earlier ones returned.
 RUN_RESULT MachineCall(const MACHINE &machine, const std::function<void()> &body);
 
-// The same, and nothing is logged; and nothing is run either.
+// The same; QuietCall expects that nothing is logged, IdleCall that nothing is run either.
 RUN_RESULT QuietCall(const MACHINE &machine, const std::function<void()> &body);
 RUN_RESULT IdleCall(const MACHINE &machine, const std::function<void()> &body);
 
@@ -268,5 +269,5 @@ RUN_RESULT IdleCall(const MACHINE &machine, const std::function<void()> &body);
 // process, as "PROCESS FUNCTION OBJECT".
 std::vector<std::string> MachineCalls();
 
-// The text of a file of the machine after a run; none when it is not there.
+// The text of a file of the machine after a run; nullopt when it does not exist.
 std::optional<std::string> MachineFileRead(const std::string &szPath);

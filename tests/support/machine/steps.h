@@ -12,8 +12,8 @@
 //                    {"<11>raid_remove.cpp:# Failed to mdadm stop '/dev/md2'"}}},
 //     });
 //
-// A step is a line of OrderText. One that begins with a slash is a command: the machine gets its
-// row, with the answer that stands beside it. Nothing else may happen, and nothing less.
+// A step is a line of OrderText. One that begins with a slash is a command: the machine gets a row
+// for it, with the answer given beside it. Exactly these steps must happen.
 
 #include "last_error.h"
 #include "sandbox.h"
@@ -36,7 +36,7 @@ inline STEPS operator+(STEPS steps, const STEPS &more)
     return steps;
 }
 
-// The same steps so often.
+// The same steps nTimes times.
 inline STEPS operator*(int nTimes, const STEPS &steps)
 {
     STEPS all;
@@ -75,7 +75,7 @@ inline void ExpectSteps(const RUN_RESULT &result, const STEPS &steps)
 }
 
 // One call of a library on a machine of its own: what it returns, the code that it leaves in the
-// last-error record (OLD_CODE: it leaves the record alone), what it does.
+// last-error record (OLD_CODE: it does not change the record), what it does.
 struct CALL_CASE {
     const char *szName;
     MACHINE machine = MachineMake();

@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: MIT
 #pragma once
 
-// Models and disks that the cases of partitions, membership and the preparing commands share.
+// Models and disks shared by the tests of partitions, membership and the preparing commands.
 
 #include "sandbox.h"
 
@@ -33,7 +33,7 @@ inline constexpr char CONF_BUILDIN[] = "maxdisks=\"4\"\n"
                                        "esataportcfg=\"0x40\"\n"
                                        "internalportcfg=\"0xf\"\n";
 
-// Disks behind the eSATA port of sdg; the internal ones are left alone.
+// Disks behind the eSATA port of sdg; the internal ones are not used.
 inline constexpr char CONF_DUAL_HEAD[] = "maxdisks=\"4\"\n"
                                          "supportraid=\"yes\"\n"
                                          "support_buildin_storage=\"no\"\n"
@@ -57,7 +57,7 @@ inline void ExpansionUnitAdd(MACHINE &machine, const std::string &szHost,
                 "nuro_device_list=\"" + szDevices + "\"\n");
 }
 
-// Disks behind the eSATA ports of sdf and sdg, as many as 52; each host tells of ten.
+// Up to 52 disks behind the eSATA ports of sdf and sdg; each host reports ten.
 inline std::vector<std::string> TwoUnitsAdd(MACHINE &machine, size_t nDisk)
 {
     constexpr size_t LETTERS = 26;
@@ -118,7 +118,7 @@ inline std::string ListingCommand(const std::string &szDisk, int nPartition)
     return "/sbin/sfdisk -l -uS -N" + std::to_string(nPartition) + " /dev/" + szDisk;
 }
 
-// The partitioner is asked for partitions 1 and 2 and knows neither.
+// The partitioner is asked for partitions 1 and 2 and finds neither.
 inline void BlankListingsExpect(MACHINE &machine, const std::string &szDisk)
 {
     MachineTool(machine, ListingCommand(szDisk, 1));
@@ -158,7 +158,7 @@ inline std::string Examination(int nMd)
            std::to_string(nMd) + "\n";
 }
 
-// What the device's superblock is asked for, and that it names the array nMd.
+// The device's superblock is examined and names the array nMd.
 inline void SuperblockExpect(MACHINE &machine, const std::string &szDevice, int nMd, int nTimes = 1)
 {
     MachineTool(machine, "/sbin/mdadm -E /dev/" + szDevice,
@@ -170,7 +170,7 @@ inline void NoSuperblockExpect(MACHINE &machine, const std::string &szDevice, in
     MachineTool(machine, "/sbin/mdadm -E /dev/" + szDevice, {.status = 1, .nTimes = nTimes});
 }
 
-// What comes after the clean; the newest layout on a RAID machine unless said otherwise.
+// The options of the partitions made after the clean; by default the newest layout with RAID.
 struct SYSTEM_PARTITIONS {
     const char *szStart = "-j2048";
     const char *szSize = "-z4980480";
@@ -202,7 +202,7 @@ inline void RenewExpect(MACHINE &machine, const std::string &szDisk, const std::
     }
 }
 
-// ---- what came of it ---------------------------------------------------------------------------
+// ---- the result of a run -----------------------------------------------------------------------
 
 inline bool IsOnDisk(const RUN_EVENT &event, const std::string &szDisk)
 {
@@ -216,7 +216,7 @@ inline bool IsOnDisk(const RUN_EVENT &event, const std::string &szDisk)
            szLast.find_first_not_of("0123456789", szPath.size()) == std::string::npos;
 }
 
-// The commands on one disk or its partitions, in order. Those of different disks run side by side.
+// The commands on one disk or its partitions, in order. Those of different disks run in parallel.
 inline std::string CommandsOn(const RUN_RESULT &result, const std::string &szDisk)
 {
     RUN_RESULT chosen = {};
@@ -254,7 +254,7 @@ inline std::string LogOf(const RUN_RESULT &result, const std::string &szFile)
     return szText;
 }
 
-// The lines that stand in every log, whoever reads it.
+// The lines of error priority, which every log has.
 inline std::string LogErrors(const RUN_RESULT &result)
 {
     constexpr int PRIORITY_ERROR = 11;
@@ -273,10 +273,10 @@ inline bool HasWord(const TOOL_ROW &row, const std::string &szWord)
 
 inline constexpr char SHELL_RECORD[] = "/tmp/shell.record";
 
-// From now on every command text that goes to the shell is written down before it runs.
+// From now on every command text passed to the shell is recorded before it runs.
 inline void ShellWatch(MACHINE &machine)
 {
-    machine.tools["/bin/sh"] = TOOL_KIND::MISSING; // the stand-in of it, that is
+    machine.tools["/bin/sh"] = TOOL_KIND::MISSING; // no stand-in for it
     MachineFile(machine, "/bin/sh",
                 std::string("#!/usr/bin/dash\n"
                             "for szText; do :; done\n"
@@ -288,7 +288,7 @@ inline void ShellWatch(MACHINE &machine)
 // From now on every shell ends by a signal before it runs anything.
 inline void ShellKill(MACHINE &machine)
 {
-    machine.tools["/bin/sh"] = TOOL_KIND::MISSING; // the stand-in of it, that is
+    machine.tools["/bin/sh"] = TOOL_KIND::MISSING; // no stand-in for it
     MachineFile(machine, "/bin/sh", "#!/usr/bin/dash\nkill -9 $$\n", 0755);
 }
 

@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: MIT
 #pragma once
 
-// What the harness, the stand-in tools and the interposing library tell one another, and where.
+// What the harness, the stand-in tools and the interposing library send one another, and where.
 // They may be built for different processors, so everything but the stand-ins' own counts is text:
 // a field is "LENGTH:BYTES", a record is a field that holds the fields of the record.
 
@@ -14,16 +14,16 @@
 
 #define WIRE_FOLDER "/.sandbox"
 #define WIRE_ROWS WIRE_FOLDER "/rows"       // the answers of the stand-ins
-#define WIRE_USED WIRE_FOLDER "/used"       // how often each row was run, 4 bytes a row
+#define WIRE_USED WIRE_FOLDER "/used"       // how often each row was run, 4 bytes per row
 #define WIRE_DRIVER WIRE_FOLDER "/driver"   // what requests answer, which calls fail
 #define WIRE_MEETING WIRE_FOLDER "/meeting" // a byte for each stand-in that waits for others
-#define WIRE_CALLS WIRE_FOLDER "/calls"     // every call that can be made to fail, a line each
+#define WIRE_CALLS WIRE_FOLDER "/calls"     // every call that can be made to fail, one per line
 #define WIRE_PROGRAM WIRE_FOLDER "/arrayctl"
 #define WIRE_BODIES WIRE_FOLDER "/bodies" // bodies of another processor
 #define WIRE_INTERPOSE WIRE_FOLDER "/interpose.so"
 #define WIRE_STANDIN WIRE_FOLDER "/standin"
 #define WIRE_SHELL WIRE_FOLDER "/sh"
-#define WIRE_PROC WIRE_FOLDER "/proc" // the kernel's own, for sanitizers alone
+#define WIRE_PROC WIRE_FOLDER "/proc" // the kernel's own, for sanitizers only
 
 #define WIRE_ANY_ARGUMENT "*"
 #define WIRE_ANY_REST "..."
@@ -39,7 +39,7 @@
 #define WIRE_SLEEP "sleep"
 #define WIRE_FAULT "fault"
 
-// Sends the fields of one record. Through no function that can be made to fail.
+// Sends the fields of one record. Uses no function that can be made to fail.
 inline void WireSend(const char *pch, size_t cb)
 {
     const struct sockaddr_un addresses[] = {{AF_UNIX, WIRE_LOG}, {AF_UNIX, WIRE_LOG_AWAY}};
