@@ -19,8 +19,10 @@ constexpr size_t LONGEST_NAME = 31;
 
 void PortTells(const std::string &path, DISK_PORT_TYPE type, std::string_view report)
 {
-    const size_t devices = path.find("/dev", 1); // one in the middle is nobody's
-    if (path.size() > LONGEST_NAME || devices != std::string::npos || path == "/dev") {
+    const std::string disk = WithoutPartitionNumber(path);
+    const size_t folder = disk.find("/dev");
+    const bool fNoName = folder != std::string::npos && disk.find('/', folder + 1) == disk.npos;
+    if (path.size() > LONGEST_NAME || fNoName) {
         return;
     }
     std::string units;

@@ -80,13 +80,20 @@ inline PORT PortOfName(const PORT_MASKS &masks, const std::string &name, const s
     return (masks[MASK_CACHE] & bit) != 0 ? PORT_CACHE : PORT_OTHER;
 }
 
+// What stands behind "/dev" and the next slash, wherever they are.
+inline std::string NameWithin(const std::string &path)
+{
+    const size_t folder = path.find("/dev");
+    return folder == std::string::npos ? path : path.substr(path.find('/', folder + 1) + 1);
+}
+
 // Of a disk or a partition, with or without "/dev/", and no longer than a name can be.
 inline PORT PortOfPath(const PORT_MASKS &masks, const std::string &path, const std::string &units)
 {
     if (IsMmc(path)) {
         return PORT_MMC;
     }
-    const std::string name = WithoutDev(WithoutPartitionNumber(path));
+    const std::string name = NameWithin(WithoutPartitionNumber(path));
     if (name.starts_with("nuroboot")) {
         return PORT_BOOT;
     }
