@@ -70,6 +70,8 @@ void StatusSituations(std::vector<SITUATION> &all)
     StatusAdd(all, "level 10", {.nMd = 2, .level = 10, .nRaidDisks = 4, .members = Members(4)});
     StatusAdd(all, "a level without a word", {.nMd = 2, .level = 4, .members = Members(3)});
     StatusAdd(all, "eight members", {.nMd = 2, .level = 6, .nRaidDisks = 8, .members = Members(8)});
+    StatusAdd(all, "twenty members",
+              {.nMd = 2, .level = 6, .nRaidDisks = 20, .members = Members(20)});
     StatusAdd(all, "no member", {.nMd = 2});
     StatusAdd(all, "a failed member",
               {.nMd = 2,

@@ -4,7 +4,7 @@
 #include "nurocore/handle.h"
 #include "nurocore/io.h"
 
-#include <algorithm>
+#include <cstring>
 #include <fcntl.h>
 
 ssize_t AttributeRead(const char *szFile, char *szText, size_t cbText)
@@ -16,20 +16,24 @@ ssize_t AttributeRead(const char *szFile, char *szText, size_t cbText)
     // sysfs returns a line in one read; a file of another kind may need several.
     size_t cbRead = 0;
     ssize_t cbMore = 1;
-    const char *pchEnd = szText;
-    while (cbMore > 0 && cbRead < cbText - 1) {
+    szText[0] = '\0';
+    while (cbMore > 0 && cbRead < cbText - 1 && strchr(szText, '\n') == nullptr) {
         cbMore = NLIBCRead(fd.get(), szText + cbRead, cbText - 1 - cbRead);
         if (cbMore < 0) {
             return ATTRIBUTE_NOT_READ;
         }
         cbRead += static_cast<size_t>(cbMore);
-        const char *const pchRead = szText + cbRead;
-        pchEnd = std::find(pchEnd, pchRead, '\n');
-        if (pchEnd != pchRead) {
-            pchEnd++;
-            break;
-        }
+        szText[cbRead] = '\0';
     }
-    szText[pchEnd - szText] = '\0';
     return static_cast<ssize_t>(cbRead);
+}
+
+ssize_t AttributeLineRead(const char *szFile, char *szText, size_t cbText)
+{
+    const ssize_t cbRead = AttributeRead(szFile, szText, cbText);
+    char *const pchEnd = cbRead <= ATTRIBUTE_NOT_READ ? nullptr : strchr(szText, '\n');
+    if (pchEnd != nullptr) {
+        pchEnd[1] = '\0';
+    }
+    return cbRead;
 }

@@ -10,7 +10,10 @@
 constexpr ssize_t ATTRIBUTE_NOT_OPENED = -1;
 constexpr ssize_t ATTRIBUTE_NOT_READ = 0;
 
-// Reads at most cbText - 1 bytes of the file and stores the first line of them in szText, including
-// its line end. Returns how many bytes were read, or one of the above: NOT_OPENED with the errno of
-// open, NOT_READ for a read error and for an empty file, with errno unchanged since the call.
+// Stores at most cbText - 1 bytes of the file in szText, up to the read that has brought a line
+// end. Returns how many bytes were read, or one of the above: NOT_OPENED with the errno of open,
+// NOT_READ for a read error and for an empty file, with errno unchanged since the call.
 ssize_t AttributeRead(const char *szFile, char *szText, size_t cbText);
+
+// The same, but szText keeps the first line alone, including its line end.
+ssize_t AttributeLineRead(const char *szFile, char *szText, size_t cbText);

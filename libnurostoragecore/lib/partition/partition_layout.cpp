@@ -81,7 +81,7 @@ int SectorsRead(const char *szDirectory, const char *szAttr, u64 *pSectors)
     char szFile[PATH_SIZE + 8];
     (void)snprintf(szFile, sizeof(szFile), "%s/%s", szDirectory, szAttr);
     char szLine[LINE_SIZE];
-    const ssize_t cbRead = AttributeRead(szFile, szLine, LINE_SIZE);
+    const ssize_t cbRead = AttributeLineRead(szFile, szLine, LINE_SIZE);
     if (cbRead <= ATTRIBUTE_NOT_READ) {
         NLIBCErrSetHere(cbRead == ATTRIBUTE_NOT_OPENED ? ERR_OPEN_FAILED : ERR_READ_FAILED);
         return -1;

@@ -60,7 +60,7 @@ int SlotGet(const char *szDir, i32 *pSlot)
     char szFile[PATH_SIZE];
     (void)snprintf(szFile, sizeof(szFile), "%s/slot", szDir);
     char szSlot[SLOT_SIZE];
-    const ssize_t cbRead = AttributeRead(szFile, szSlot, SLOT_SIZE);
+    const ssize_t cbRead = AttributeLineRead(szFile, szSlot, SLOT_SIZE);
     if (cbRead == ATTRIBUTE_NOT_OPENED) {
         // Kept: no code is set here, callers see the previous one.
         NLIBCLog(LOG_ERR, "failed to fopen %s, errno=%m", szFile);
@@ -112,7 +112,7 @@ int RAIDDiskAttrRead(const char *szFile, char *szBuf)
         NLIBCErrSetHere(ERR_BAD_PARAMETER);
         return -1;
     }
-    const ssize_t cbRead = AttributeRead(szFile, szBuf, RAID_ATTR_SIZE);
+    const ssize_t cbRead = AttributeLineRead(szFile, szBuf, RAID_ATTR_SIZE);
     if (cbRead == ATTRIBUTE_NOT_OPENED) {
         NLIBCLog(LOG_DEBUG, "Failed to fopen %s, errno=%m", szFile);
         NLIBCErrSetHere(ERR_OPEN_FAILED);
@@ -259,7 +259,7 @@ int RAIDSyncActionGet(int nMd, int *pAction)
     char szFile[PATH_SIZE];
     (void)snprintf(szFile, sizeof(szFile), "/sys/block/md%d/md/sync_action", nMd);
     char szAction[ACTION_SIZE];
-    const ssize_t cbRead = AttributeRead(szFile, szAction, ACTION_SIZE);
+    const ssize_t cbRead = AttributeLineRead(szFile, szAction, ACTION_SIZE);
     if (cbRead == ATTRIBUTE_NOT_OPENED) {
         NLIBCLog(LOG_ERR, "open \"%s\" failed", szFile);
         return -1;

@@ -1,9 +1,9 @@
 // SPDX-License-Identifier: MIT
 #include "nurostoragecore/raid_info.h"
 
+#include "attribute/attribute.h"
 #include "nurocore/error.h"
 #include "nurocore/handle.h"
-#include "nurocore/io.h"
 #include "nurocore/log.h"
 #include "nurocore/text.h"
 #include "raid/mdp_major.h"
@@ -290,11 +290,10 @@ u64 RAIDComponentSizeGet(int fd)
         (void)snprintf(szFile, sizeof(szFile), "/sys/block/md_d%u/md/component_size",
                        deviceMinor >> MDP_MINOR_SHIFT);
     }
-    // The whole text is a number, not its first line alone.
-    const FD_OWNER fdFile(open(szFile, O_RDONLY | O_CLOEXEC));
-    char szSize[COMPONENT_SIZE_TEXT_SIZE + 1] = {};
-    const ssize_t cbRead = fdFile ? NLIBCRead(fdFile.get(), szSize, COMPONENT_SIZE_TEXT_SIZE) : -1;
-    if (cbRead < 0 || cbRead == COMPONENT_SIZE_TEXT_SIZE) {
+    // The number is that of the whole text, not of its first line.
+    char szSize[COMPONENT_SIZE_TEXT_SIZE + 1];
+    const ssize_t cbRead = AttributeRead(szFile, szSize, sizeof(szSize));
+    if (cbRead <= ATTRIBUTE_NOT_READ || cbRead == COMPONENT_SIZE_TEXT_SIZE) {
         return 0;
     }
     return strtoull(szSize, nullptr, 10) * SECTORS_PER_KIB;
