@@ -161,6 +161,11 @@ void DestroyLvmSituations(std::vector<SITUATION> &all)
     MachineRemove(machine, "/proc/mounts");
     Add(all, "a volume, and no table of mounts", machine, {"destroy", "2"});
 
+    machine = WithDataArray(6);
+    VolumeAdd(machine);
+    MountAdd(machine, "/dev/vg1/lv1s1", "/mnt/one");
+    Add(all, "six disks with a volume, mounted", machine, {"destroy", "2"});
+
     machine = WithDataArray(2);
     VolumeAdd(machine, "  /dev/md3:vg3:lv3:\n  /dev/md2:vg1:lv1:\n  /dev/md2:vg1:lv2:\n");
     for (const char *const szTool : {"/sbin/lvremove", "/sbin/vgremove", "/sbin/pvremove"}) {

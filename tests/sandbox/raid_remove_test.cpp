@@ -4,6 +4,7 @@
 #include "removal_machine.h"
 
 #include <cerrno>
+#include <climits>
 #include <csignal>
 #include <cstring>
 #include <gtest/gtest.h>
@@ -101,6 +102,28 @@ TEST(RAIDRemove, AToolThatCannotBeRunFails)
                   .steps = {ZERO_TOLD}}});
 }
 
+TEST(RAIDRemove, BadArgumentsAreLoggedAndRunNothing)
+{
+    const RUN_RESULT result = MachineCall(MachineWithMirror(), [] {
+        const RAID_INFO info = RecordOf("/dev/md2");
+        RecordReset();
+        EXPECT_EQ(RAIDRemoveByInfo(nullptr), -1);
+        EXPECT_EQ(RAIDRemove(nullptr, nullptr), -1);
+        EXPECT_EQ(RAIDStop(nullptr), -1);
+        EXPECT_EQ(RAIDZeroSuperblock(nullptr), -1);
+        EXPECT_EQ(RAIDCleanSuperblock(nullptr, "uuid", nullptr), -1);
+        EXPECT_EQ(RAIDCleanSuperblock(&info, nullptr, nullptr), -1);
+        EXPECT_EQ(RAIDUUIDHashForRemoveGet(nullptr), -1);
+        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
+    });
+    std::string szExpected;
+    for (int i = 0; i < 7; i++) {
+        szExpected += "<11>raid_remove.cpp:# Bad parameters\n";
+    }
+    EXPECT_EQ(LogText(result), szExpected);
+    EXPECT_EQ(TranscriptText(result), "");
+}
+
 // ---- the UUID of a running array ---------------------------------------------------------------
 
 // That of md2, in a buffer of so many bytes; what is behind them stays.
@@ -138,6 +161,26 @@ TEST(RAIDUUIDGet, IsThatOfTheMemberThatSortsLast)
                   .call = [] { return UuidGet("", 1); },
                   .result = 1,
                   .steps = examined}});
+}
+
+TEST(RAIDUUIDGet, BadArgumentsSetACodeAndRunNothing)
+{
+    const RUN_RESULT result = MachineCall(MachineWithMirror(), [] {
+        char szUuid[64] = "before";
+        const auto refused = [&szUuid](const char *szMd, char *szBuf, int cbBuf) {
+            RecordReset();
+            EXPECT_EQ(RAIDUUIDGet(szMd, szBuf, cbBuf), -1);
+            EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
+            EXPECT_STREQ(szUuid, "before");
+        };
+        refused(nullptr, szUuid, sizeof(szUuid));
+        refused("/dev/md2", nullptr, sizeof(szUuid));
+        refused("/dev/md2", szUuid, 0);
+        refused("/dev/md2", szUuid, -1);
+        refused("/dev/md2", szUuid, INT_MIN);
+    });
+    EXPECT_EQ(LogText(result), "");
+    EXPECT_EQ(TranscriptText(result), "");
 }
 
 TEST(RAIDUUIDGet, FailsWithoutAnArrayMembersOrASuperblock)

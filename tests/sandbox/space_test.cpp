@@ -361,6 +361,18 @@ TEST(Space, RefusesNull)
                  {.szName = "no tool",
                   .call = [] { return SpaceExecl(nullptr, "-S", NULL); },
                   .result = -1,
+                  .code = ERR_BAD_PARAMETER},
+                 {.szName = "no vector",
+                  .call = [] { return SpaceExecv(nullptr); },
+                  .result = -1,
+                  .code = ERR_BAD_PARAMETER},
+                 {.szName = "an empty vector",
+                  .call =
+                      [] {
+                          const char *const argv[] = {nullptr};
+                          return SpaceExecv(argv);
+                      },
+                  .result = -1,
                   .code = ERR_BAD_PARAMETER}});
 }
 

@@ -83,7 +83,7 @@ void DevicePathBuild(const char *szDevice, char *szPath, size_t cbPath)
 
 DEVICE_PATH DevicePathOf(const char *szDevice)
 {
-    DEVICE_PATH path;
+    DEVICE_PATH path = {};
     DevicePathBuild(szDevice, path.sz, sizeof(path.sz));
     return path;
 }
