@@ -273,7 +273,7 @@ std::vector<KILL_CASE> CasesMake()
 STRINGS StateTake()
 {
     STRINGS lines;
-    const fs::path root = RoomRoot();
+    const fs::path root = PrivateRootFolder();
     for (const char *const szFolder : {"sys/block", "state"}) {
         for (const fs::directory_entry &entry : fs::recursive_directory_iterator(root / szFolder)) {
             const string szPath = "/" + fs::relative(entry.path(), root).string();

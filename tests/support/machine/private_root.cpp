@@ -249,7 +249,7 @@ std::string LogSocketMake()
     return "";
 }
 
-std::string RoomMake()
+std::string PrivateRootMake()
 {
     char szRoot[] = "/tmp/arrayctl-sandbox.XXXXXX";
     if (mkdtemp(szRoot) == nullptr) {
@@ -305,7 +305,7 @@ void FolderEmpty(int fdParent, const char *szName, dev_t device, const std::set<
     (void)closedir(pFolder);
 }
 
-void RoomEmpty()
+void PrivateRootEmpty()
 {
     const int fdRoot = open(g_szRoot.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
     struct stat info = {};
@@ -531,9 +531,9 @@ std::string DriverText(const MACHINE &machine)
 
 } // namespace
 
-void RoomEnter()
+void PrivateRootEnter()
 {
-    static const std::string szRefused = RoomMake();
+    static const std::string szRefused = PrivateRootMake();
     if (!szRefused.empty()) {
         (void)fflush(stdout);
         (void)fprintf(stderr, "sandbox: %s\n", szRefused.c_str());
@@ -541,17 +541,17 @@ void RoomEnter()
     }
 }
 
-const std::string &RoomRoot()
+const std::string &PrivateRootFolder()
 {
     return g_szRoot;
 }
 
-int RoomLogSocket()
+int PrivateRootLogSocket()
 {
     return g_fdLog;
 }
 
-void RoomAnswersWrite(const MACHINE &machine)
+void PrivateRootAnswersWrite(const MACHINE &machine)
 {
     std::string szRows;
     for (const TOOL_ROW &row : machine.rows) {
@@ -566,9 +566,9 @@ void RoomAnswersWrite(const MACHINE &machine)
     LogLayOut(machine.fNoLog);
 }
 
-void RoomLayOut(const MACHINE &machine)
+void PrivateRootLayOut(const MACHINE &machine)
 {
-    RoomEmpty();
+    PrivateRootEmpty();
 #ifdef SANDBOX_SANITIZED
     ProcLinksLayOut();
 #endif
@@ -592,5 +592,5 @@ void RoomLayOut(const MACHINE &machine)
         }
     }
     ToolsLayOut(machine);
-    RoomAnswersWrite(machine);
+    PrivateRootAnswersWrite(machine);
 }

@@ -9,16 +9,16 @@
 
 // Enters the private namespaces at the first call. If the kernel refuses, the program prints why
 // and ends: no test would mean anything.
-void RoomEnter();
+void PrivateRootEnter();
 
-const std::string &RoomRoot();
+const std::string &PrivateRootFolder();
 
 // The socket that is the machine's /dev/log.
-int RoomLogSocket();
+int PrivateRootLogSocket();
 
 // Empties the private root and lays the machine out in it.
-void RoomLayOut(const MACHINE &machine);
+void PrivateRootLayOut(const MACHINE &machine);
 
 // Writes the answers of the stand-ins and the driver, and starts a new transcript. Files are not
 // changed.
-void RoomAnswersWrite(const MACHINE &machine);
+void PrivateRootAnswersWrite(const MACHINE &machine);

@@ -80,9 +80,9 @@ std::string MemoryFileTake(int fd)
 
 // ---- the process that is watched ---------------------------------------------------------------
 
-void RoomGoInside()
+void PrivateRootGoInside()
 {
-    if (chroot(RoomRoot().c_str()) != 0 || chdir("/") != 0) {
+    if (chroot(PrivateRootFolder().c_str()) != 0 || chdir("/") != 0) {
         perror("sandbox: chroot");
         _exit(STATUS_NOT_STARTED);
     }
@@ -167,7 +167,7 @@ std::vector<std::string> EnvironmentOf(const MACHINE &machine)
 void ProcMount()
 {
 #ifdef SANDBOX_SANITIZED
-    const std::string szProc = RoomRoot() + WIRE_PROC;
+    const std::string szProc = PrivateRootFolder() + WIRE_PROC;
     if (unshare(CLONE_NEWNS) != 0 ||
         mount("proc", szProc.c_str(), "proc", MS_NOSUID | MS_NODEV | MS_NOEXEC, nullptr) != 0) {
         perror("sandbox: proc of the run");
@@ -186,7 +186,7 @@ void ProcMount()
     const pid_t pid = fork();
     if (pid == 0) {
         StreamsTake(streams);
-        RoomGoInside();
+        PrivateRootGoInside();
         body(streams);
         _exit(0);
     }
@@ -219,7 +219,7 @@ bool LogTake(RUN_RESULT &result)
 {
     static char ach[LOG_LINE_SIZE];
     bool fAny = false;
-    for (ssize_t cb = 0; (cb = recv(RoomLogSocket(), ach, sizeof(ach), MSG_DONTWAIT)) > 0;) {
+    for (ssize_t cb = 0; (cb = recv(PrivateRootLogSocket(), ach, sizeof(ach), MSG_DONTWAIT)) > 0;) {
         DatagramTake({ach, static_cast<size_t>(cb)}, result);
         fAny = true;
     }
@@ -231,7 +231,7 @@ bool ReportAwait(int fdReport, int msSilence, RUN_RESULT &result, CHILD_REPORT &
     using CLOCK = std::chrono::steady_clock;
     const CLOCK::time_point start = CLOCK::now();
     CLOCK::time_point heard = start;
-    struct pollfd polled[] = {{fdReport, POLLIN, 0}, {RoomLogSocket(), POLLIN, 0}};
+    struct pollfd polled[] = {{fdReport, POLLIN, 0}, {PrivateRootLogSocket(), POLLIN, 0}};
     bool fReported = false;
     while ((polled[0].revents & (POLLIN | POLLHUP)) == 0) {
         const auto silent = CLOCK::now() - heard;
@@ -370,7 +370,7 @@ RUN_RESULT ProgramWatch(const MACHINE &machine, const std::vector<std::string> &
     if (BodyOrderGet(order)) {
         return result;
     }
-    RoomEnter();
+    PrivateRootEnter();
     pLayOut(machine);
     std::string szFailures;
     return Watch(
@@ -479,12 +479,12 @@ void BodyReceive(const BODY_ORDER &order, const MACHINE &machine, const std::fun
 
 RUN_RESULT MachineTry(const MACHINE &machine, const std::vector<std::string> &arguments)
 {
-    return ProgramWatch(machine, arguments, RoomLayOut);
+    return ProgramWatch(machine, arguments, PrivateRootLayOut);
 }
 
 RUN_RESULT MachineTryAgain(const MACHINE &machine, const std::vector<std::string> &arguments)
 {
-    return ProgramWatch(machine, arguments, RoomAnswersWrite);
+    return ProgramWatch(machine, arguments, PrivateRootAnswersWrite);
 }
 
 RUN_RESULT MachineRun(const MACHINE &machine, const std::vector<std::string> &arguments)
@@ -521,8 +521,8 @@ RUN_RESULT MachineCall(const MACHINE &machine, const std::function<void()> &body
         BodyReceive(order, machine, body);
         return result;
     }
-    RoomEnter();
-    RoomLayOut(machine);
+    PrivateRootEnter();
+    PrivateRootLayOut(machine);
     std::string szFailures;
     const int nCall = BodyCount();
     const bool fElsewhere = getenv("ARRAYCTL_BODIES") != nullptr;
@@ -570,7 +570,7 @@ std::vector<std::string> MachineCalls()
 
 std::optional<std::string> MachineFileRead(const std::string &szPath)
 {
-    const int fd = open((RoomRoot() + szPath).c_str(), O_RDONLY | O_CLOEXEC);
+    const int fd = open((PrivateRootFolder() + szPath).c_str(), O_RDONLY | O_CLOEXEC);
     if (fd < 0) {
         return std::nullopt;
     }
