@@ -84,6 +84,11 @@ struct STREAM_NAME {
     char szPath[96];
 };
 
+struct FILE_NAME {
+    int fd;
+    char szPath[sizeof(STREAM_NAME::szPath)];
+};
+
 constexpr size_t STREAM_NAMES = 16;
 constexpr size_t PROCESS_NAME_SIZE = 32;
 constexpr char ANY_CALL[] = "*";
@@ -100,6 +105,7 @@ bool g_fRealSleep = false;
 std::int64_t g_when = 0;
 bool g_fCallsTold = false;
 STREAM_NAME g_streamNames[STREAM_NAMES];
+FILE_NAME g_fileName = {-1, ""};
 size_t g_nStreamName = 0;
 
 // "0" is the program, "0.2" the second process that it forked, "0.2.1" the first one of that.
@@ -294,7 +300,22 @@ bool FaultIsDue(const char *szFunction, const char *szObject = NO_OBJECT)
     return false;
 }
 
-// ---- names of streams and processes ------------------------------------------------------------
+// ---- names of files, streams and processes -----------------------------------------------------
+
+// Only the file opened last: an attribute is read at once.
+int FileName(int fd, const char *szPath)
+{
+    if (g_fActive && fd >= 0) {
+        g_fileName.fd = fd;
+        snprintf(g_fileName.szPath, sizeof(g_fileName.szPath), "%s", szPath);
+    }
+    return fd;
+}
+
+const char *NameOf(int fd)
+{
+    return fd == g_fileName.fd ? g_fileName.szPath : NO_OBJECT;
+}
 
 FILE *StreamName(FILE *pStream, const char *szPath)
 {
@@ -620,10 +641,17 @@ WRAP_ALLOCATION(realloc, (void *p, size_t cb), (p, cb))
 WRAP(strdup, char *, nullptr, (const char *sz), (sz))
 WRAP(strndup, char *, nullptr, (const char *sz, size_t cb), (sz, cb))
 
-WRAP_CALL("open", sz, open, int, -1, (const char *sz, int flags, mode_t mode), (sz, flags, mode))
-WRAP_CALL("open", sz, open64, int, -1, (const char *sz, int flags, mode_t mode), (sz, flags, mode))
-WRAP_CALL("open", sz, __open_2, int, -1, (const char *sz, int flags), (sz, flags))
-WRAP_CALL("open", sz, __open64_2, int, -1, (const char *sz, int flags), (sz, flags))
+#define WRAP_OPEN_FILE(symbol, parameters, arguments)                                              \
+    VISIBLE int Wrap_##symbol parameters __asm__(#symbol);                                         \
+    VISIBLE int Wrap_##symbol parameters                                                           \
+    {                                                                                              \
+        static int(*pReal) parameters = nullptr;                                                   \
+        return FaultIsDue("open", sz) ? -1 : FileName(Next(pReal, #symbol) arguments, sz);         \
+    }
+WRAP_OPEN_FILE(open, (const char *sz, int flags, mode_t mode), (sz, flags, mode))
+WRAP_OPEN_FILE(open64, (const char *sz, int flags, mode_t mode), (sz, flags, mode))
+WRAP_OPEN_FILE(__open_2, (const char *sz, int flags), (sz, flags))
+WRAP_OPEN_FILE(__open64_2, (const char *sz, int flags), (sz, flags))
 
 #define WRAP_OPEN(szName, symbol)                                                                  \
     VISIBLE FILE *Wrap_##symbol(const char *sz, const char *szMode) __asm__(#symbol);              \
@@ -656,9 +684,9 @@ WRAP_CALL("getline", NameOf(p), getline, ssize_t, -1, (char **psz, size_t *pcb, 
           (psz, pcb, p))
 WRAP_CALL("getline", NameOf(p), __getdelim, ssize_t, -1, (char **psz, size_t *pcb, int ch, FILE *p),
           (psz, pcb, ch, p))
-WRAP(read, ssize_t, -1, (int fd, void *p, size_t cb), (fd, p, cb))
-WRAP_AS("read", __read_chk, ssize_t, -1, (int fd, void *p, size_t cb, size_t cbBuffer),
-        (fd, p, cb, cbBuffer))
+WRAP_CALL("read", NameOf(fd), read, ssize_t, -1, (int fd, void *p, size_t cb), (fd, p, cb))
+WRAP_CALL("read", NameOf(fd), __read_chk, ssize_t, -1,
+          (int fd, void *p, size_t cb, size_t cbBuffer), (fd, p, cb, cbBuffer))
 WRAP(write, ssize_t, -1, (int fd, const void *p, size_t cb), (fd, p, cb))
 WRAP(pipe2, int, -1, (int *pfd, int flags), (pfd, flags))
 
