@@ -126,7 +126,8 @@ inline constexpr ALLOWANCE ALLOWANCES[] = {
      "the array is made of the disks that are known, at the level that fits their number"},
 
     {DIFFERENCE::ABORT, "", "^(malloc|\\*) ",
-     "^free\\(\\): double free detected in tcache 2\n$|attempting double-free .* in __glob|"
+     "^(free\\(\\): double free detected in tcache 2|double free or corruption \\(fasttop\\))\n$|"
+     "attempting double-free .* in __glob|"
      "attempting double-free [^\n]*\n +#0 [^\n]*\n +#1 [^\n]*/libc\\.so\\.6", // without names
      "ABORTS: the C library's glob frees names twice when memory ends while it puts the folder "
      "before them"},
