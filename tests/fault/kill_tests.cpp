@@ -248,6 +248,7 @@ std::vector<KILL_CASE> CasesMake()
 {
     const string szOneSlot = string(CONF_RAID) + "max_sys_raid_disks=\"1\"\n";
     return {
+        {"status: an array", WithDataArray(), {"status", "2"}},
         {"destroy: an array", WithDataArray(), {"destroy", "2"}, {STOPPED_BEFORE_WIPED}},
         {"destroy: a mounted volume", WithVolume(), {"destroy", "2"}, {STOPPED_BEFORE_WIPED}},
         {"newvol: two disks", WithDataDisks(), {"newvol"}},
