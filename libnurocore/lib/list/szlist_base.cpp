@@ -31,6 +31,26 @@
 namespace
 {
 
+i32 *Slots(PNLIBSZLIST pList)
+{
+    return reinterpret_cast<i32 *>(pList + 1);
+}
+
+const i32 *Slots(const NLIBSZLIST *pList)
+{
+    return reinterpret_cast<const i32 *>(pList + 1);
+}
+
+char *At(PNLIBSZLIST pList, i32 offset)
+{
+    return reinterpret_cast<char *>(pList) + offset;
+}
+
+const char *At(const NLIBSZLIST *pList, i32 offset)
+{
+    return reinterpret_cast<const char *>(pList) + offset;
+}
+
 constexpr i32 LIST_SIZE_MIN = 512;
 constexpr i32 LIST_HEADER_SIZE = sizeof(NLIBSZLIST);
 constexpr i32 LIST_SLOT_SIZE = sizeof(i32);
@@ -118,7 +138,7 @@ PNLIBSZLIST BlockAlloc(i32 nSize)
     pList->nSize = nSize;
     pList->fMode = SZLIST_UNSORTED;
     pList->pszEmpty = nSize - 1;
-    *SzListAt(pList, pList->pszEmpty) = '\0';
+    *At(pList, pList->pszEmpty) = '\0';
     Reset(pList);
     return pList;
 }
@@ -127,7 +147,7 @@ PNLIBSZLIST BlockAlloc(i32 nSize)
 i32 StringStore(PNLIBSZLIST pList, const char *szItem, size_t cbItem)
 {
     pList->EndofFree -= static_cast<i32>(cbItem);
-    memmove(SzListAt(pList, pList->EndofFree), szItem, cbItem);
+    memmove(At(pList, pList->EndofFree), szItem, cbItem);
     return pList->EndofFree;
 }
 
@@ -147,11 +167,11 @@ PNLIBSZLIST Grow(const NLIBSZLIST *pList)
     pNew->nFree -= pList->nItem * LIST_SLOT_SIZE;
     for (i32 i = 0; i < pList->nItem; i++) {
         if (SzListIsEmptySlot(pList, i)) {
-            SzListSlots(pNew)[i] = pNew->pszEmpty;
+            Slots(pNew)[i] = pNew->pszEmpty;
             continue;
         }
         const size_t cbItem = strlen(SzListItem(pList, i)) + 1;
-        SzListSlots(pNew)[i] = StringStore(pNew, SzListItem(pList, i), cbItem);
+        Slots(pNew)[i] = StringStore(pNew, SzListItem(pList, i), cbItem);
         pNew->nFree -= static_cast<i32>(cbItem);
     }
     return pNew;
@@ -187,7 +207,7 @@ int InsertPlace(const NLIBSZLIST *pList, int index, const char *szItem)
 
 void SlotPut(PNLIBSZLIST pList, i32 index, i32 offset)
 {
-    i32 *const pSlots = SzListSlots(pList);
+    i32 *const pSlots = Slots(pList);
     if (index < pList->nItem) {
         std::copy_backward(pSlots + index, pSlots + pList->nItem, pSlots + pList->nItem + 1);
         pList->nItem++;
@@ -205,7 +225,7 @@ struct SLOT_LESS {
 
     bool operator()(i32 a, i32 b) const
     {
-        return pCompare(SzListAt(pList, a), SzListAt(pList, b)) < 0;
+        return pCompare(At(pList, a), At(pList, b)) < 0;
     }
 };
 
@@ -248,11 +268,20 @@ void SlotsSort(i32 *pFirst, i32 *pLast, SLOT_LESS isLess)
 
 void Sort(PNLIBSZLIST pList, SZLIST_COMPARE pCompare)
 {
-    SlotsSort(SzListSlots(pList), SzListSlots(pList) + pList->nItem,
-              {.pList = pList, .pCompare = pCompare});
+    SlotsSort(Slots(pList), Slots(pList) + pList->nItem, {.pList = pList, .pCompare = pCompare});
 }
 
 } // namespace
+
+const char *SzListItem(const NLIBSZLIST *pList, i32 index)
+{
+    return At(pList, Slots(pList)[index]);
+}
+
+bool SzListIsEmptySlot(const NLIBSZLIST *pList, i32 index)
+{
+    return Slots(pList)[index] == pList->pszEmpty;
+}
 
 bool SzListIsSortedMode(int fMode)
 {
@@ -355,7 +384,7 @@ const char *NLIBCSzListRemove(PNLIBSZLIST pList, int index)
         return nullptr;
     }
     const char *const szRemoved = SzListItem(pList, index);
-    i32 *const pSlots = SzListSlots(pList);
+    i32 *const pSlots = Slots(pList);
     std::copy(pSlots + index + 1, pSlots + pList->nItem, pSlots + index);
     pList->nItem--;
     pList->nFree += LIST_SLOT_SIZE;
@@ -371,10 +400,10 @@ int NLIBCSzListSet(PNLIBSZLIST *ppList, int index, const char *szItem)
     NLIBSZLIST *const pList = *ppList;
     const size_t cbItem = strlen(szItem) + 1;
     if (cbItem <= strlen(SzListItem(pList, index)) + 1) {
-        memmove(SzListAt(pList, SzListSlots(pList)[index]), szItem, cbItem);
+        memmove(At(pList, Slots(pList)[index]), szItem, cbItem);
     } else {
         // Kept: the list does not grow here and room is not checked; callers look at nFree.
-        SzListSlots(pList)[index] = StringStore(pList, szItem, cbItem);
+        Slots(pList)[index] = StringStore(pList, szItem, cbItem);
         pList->nFree -= static_cast<i32>(cbItem);
     }
     if (!SzListIsSortedMode(pList->fMode)) {
@@ -409,7 +438,7 @@ void NLIBCSzListCompact(PNLIBSZLIST pList)
         NLIBCErrSetHere(ERR_BAD_PARAMETER);
         return;
     }
-    i32 *const pSlots = SzListSlots(pList);
+    i32 *const pSlots = Slots(pList);
     i32 *const pEnd = std::remove(pSlots, pSlots + pList->nItem, pList->pszEmpty);
     const auto nKept = static_cast<i32>(pEnd - pSlots);
     pList->nFree += (pList->nItem - nKept) * LIST_SLOT_SIZE;
@@ -447,9 +476,9 @@ int NLIBCSzListDump(const NLIBSZLIST *pList)
     (void)printf("%p start address \n", static_cast<const void *>(pList));
     for (i32 i = 0; i < pList->nItem; i++) {
         (void)printf("%p ,%p pszItem[%i]=%s\n", static_cast<const void *>(SzListItem(pList, i)),
-                     static_cast<const void *>(SzListSlots(pList) + i), i, SzListItem(pList, i));
+                     static_cast<const void *>(Slots(pList) + i), i, SzListItem(pList, i));
     }
     return printf("nSize =%i \t nItem =%i \t nFree =%i \t fMode =%i \t EndofFree=%p\n",
                   pList->nSize, pList->nItem, pList->nFree, pList->fMode,
-                  static_cast<const void *>(SzListAt(pList, pList->EndofFree)));
+                  static_cast<const void *>(At(pList, pList->EndofFree)));
 }

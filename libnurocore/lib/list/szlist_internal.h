@@ -1,40 +1,15 @@
 // SPDX-License-Identifier: MIT
 #pragma once
 
-// What joining and merging know of a list beside its public functions: where slots and strings lie,
-// and which order a mode means.
+// What joining and merging know of a list beside its public functions: its slots, and which order a
+// mode means.
 
 #include "nurocore/szlist_base.h"
 
-inline i32 *SzListSlots(PNLIBSZLIST pList)
-{
-    return reinterpret_cast<i32 *>(pList + 1);
-}
+// The string of a slot, which must be in use: index is not checked.
+const char *SzListItem(const NLIBSZLIST *pList, i32 index);
 
-inline const i32 *SzListSlots(const NLIBSZLIST *pList)
-{
-    return reinterpret_cast<const i32 *>(pList + 1);
-}
-
-inline char *SzListAt(PNLIBSZLIST pList, i32 offset)
-{
-    return reinterpret_cast<char *>(pList) + offset;
-}
-
-inline const char *SzListAt(const NLIBSZLIST *pList, i32 offset)
-{
-    return reinterpret_cast<const char *>(pList) + offset;
-}
-
-inline const char *SzListItem(const NLIBSZLIST *pList, i32 index)
-{
-    return SzListAt(pList, SzListSlots(pList)[index]);
-}
-
-inline bool SzListIsEmptySlot(const NLIBSZLIST *pList, i32 index)
-{
-    return SzListSlots(pList)[index] == pList->pszEmpty;
-}
+bool SzListIsEmptySlot(const NLIBSZLIST *pList, i32 index);
 
 using SZLIST_COMPARE = int (*)(const char *, const char *);
 

@@ -1,20 +1,20 @@
 // SPDX-License-Identifier: MIT
 #include "space/command_text.h"
 
+#include "nurocore/text.h"
+
 #include <algorithm>
-#include <cstring>
 
 void CommandTextBuild(const char *const argv[], size_t cchArgumentMax, char *szText, size_t cbText)
 {
     size_t cchText = 0;
-    for (size_t i = 0; argv[i] != nullptr && cchText < cbText - 1; i++) {
+    szText[0] = '\0';
+    for (size_t i = 0; argv[i] != nullptr; i++) {
         if (i > 0) {
-            szText[cchText++] = ' ';
+            cchText = NLIBCStrAppend(szText, cbText, " ");
         }
-        const size_t cchArgument =
-            std::min({strlen(argv[i]), cchArgumentMax, cbText - 1 - cchText});
-        memcpy(szText + cchText, argv[i], cchArgument);
-        cchText += cchArgument;
+        // A buffer that ends earlier cuts the argument.
+        const size_t cbHere = std::min(cbText, cchText + cchArgumentMax + 1);
+        cchText = NLIBCStrAppend(szText, cbHere, argv[i]);
     }
-    szText[cchText] = '\0';
 }
