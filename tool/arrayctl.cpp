@@ -2,6 +2,8 @@
 //
 // The command line. Output for people goes to standard output, output for developers to syslog, and
 // nothing to standard error.
+#include "arrayctl_internal.h"
+
 #include "hwcontrol/disk_name.h"
 #include "hwcontrol/disk_path.h"
 #include "hwcontrol/disk_port.h"
@@ -117,6 +119,8 @@ void DisksPrint(const RAID_DISK *pDisks)
     }
 }
 
+} // namespace
+
 void ReportPrint(const RAID_INFO &info)
 {
     const auto cbArray = static_cast<unsigned long long>(info.arraySize);
@@ -130,6 +134,9 @@ void ReportPrint(const RAID_INFO &info)
     DisksPrint(info.pDisks);
     (void)putchar('\n');
 }
+
+namespace
+{
 
 int StatusReport(const char *szMd)
 {
@@ -168,12 +175,6 @@ int ArrayDestroy(const char *szMd)
 
 // --- shared by the commands that work on all disks ---------------------------------------------
 
-// What is to be done with a disk; also the exit status of the child that decides it.
-constexpr int FORMAT_NONE = 0;         // left alone
-constexpr int FORMAT_WIPE = 1;         // all partitions are deleted
-constexpr int FORMAT_KEEP_DATA = 2;    // only the system partitions are made anew
-constexpr int FORMAT_UNRECOGNISED = 4; // as KEEP_DATA if no other disk keeps its data
-
 constexpr int PARTITION_SYSTEM = 1;
 constexpr int PARTITION_SWAP = 2;
 
@@ -183,12 +184,6 @@ constexpr char FORCE_CLEAN_MARKER[] = "/.force_clean_all_disk";
 constexpr u32 UPGRADE_FROM_VERSION = 7;
 constexpr u32 UPGRADE_TO_VERSION = 8;
 constexpr u32 ALWAYS_WIPED_VERSION = 1;
-
-// The child process of one disk, and the decision in its exit status.
-struct DISK_CHILD {
-    pid_t pid;
-    int type;
-};
 
 constexpr pid_t NO_CHILD = -1;
 
@@ -230,7 +225,8 @@ DISK_CHILD *ChildrenAlloc(int nDisk)
     return pChildren;
 }
 
-// What has to be done with a disk so that it has the system partitions of the wanted layout.
+} // namespace
+
 int DiskFormatTypeGet(const char *szDisk, u32 wanted)
 {
     constexpr int RAID_MACHINE = 1;
@@ -265,6 +261,9 @@ int DiskFormatTypeGet(const char *szDisk, u32 wanted)
     }
     return wanted == ALWAYS_WIPED_VERSION ? FORMAT_WIPE : FORMAT_KEEP_DATA;
 }
+
+namespace
+{
 
 int DecideInChild(const char *szDisk, u32 version)
 {
@@ -368,6 +367,8 @@ void DecideCollect(const NLIBSZLIST *pDisks, DISK_CHILD *pChildren)
     }
 }
 
+} // namespace
+
 int PartitionInChild(const char *szDisk, int type, u32 version)
 {
     const DEVICE_PATH disk = DevicePathOf(szDisk);
@@ -389,6 +390,9 @@ int PartitionInChild(const char *szDisk, int type, u32 version)
     }
     return CHILD_PARTITIONED;
 }
+
+namespace
+{
 
 int PartitionStart(const NLIBSZLIST *pDisks, u32 version, std::span<DISK_CHILD> children)
 {
@@ -478,6 +482,16 @@ void PartitionsDuplicate(const SYSTEM_MEMBERS &members)
     }
 }
 
+void MissingTextBuild(int nMissing, char *szText)
+{
+    szText[0] = '\0';
+    for (int i = 0; i < nMissing && strlen(szText) < MISSING_TEXT_SIZE - 1; i++) {
+        (void)NLIBCStrAppend(szText, MISSING_TEXT_SIZE, " missing");
+    }
+}
+
+} // namespace
+
 // The system arrays use the old superblock format.
 // Kept: compared over the length of the given path, so any prefix of the two paths matches too.
 const char *MetadataOption(const char *szMd)
@@ -486,14 +500,6 @@ const char *MetadataOption(const char *szMd)
     const bool fSystemArray =
         strncmp(szMd, "/dev/md0", cchMd) == 0 || strncmp(szMd, "/dev/md1", cchMd) == 0;
     return fSystemArray ? "-e 0.9" : "";
-}
-
-void MissingTextBuild(int nMissing, char *szText)
-{
-    szText[0] = '\0';
-    for (int i = 0; i < nMissing && strlen(szText) < MISSING_TEXT_SIZE - 1; i++) {
-        (void)NLIBCStrAppend(szText, MISSING_TEXT_SIZE, " missing");
-    }
 }
 
 int SystemRaidCreate(const char *szMd, int nDisk, int nSlot, const char *szMembers)
@@ -516,6 +522,9 @@ int SystemRaidCreate(const char *szMd, int nDisk, int nSlot, const char *szMembe
     }
     return 0;
 }
+
+namespace
+{
 
 // Creating the arrays is best effort; the exit status depends only on whether there are members.
 int SystemArraysCreate(const SYSTEM_MEMBERS &members, int nSlot)
@@ -699,12 +708,6 @@ constexpr size_t NUMBERS_TEXT_SIZE = 4096;
 constexpr size_t NUMBER_TEXT_SIZE = 16;
 constexpr int STATUS_PUSH_FAILED = -1; // the tool's caller sees 255
 
-struct FORMAT_LISTS {
-    PNLIBSZLIST pAll;
-    PNLIBSZLIST pKeepData;
-    PNLIBSZLIST pFormatAll;
-};
-
 int PushDecided(PNLIBSZLIST *ppList, const char *szDisk)
 {
     if (NLIBCSzListPush(ppList, szDisk) < 0) {
@@ -713,6 +716,8 @@ int PushDecided(PNLIBSZLIST *ppList, const char *szDisk)
     }
     return 0;
 }
+
+} // namespace
 
 int FormatTypesCollect(const DISK_CHILD *pChildren, FORMAT_LISTS &lists)
 {
@@ -728,6 +733,9 @@ int FormatTypesCollect(const DISK_CHILD *pChildren, FORMAT_LISTS &lists)
     }
     return 0;
 }
+
+namespace
+{
 
 void NumbersBuild(const NLIBSZLIST *pDisks, char *szNumbers)
 {

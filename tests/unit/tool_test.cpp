@@ -1,14 +1,16 @@
 // SPDX-License-Identifier: MIT
 //
-// What the command layer does with values that no machine gives it: its source is compiled in here,
-// with its entry point renamed.
+// What the command layer does with values that no machine gives it. The program is linked in here,
+// where its entry point is no longer the one and bears another name.
+#include "arrayctl_internal.h"
+
+#include <algorithm>
+#include <cstring>
 #include <gtest/gtest.h>
+#include <syslog.h>
+#include <unistd.h>
 
-int ArrayctlMain(int argc, char *argv[]);
-
-#define main ArrayctlMain
-#include "../../tool/arrayctl.cpp"
-#undef main
+extern "C" int ArrayctlMain(int argc, char *argv[]);
 
 namespace
 {

@@ -6,6 +6,7 @@
 #include "nurocore/log.h"
 #include "nurocore/process.h"
 #include "nurocore/types.h"
+#include "pipe_internal.h"
 
 #include <atomic>
 #include <cerrno>
@@ -22,7 +23,7 @@
 namespace
 {
 
-constexpr int SPIN_ATTEMPTS = 65536;
+constexpr u32 SPIN_ATTEMPTS = 65536;
 constexpr int STATUS_NOT_EXECUTED = 127;
 
 struct PIPE_STREAM {
@@ -32,25 +33,7 @@ struct PIPE_STREAM {
 };
 
 PIPE_STREAM *g_pStreams = nullptr; // newest first
-// The tool has one thread and never waits here; the lock is for programs with several threads.
 std::atomic<u32> g_streamsLock = 0;
-
-void StreamsLock()
-{
-    int nAttempt = 0;
-    while (g_streamsLock.exchange(1) != 0) {
-        if (++nAttempt == SPIN_ATTEMPTS) {
-            (void)sched_yield();
-            nAttempt = 0;
-        }
-    }
-}
-
-void StreamsUnlock()
-{
-    std::atomic_thread_fence(std::memory_order_seq_cst);
-    g_streamsLock.store(0, std::memory_order_relaxed);
-}
 
 // What the letters of a mode ask for.
 struct PIPE_MODE {
@@ -169,10 +152,10 @@ FILE *StreamRegister(HEAP_OWNER<PIPE_STREAM> pRecord, const PIPE_MODE &mode, FD_
     }
     (void)fdOurs.release();
     pRecord->pStream = pStream;
-    StreamsLock();
+    (void)PipeStreamsLock();
     pRecord->pNext = g_pStreams;
     g_pStreams = pRecord.release();
-    StreamsUnlock();
+    PipeStreamsUnlock();
     return pStream;
 }
 
@@ -191,6 +174,23 @@ PIPE_STREAM *StreamUnlink(const FILE *pStream)
 }
 
 } // namespace
+
+u32 PipeStreamsLock()
+{
+    u32 nFailed = 0;
+    while (g_streamsLock.exchange(1) != 0) {
+        if (++nFailed % SPIN_ATTEMPTS == 0) {
+            (void)sched_yield();
+        }
+    }
+    return nFailed;
+}
+
+void PipeStreamsUnlock()
+{
+    std::atomic_thread_fence(std::memory_order_seq_cst);
+    g_streamsLock.store(0, std::memory_order_relaxed);
+}
 
 FILE *NLIBCPopenV(const char *szPath, const char *szMode, char *const argv[])
 {
@@ -214,13 +214,13 @@ FILE *NLIBCPopenV(const char *szPath, const char *szMode, char *const argv[])
     FD_OWNER fdTheirs(fdPipe[mode.fRead ? 1 : 0]);
 
     // Forked under the lock, so that the child never inherits a half-changed registry.
-    StreamsLock();
+    (void)PipeStreamsLock();
     const pid_t pid = fork();
     if (pid == 0) {
         ChildRun(szPath, mode, fdTheirs.get(), argv);
     }
     pRecord->pid = pid;
-    StreamsUnlock();
+    PipeStreamsUnlock();
 
     fdTheirs.reset();
     if (pid < 0) {
@@ -253,12 +253,12 @@ int NLIBCPclose(FILE *pStream)
         NLIBCErrSetHere(ERR_BAD_PARAMETER);
         return -1;
     }
-    StreamsLock();
+    (void)PipeStreamsLock();
     const HEAP_OWNER<PIPE_STREAM> pRecord(StreamUnlink(pStream));
     if (pRecord != nullptr) {
         (void)fclose(pStream);
     }
-    StreamsUnlock();
+    PipeStreamsUnlock();
     if (pRecord == nullptr) {
         NLIBCErrSetHere(ERR_NO_SUCH_CHILD);
         return -1;
