@@ -43,30 +43,36 @@ namespace
 constexpr size_t DRIVER_SIZE = 65536;
 constexpr size_t DEVICES = 64;
 constexpr size_t FAULTS = 16;
-constexpr size_t ARRAY_INFO_WORDS = sizeof(mdu_array_info_t) / sizeof(int);
+constexpr size_t ANSWERS = 4;
 
-struct SYNC_ANSWER {
-    std::uint64_t activity;
-    std::uint64_t done;
-    std::uint64_t total;
+// A request as the driver file names it, and the width of the numbers in its answer. An array
+// answers all of them, any other node the first one.
+struct REQUEST {
+    const char *szName;
+    unsigned long number;
+    size_t cbNumber;
 };
 
-constexpr unsigned long REQUEST_HEALTH = _IOR(MD_MAJOR, 0x61, int);
-constexpr unsigned long REQUEST_SYNC = _IOR(MD_MAJOR, 0x60, SYNC_ANSWER);
+constexpr REQUEST REQUESTS[ANSWERS] = {
+    {"size", BLKGETSIZE64, sizeof(std::uint64_t)},
+    {"array", GET_ARRAY_INFO, sizeof(int)},
+    {"health", _IOR(MD_MAJOR, 0x61, int), sizeof(int)},
+    {"sync", _IOR(MD_MAJOR, 0x60, std::uint64_t[3]), sizeof(std::uint64_t)},
+};
+
+struct ANSWER {
+    unsigned long request;
+    int error;
+    size_t cb;
+    unsigned char ab[sizeof(mdu_array_info_t)];
+};
 
 struct DEVICE {
     const char *szPath;
-    bool fArray;
     unsigned int deviceMajor;
     unsigned int deviceMinor;
-    int errnoInfo;
-    int info[ARRAY_INFO_WORDS];
-    int errnoSize;
-    std::uint64_t cb;
-    int errnoHealth;
-    int health;
-    int errnoSync;
-    SYNC_ANSWER sync;
+    ANSWER answers[ANSWERS];
+    size_t nAnswer;
 };
 
 struct FAULT {
@@ -114,85 +120,83 @@ int g_nFork = 0;
 
 // ---- the driver file ---------------------------------------------------------------------------
 
-struct READER {
-    char *pch;
-    char *pEnd;
-};
-
-// The next field. Every field of this file ends with a blank, so that a number stops before the
-// length of the next field.
-char *FieldNext(READER &reader, READER *pInner)
+// The next word of a line; empty at its end.
+char *WordNext(char *&pLine)
 {
     static char szNone[] = "";
-    if (reader.pch >= reader.pEnd) {
-        return szNone;
-    }
-    char *pStart = nullptr;
-    const unsigned long cb = strtoul(reader.pch, &pStart, 10);
-    pStart++;
-    reader.pch = pStart + cb;
-    if (pInner != nullptr) {
-        *pInner = {pStart, reader.pch};
-    }
-    return pStart;
+    char *const szWord = strsep(&pLine, " ");
+    return szWord == nullptr ? szNone : szWord;
 }
 
-std::uint64_t NumberNext(READER &reader)
+std::int64_t NumberNext(char *&pLine)
 {
-    return strtoull(FieldNext(reader, nullptr), nullptr, 10);
+    return static_cast<std::int64_t>(strtoull(WordNext(pLine), nullptr, 10));
 }
 
-int WordNext(READER &reader)
+int IntNext(char *&pLine)
 {
-    return static_cast<int>(strtol(FieldNext(reader, nullptr), nullptr, 10));
+    return static_cast<int>(NumberNext(pLine));
 }
 
-char *TextNext(READER &reader)
-{
-    char *const pch = FieldNext(reader, nullptr);
-    char *const pBlank = strchr(pch, ' ');
-    if (pBlank != nullptr) {
-        *pBlank = '\0';
-    }
-    return pch;
-}
-
-void DeviceTake(READER reader)
+void DeviceTake(char *pLine)
 {
     if (g_nDevice == DEVICES) {
         abort();
     }
     DEVICE &device = g_devices[g_nDevice++];
-    device.szPath = TextNext(reader);
-    device.fArray = WordNext(reader) != 0;
-    device.deviceMajor = static_cast<unsigned int>(WordNext(reader));
-    device.deviceMinor = static_cast<unsigned int>(WordNext(reader));
-    device.errnoInfo = WordNext(reader);
-    for (int &word : device.info) {
-        word = WordNext(reader);
-    }
-    device.errnoSize = WordNext(reader);
-    device.cb = NumberNext(reader);
-    device.errnoHealth = WordNext(reader);
-    device.health = WordNext(reader);
-    device.errnoSync = WordNext(reader);
-    device.sync.activity = NumberNext(reader);
-    device.sync.done = NumberNext(reader);
-    device.sync.total = NumberNext(reader);
+    device.szPath = WordNext(pLine);
+    device.deviceMajor = static_cast<unsigned int>(IntNext(pLine));
+    device.deviceMinor = static_cast<unsigned int>(IntNext(pLine));
+    device.nAnswer = 0;
 }
 
-void FaultTake(READER reader)
+// What the last device answers to a request: an errno, and the numbers one behind the other.
+void AnswerTake(const REQUEST &request, char *pLine)
+{
+    DEVICE &device = g_devices[g_nDevice - 1];
+    ANSWER &answer = device.answers[device.nAnswer++];
+    answer.request = request.number;
+    answer.error = IntNext(pLine);
+    for (answer.cb = 0; pLine != nullptr; answer.cb += request.cbNumber) {
+        const std::int64_t number = NumberNext(pLine);
+        const int word = static_cast<int>(number);
+        const void *const p =
+            request.cbNumber == sizeof(word) ? &word : static_cast<const void *>(&number);
+        memcpy(answer.ab + answer.cb, p, request.cbNumber);
+    }
+}
+
+void FaultTake(char *pLine)
 {
     if (g_nFault == FAULTS) {
         abort();
     }
     FAULT &fault = g_faults[g_nFault++];
-    fault.szFunction = TextNext(reader);
-    fault.nCall = WordNext(reader);
-    fault.error = WordNext(reader);
-    fault.fGoOn = WordNext(reader) != 0;
-    fault.szProcess = TextNext(reader);
+    fault.szFunction = WordNext(pLine);
+    fault.nCall = IntNext(pLine);
+    fault.error = IntNext(pLine);
+    fault.fGoOn = IntNext(pLine) != 0;
+    fault.szProcess = WordNext(pLine);
     fault.nSeen = 0;
+}
+
+void LineTake(char *pLine)
+{
+    const char *const szKind = WordNext(pLine);
+    for (const REQUEST &request : REQUESTS) {
+        if (strcmp(szKind, request.szName) == 0) {
+            AnswerTake(request, pLine);
+        }
+    }
+    if (strcmp(szKind, "device") == 0) {
+        DeviceTake(pLine);
+    } else if (strcmp(szKind, "fault") == 0) {
+        FaultTake(pLine);
+    } else if (strcmp(szKind, "time") == 0) {
+        g_when = NumberNext(pLine);
+    }
+    g_fCallsTold = g_fCallsTold || strcmp(szKind, "calls") == 0;
+    g_fRealSleep = g_fRealSleep || strcmp(szKind, "realsleep") == 0;
 }
 
 bool DriverRead()
@@ -203,22 +207,9 @@ bool DriverRead()
     }
     const long cb = syscall(SYS_read, fd, g_achDriver, sizeof(g_achDriver) - 1);
     (void)syscall(SYS_close, fd);
-    READER reader = {g_achDriver, g_achDriver + (cb < 0 ? 0 : cb)};
-    while (reader.pch < reader.pEnd) {
-        READER record = {};
-        (void)FieldNext(reader, &record);
-        const char *const szKind = TextNext(record);
-        if (strcmp(szKind, "device") == 0) {
-            DeviceTake(record);
-        } else if (strcmp(szKind, "fault") == 0) {
-            FaultTake(record);
-        } else if (strcmp(szKind, "time") == 0) {
-            g_when = static_cast<std::int64_t>(NumberNext(record));
-        } else if (strcmp(szKind, "calls") == 0) {
-            g_fCallsTold = true;
-        } else {
-            g_fRealSleep = true;
-        }
+    g_achDriver[cb < 0 ? 0 : cb] = '\0';
+    for (char *pRest = g_achDriver; pRest != nullptr;) {
+        LineTake(strsep(&pRest, "\n"));
     }
     return true;
 }
@@ -227,10 +218,12 @@ bool DriverRead()
 
 void EventRecord(const char *szKind, const char *szWord, const char *szMore)
 {
-    char ach[256] = "";
-    const int cb = snprintf(ach, sizeof(ach), "%zu:%s%zu:%s%zu:%s", strlen(szKind), szKind,
-                            strlen(szWord), szWord, strlen(szMore), szMore);
-    WireSend(ach, static_cast<size_t>(cb));
+    static WIRE_RECORD record;
+    record.cb = 0;
+    for (const char *const sz : {szKind, szWord, szMore}) {
+        WireAdd(record, sz);
+    }
+    WireSend(record);
 }
 
 // A fault of one process alone tells what its call was about, too.
@@ -348,11 +341,12 @@ void ProcessNameExtend()
 
 // ---- the next in line --------------------------------------------------------------------------
 
-template <typename FUNCTION>
-FUNCTION Next(FUNCTION &pReal, const char *szSymbol)
+template <auto WRAP>
+auto Next(const char *szSymbol)
 {
+    static decltype(WRAP) pReal = nullptr;
     if (pReal == nullptr) {
-        pReal = reinterpret_cast<FUNCTION>(dlsym(RTLD_NEXT, szSymbol));
+        pReal = reinterpret_cast<decltype(WRAP)>(dlsym(RTLD_NEXT, szSymbol));
     }
     return pReal;
 }
@@ -374,46 +368,29 @@ const DEVICE *DeviceFind(int fd)
     return nullptr;
 }
 
-int Answer(int error, void *pOut, const void *pAnswer, size_t cb)
-{
-    if (error != 0) {
-        errno = error;
-        return -1;
-    }
-    memcpy(pOut, pAnswer, cb);
-    return 0;
-}
-
-// The size of every node, and for arrays what their driver answers.
 int RequestAnswer(const DEVICE &device, unsigned long request, void *pOut)
 {
-    if (request == BLKGETSIZE64) {
-        return Answer(device.errnoSize, pOut, &device.cb, sizeof(device.cb));
-    }
-    if (device.fArray && request == GET_ARRAY_INFO) {
-        return Answer(device.errnoInfo, pOut, device.info, sizeof(device.info));
-    }
-    if (device.fArray && request == REQUEST_HEALTH) {
-        return Answer(device.errnoHealth, pOut, &device.health, sizeof(device.health));
-    }
-    if (device.fArray && request == REQUEST_SYNC) {
-        return Answer(device.errnoSync, pOut, &device.sync, sizeof(device.sync));
+    for (size_t i = 0; i < device.nAnswer; i++) {
+        const ANSWER &answer = device.answers[i];
+        if (answer.request == request && answer.error == 0) {
+            memcpy(pOut, answer.ab, answer.cb);
+            return 0;
+        }
+        if (answer.request == request) {
+            errno = answer.error;
+            return -1;
+        }
     }
     errno = ENOTTY;
     return -1;
 }
 
 // A request number is what the kernel takes for one: 32 bits without a sign.
-int RequestTake(int fd, unsigned long request, void *pOut, int (*pReal)(int, unsigned long, ...))
+int RequestTake(int fd, unsigned long request, void *pOut, int (*pReal)(int, unsigned long, void *))
 {
-    if (FaultIsDue("ioctl")) {
-        return -1;
-    }
     const DEVICE *const pDevice = DeviceFind(fd);
-    if (pDevice == nullptr) {
-        return pReal(fd, request, pOut);
-    }
-    return RequestAnswer(*pDevice, static_cast<std::uint32_t>(request), pOut);
+    return pDevice == nullptr ? pReal(fd, request, pOut)
+                              : RequestAnswer(*pDevice, static_cast<std::uint32_t>(request), pOut);
 }
 
 template <typename STAT>
@@ -477,106 +454,68 @@ void InterposeDeactivate()
 
 // The labels are the names that the C library's callers link to; under them the declarations of
 // the headers cannot clash with these.
-#define VISIBLE extern "C" __attribute__((visibility("default")))
+#define INTERPOSED(symbol, type, parameters)                                                       \
+    extern "C" __attribute__((visibility("default")))                                              \
+    type Wrap_##symbol parameters __asm__(#symbol);                                                \
+    extern "C" type Wrap_##symbol parameters
+#define NEXT(symbol) Next<Wrap_##symbol>(#symbol)
 
-// szObject is what the call is about, for the record.
-#define WRAP_CALL(szName, szObject, symbol, type, failure, parameters, arguments)                  \
-    VISIBLE type Wrap_##symbol parameters __asm__(#symbol);                                        \
-    VISIBLE type Wrap_##symbol parameters                                                          \
+// A call that fails or is done; szObject is what it is about, for the record.
+#define WRAP_DONE(szName, szObject, symbol, type, failure, parameters, done)                       \
+    INTERPOSED(symbol, type, parameters)                                                           \
     {                                                                                              \
-        static type(*pReal) parameters = nullptr;                                                  \
-        if (FaultIsDue(szName, szObject)) {                                                        \
-            return failure;                                                                        \
-        }                                                                                          \
-        return Next(pReal, #symbol) arguments;                                                     \
+        return FaultIsDue(szName, szObject) ? (failure) : done;                                    \
     }
+#define WRAP_CALL(szName, szObject, symbol, type, failure, parameters, arguments)                  \
+    WRAP_DONE(szName, szObject, symbol, type, failure, parameters, NEXT(symbol) arguments)
 #define WRAP_AS(szName, symbol, type, failure, parameters, arguments)                              \
     WRAP_CALL(szName, NO_OBJECT, symbol, type, failure, parameters, arguments)
 #define WRAP(symbol, type, failure, parameters, arguments)                                         \
     WRAP_AS(#symbol, symbol, type, failure, parameters, arguments)
 
 // The call works, and fails all the same: a descriptor is gone after a failed close, too.
-#define WRAP_LATE(szName, symbol, type, failure, parameters, arguments)                            \
-    VISIBLE type Wrap_##symbol parameters __asm__(#symbol);                                        \
-    VISIBLE type Wrap_##symbol parameters                                                          \
+#define WRAP_LATE(symbol, type, failure, parameters, arguments)                                    \
+    INTERPOSED(symbol, type, parameters)                                                           \
     {                                                                                              \
-        static type(*pReal) parameters = nullptr;                                                  \
-        const bool fFails = FaultIsDue(szName);                                                    \
+        const bool fFails = FaultIsDue(#symbol);                                                   \
         const int error = errno;                                                                   \
-        const type result = Next(pReal, #symbol) arguments;                                        \
-        if (!fFails) {                                                                             \
-            return result;                                                                         \
-        }                                                                                          \
-        errno = error;                                                                             \
-        return failure;                                                                            \
+        const type result = NEXT(symbol) arguments;                                                \
+        errno = fFails ? error : errno;                                                            \
+        return fFails ? (failure) : result;                                                        \
     }
 
-// ---- requests and device numbers ---------------------------------------------------------------
+// ---- requests, device numbers, sleeps ----------------------------------------------------------
 
 #define WRAP_IOCTL(symbol)                                                                         \
-    VISIBLE int Wrap_##symbol(int fd, unsigned long request, void *pOut) __asm__(#symbol);         \
-    VISIBLE int Wrap_##symbol(int fd, unsigned long request, void *pOut)                           \
-    {                                                                                              \
-        static int (*pReal)(int, unsigned long, ...) = nullptr;                                    \
-        return RequestTake(fd, request, pOut, Next(pReal, #symbol));                               \
-    }
-
+    WRAP_DONE("ioctl", NO_OBJECT, symbol, int, -1, (int fd, unsigned long request, void *pOut),    \
+              RequestTake(fd, request, pOut, NEXT(symbol)))
 #define WRAP_FSTAT(symbol, STAT)                                                                   \
-    VISIBLE int Wrap_##symbol(int fd, STAT *pStat) __asm__(#symbol);                               \
-    VISIBLE int Wrap_##symbol(int fd, STAT *pStat)                                                 \
+    WRAP_DONE("fstat", NO_OBJECT, symbol, int, -1, (int fd, STAT *pStat),                          \
+              NodeDress(fd, pStat, NEXT(symbol)(fd, pStat)))
+
+#define WRAP_SLEEP(symbol, type, parameters, arguments, seconds, nanoseconds)                      \
+    INTERPOSED(symbol, type, parameters)                                                           \
     {                                                                                              \
-        static int (*pReal)(int, STAT *) = nullptr;                                                \
-        return FaultIsDue("fstat") ? -1 : NodeDress(fd, pStat, Next(pReal, #symbol)(fd, pStat));   \
+        return SleepTell(static_cast<std::uint64_t>(seconds),                                      \
+                         static_cast<std::uint64_t>(nanoseconds))                                  \
+                   ? 0                                                                             \
+                   : NEXT(symbol) arguments;                                                       \
     }
-
-// ---- sleeps ------------------------------------------------------------------------------------
-
 #define WRAP_NANOSLEEP(symbol, TIMESPEC)                                                           \
-    VISIBLE int Wrap_##symbol(const TIMESPEC *pTime, TIMESPEC *pLeft) __asm__(#symbol);            \
-    VISIBLE int Wrap_##symbol(const TIMESPEC *pTime, TIMESPEC *pLeft)                              \
-    {                                                                                              \
-        static int (*pReal)(const TIMESPEC *, TIMESPEC *) = nullptr;                               \
-        return SleepTell(static_cast<std::uint64_t>(pTime->tv_sec),                                \
-                         static_cast<std::uint64_t>(pTime->tv_nsec))                               \
-                   ? 0                                                                             \
-                   : Next(pReal, #symbol)(pTime, pLeft);                                           \
-    }
-
+    WRAP_SLEEP(symbol, int, (const TIMESPEC *pTime, TIMESPEC *pLeft), (pTime, pLeft),              \
+               pTime->tv_sec, pTime->tv_nsec)
 #define WRAP_CLOCK_NANOSLEEP(symbol, TIMESPEC)                                                     \
-    VISIBLE int Wrap_##symbol(clockid_t clock, int flags, const TIMESPEC *pTime,                   \
-                              TIMESPEC *pLeft) __asm__(#symbol);                                   \
-    VISIBLE int Wrap_##symbol(clockid_t clock, int flags, const TIMESPEC *pTime, TIMESPEC *pLeft)  \
-    {                                                                                              \
-        static int (*pReal)(clockid_t, int, const TIMESPEC *, TIMESPEC *) = nullptr;               \
-        return SleepTell(static_cast<std::uint64_t>(pTime->tv_sec),                                \
-                         static_cast<std::uint64_t>(pTime->tv_nsec))                               \
-                   ? 0                                                                             \
-                   : Next(pReal, #symbol)(clock, flags, pTime, pLeft);                             \
-    }
-
-VISIBLE unsigned int Wrap_sleep(unsigned int seconds) __asm__("sleep");
-VISIBLE unsigned int Wrap_sleep(unsigned int seconds)
-{
-    static unsigned int (*pReal)(unsigned int) = nullptr;
-    return SleepTell(seconds, 0) ? 0 : Next(pReal, "sleep")(seconds);
-}
-
-VISIBLE int Wrap_usleep(unsigned int microseconds) __asm__("usleep");
-VISIBLE int Wrap_usleep(unsigned int microseconds)
-{
-    static int (*pReal)(unsigned int) = nullptr;
-    return SleepTell(microseconds / 1000000, microseconds % 1000000 * 1000ULL)
-               ? 0
-               : Next(pReal, "usleep")(microseconds);
-}
+    WRAP_SLEEP(symbol, int, (clockid_t clock, int flags, const TIMESPEC *pTime, TIMESPEC *pLeft),  \
+               (clock, flags, pTime, pLeft), pTime->tv_sec, pTime->tv_nsec)
+WRAP_SLEEP(sleep, unsigned int, (unsigned int seconds), (seconds), seconds, 0)
+WRAP_SLEEP(usleep, int, (unsigned int microseconds), (microseconds), microseconds / 1000000,
+           microseconds % 1000000 * 1000ULL)
 
 #define WRAP_TIME(symbol, TIME)                                                                    \
-    VISIBLE TIME Wrap_##symbol(TIME *pTime) __asm__(#symbol);                                      \
-    VISIBLE TIME Wrap_##symbol(TIME *pTime)                                                        \
+    INTERPOSED(symbol, TIME, (TIME * pTime))                                                       \
     {                                                                                              \
-        static TIME (*pReal)(TIME *) = nullptr;                                                    \
         if (!g_fActive) {                                                                          \
-            return Next(pReal, #symbol)(pTime);                                                    \
+            return NEXT(symbol)(pTime);                                                            \
         }                                                                                          \
         const auto now = static_cast<TIME>(g_when);                                                \
         if (pTime != nullptr) {                                                                    \
@@ -619,62 +558,42 @@ WRAP_CLOCK_NANOSLEEP(__clock_nanosleep_time64, TIMESPEC_64)
 // With a sanitizer the next malloc in line is the sanitizer's; otherwise the C library's own, which
 // is reached without dlsym because dlsym may allocate.
 #ifdef SANDBOX_SANITIZED
-WRAP(malloc, void *, nullptr, (size_t cb), (cb))
-WRAP(calloc, void *, nullptr, (size_t n, size_t cb), (n, cb))
-WRAP(realloc, void *, nullptr, (void *p, size_t cb), (p, cb))
+#define NEXT_ALLOCATION(symbol) NEXT(symbol)
 #else
 extern "C" void *__libc_malloc(size_t cb);
 extern "C" void *__libc_calloc(size_t n, size_t cb);
 extern "C" void *__libc_realloc(void *p, size_t cb);
-
+#define NEXT_ALLOCATION(symbol) __libc_##symbol
+#endif
 #define WRAP_ALLOCATION(symbol, parameters, arguments)                                             \
-    VISIBLE void *Wrap_##symbol parameters __asm__(#symbol);                                       \
-    VISIBLE void *Wrap_##symbol parameters                                                         \
-    {                                                                                              \
-        return FaultIsDue(#symbol) ? nullptr : __libc_##symbol arguments;                          \
-    }
+    WRAP_DONE(#symbol, NO_OBJECT, symbol, void *, nullptr, parameters,                             \
+              NEXT_ALLOCATION(symbol) arguments)
 WRAP_ALLOCATION(malloc, (size_t cb), (cb))
 WRAP_ALLOCATION(calloc, (size_t n, size_t cb), (n, cb))
 WRAP_ALLOCATION(realloc, (void *p, size_t cb), (p, cb))
-#endif
-
 WRAP(strdup, char *, nullptr, (const char *sz), (sz))
 WRAP(strndup, char *, nullptr, (const char *sz, size_t cb), (sz, cb))
 
 #define WRAP_OPEN_FILE(symbol, parameters, arguments)                                              \
-    VISIBLE int Wrap_##symbol parameters __asm__(#symbol);                                         \
-    VISIBLE int Wrap_##symbol parameters                                                           \
-    {                                                                                              \
-        static int(*pReal) parameters = nullptr;                                                   \
-        return FaultIsDue("open", sz) ? -1 : FileName(Next(pReal, #symbol) arguments, sz);         \
-    }
+    WRAP_DONE("open", sz, symbol, int, -1, parameters, FileName(NEXT(symbol) arguments, sz))
 WRAP_OPEN_FILE(open, (const char *sz, int flags, mode_t mode), (sz, flags, mode))
 WRAP_OPEN_FILE(open64, (const char *sz, int flags, mode_t mode), (sz, flags, mode))
 WRAP_OPEN_FILE(__open_2, (const char *sz, int flags), (sz, flags))
 WRAP_OPEN_FILE(__open64_2, (const char *sz, int flags), (sz, flags))
 
 #define WRAP_OPEN(szName, symbol)                                                                  \
-    VISIBLE FILE *Wrap_##symbol(const char *sz, const char *szMode) __asm__(#symbol);              \
-    VISIBLE FILE *Wrap_##symbol(const char *sz, const char *szMode)                                \
-    {                                                                                              \
-        static FILE *(*pReal)(const char *, const char *) = nullptr;                               \
-        return FaultIsDue(szName, sz) ? nullptr                                                    \
-                                      : StreamName(Next(pReal, #symbol)(sz, szMode), sz);          \
-    }
+    WRAP_DONE(szName, sz, symbol, FILE *, nullptr, (const char *sz, const char *szMode),           \
+              StreamName(NEXT(symbol)(sz, szMode), sz))
 WRAP_OPEN("fopen", fopen)
 WRAP_OPEN("fopen", fopen64)
 WRAP_OPEN("setmntent", setmntent)
 
-VISIBLE FILE *Wrap_fdopen(int fd, const char *szMode) __asm__("fdopen");
-VISIBLE FILE *Wrap_fdopen(int fd, const char *szMode)
-{
-    static FILE *(*pReal)(int, const char *) = nullptr;
-    return FaultIsDue("fdopen") ? nullptr : StreamName(Next(pReal, "fdopen")(fd, szMode), "pipe");
-}
+WRAP_DONE("fdopen", NO_OBJECT, fdopen, FILE *, nullptr, (int fd, const char *szMode),
+          StreamName(NEXT(fdopen)(fd, szMode), "pipe"))
 
-WRAP_LATE("close", close, int, -1, (int fd), (fd))
-WRAP_LATE("fclose", fclose, int, EOF, (FILE * p), (p))
-WRAP_LATE("endmntent", endmntent, int, 0, (FILE * p), (p))
+WRAP_LATE(close, int, -1, (int fd), (fd))
+WRAP_LATE(fclose, int, EOF, (FILE * p), (p))
+WRAP_LATE(endmntent, int, 0, (FILE * p), (p))
 WRAP(fflush, int, EOF, (FILE * p), (p))
 WRAP_CALL("fgets", NameOf(p), fgets, char *, nullptr, (char *sz, int cb, FILE *p), (sz, cb, p))
 WRAP_CALL("fgets", NameOf(p), __fgets_chk, char *, nullptr,
@@ -690,15 +609,13 @@ WRAP_CALL("read", NameOf(fd), __read_chk, ssize_t, -1,
 WRAP(write, ssize_t, -1, (int fd, const void *p, size_t cb), (fd, p, cb))
 WRAP(pipe2, int, -1, (int *pfd, int flags), (pfd, flags))
 
-VISIBLE pid_t Wrap_fork() __asm__("fork");
-VISIBLE pid_t Wrap_fork()
+INTERPOSED(fork, pid_t, ())
 {
-    static pid_t (*pReal)() = nullptr;
     if (FaultIsDue("fork")) {
         return -1;
     }
     g_nFork++;
-    const pid_t pid = Next(pReal, "fork")();
+    const pid_t pid = NEXT(fork)();
     if (pid == 0 && g_fActive) {
         ProcessNameExtend();
     }
@@ -706,16 +623,14 @@ VISIBLE pid_t Wrap_fork()
 }
 
 // A child that cannot be waited for because it is not there was reaped by somebody else.
-VISIBLE pid_t Wrap_waitpid(pid_t pid, int *pStatus, int options) __asm__("waitpid");
-VISIBLE pid_t Wrap_waitpid(pid_t pid, int *pStatus, int options)
+INTERPOSED(waitpid, pid_t, (pid_t pid, int *pStatus, int options))
 {
-    static pid_t (*pReal)(pid_t, int *, int) = nullptr;
     if (!FaultIsDue("waitpid")) {
-        return Next(pReal, "waitpid")(pid, pStatus, options);
+        return NEXT(waitpid)(pid, pStatus, options);
     }
     const int error = errno;
     if (error == ECHILD) {
-        (void)Next(pReal, "waitpid")(pid, nullptr, 0);
+        (void)NEXT(waitpid)(pid, nullptr, 0);
     }
     errno = error;
     return -1;
@@ -753,8 +668,7 @@ WRAP_AS("puts", putc, int, EOF, (int ch, FILE *p), (ch, p))
 WRAP_AS("puts", fputs, int, EOF, (const char *sz, FILE *p), (sz, p))
 
 #define WRAP_PRINT(szName, symbol, parameters, pStream)                                            \
-    VISIBLE int Wrap_##symbol parameters __asm__(#symbol);                                         \
-    VISIBLE int Wrap_##symbol parameters                                                           \
+    INTERPOSED(symbol, int, parameters)                                                            \
     {                                                                                              \
         if (FaultIsDue(szName)) {                                                                  \
             return -1;                                                                             \
@@ -799,8 +713,7 @@ WRAP_CALL("glob", sz, __glob64_time64, int, errno == ENOMEM ? GLOB_NOSPACE : GLO
 #endif
 
 // Children of the program end by _exit, which drops what a program that counts has counted.
-VISIBLE void Wrap__exit(int status) __asm__("_exit");
-VISIBLE void Wrap__exit(int status)
+INTERPOSED(_exit, void, (int status))
 {
     if (g_fActive && __gcov_dump != nullptr) {
         g_fActive = false;

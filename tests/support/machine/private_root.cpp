@@ -11,6 +11,7 @@
 #include <fcntl.h>
 #include <linux/mount.h>
 #include <sched.h>
+#include <sstream>
 #include <sys/mount.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
@@ -395,7 +396,7 @@ void FieldAdd(std::string &szRecord, std::string_view szText)
 template <typename NUMBER>
 void NumberAdd(std::string &szRecord, NUMBER number)
 {
-    FieldAdd(szRecord, std::to_string(number) + " ");
+    FieldAdd(szRecord, std::to_string(number));
 }
 
 std::string RowRecord(const TOOL_ROW &row)
@@ -428,105 +429,35 @@ std::string RowRecord(const TOOL_ROW &row)
     return szRecord;
 }
 
-std::string ArrayRecord(const MACHINE_MD &md)
+// In the order of the driver's record; what the program has no use for is 0.
+void ArrayTell(std::ostream &driver, const MACHINE_MD &md)
 {
-    std::string szRecord;
-    FieldAdd(szRecord, "device ");
-    FieldAdd(szRecord, "/dev/md" + std::to_string(md.nMd) + " ");
-    NumberAdd(szRecord, 1);
-    NumberAdd(szRecord, md.deviceMajor);
-    NumberAdd(szRecord, md.deviceMinor.value_or(static_cast<unsigned int>(md.nMd)));
-    NumberAdd(szRecord, md.errnoInfo);
-    // In the order of the driver's record; what the program has no use for is 0.
-    const int words[18] = {md.majorVersion,
-                           md.minorVersion,
-                           0,
-                           0,
-                           md.level,
-                           md.size,
-                           0,
-                           md.nRaidDisks,
-                           md.nMd,
-                           0,
-                           0,
-                           1,
-                           md.nActiveDisks,
-                           0,
-                           0,
-                           md.nSpareDisks,
-                           0,
-                           0};
-    for (const int word : words) {
-        NumberAdd(szRecord, word);
-    }
-    NumberAdd(szRecord, md.errnoSize);
-    NumberAdd(szRecord, md.arraySize);
-    NumberAdd(szRecord, md.errnoHealth);
-    NumberAdd(szRecord, md.health);
-    NumberAdd(szRecord, md.errnoSync);
-    NumberAdd(szRecord, md.activity);
-    NumberAdd(szRecord, md.done);
-    NumberAdd(szRecord, md.total);
-    return szRecord;
-}
-
-std::string NodeRecord(const MACHINE_DEVICE_SIZE &node)
-{
-    constexpr int DISK_MAJOR = 8;
-    constexpr int ARRAY_INFO_FIELDS = 19;
-    std::string szRecord;
-    FieldAdd(szRecord, "device ");
-    FieldAdd(szRecord, node.szPath + " ");
-    NumberAdd(szRecord, 0);
-    NumberAdd(szRecord, DISK_MAJOR);
-    NumberAdd(szRecord, 0);
-    for (int i = 0; i < ARRAY_INFO_FIELDS; i++) {
-        NumberAdd(szRecord, 0);
-    }
-    NumberAdd(szRecord, node.errnoSize);
-    NumberAdd(szRecord, node.cb);
-    return szRecord;
-}
-
-std::string FaultRecord(const MACHINE_FAULT &fault)
-{
-    std::string szRecord;
-    FieldAdd(szRecord, "fault ");
-    FieldAdd(szRecord, fault.szFunction + " ");
-    NumberAdd(szRecord, fault.nCall);
-    NumberAdd(szRecord, fault.error);
-    NumberAdd(szRecord, fault.fGoOn ? 1 : 0);
-    FieldAdd(szRecord, fault.szProcess + " ");
-    return szRecord;
+    driver << "device /dev/md" << md.nMd << ' ' << md.deviceMajor << ' '
+           << md.deviceMinor.value_or(static_cast<unsigned int>(md.nMd)) << "\narray "
+           << md.errnoInfo << ' ' << md.majorVersion << ' ' << md.minorVersion << " 0 0 "
+           << md.level << ' ' << md.size << " 0 " << md.nRaidDisks << ' ' << md.nMd << " 0 0 1 "
+           << md.nActiveDisks << " 0 0 " << md.nSpareDisks << " 0 0\nsize " << md.errnoSize << ' '
+           << md.arraySize << "\nhealth " << md.errnoHealth << ' ' << md.health << "\nsync "
+           << md.errnoSync << ' ' << md.activity << ' ' << md.done << ' ' << md.total << '\n';
 }
 
 std::string DriverText(const MACHINE &machine)
 {
-    std::string szText;
+    std::ostringstream driver;
     for (const MACHINE_MD &md : machine.arrays) {
-        FieldAdd(szText, ArrayRecord(md));
+        ArrayTell(driver, md);
     }
     for (const MACHINE_DEVICE_SIZE &node : machine.deviceSizes) {
-        FieldAdd(szText, NodeRecord(node));
+        driver << "device " << node.szPath << " 8 0\nsize " << node.errnoSize << ' ' << node.cb
+               << '\n';
     }
     for (const MACHINE_FAULT &fault : machine.faults) {
-        FieldAdd(szText, FaultRecord(fault));
+        driver << "fault " << fault.szFunction << ' ' << fault.nCall << ' ' << fault.error << ' '
+               << fault.fGoOn << ' ' << fault.szProcess << '\n';
     }
-    std::string szTime;
-    FieldAdd(szTime, "time ");
-    NumberAdd(szTime, machine.when);
-    FieldAdd(szText, szTime);
-    if (machine.fCallsTold) {
-        std::string szRecord;
-        FieldAdd(szRecord, "calls ");
-        FieldAdd(szText, szRecord);
-    }
-    if (machine.fRealSleep) {
-        std::string szRecord;
-        FieldAdd(szRecord, "realsleep ");
-        FieldAdd(szText, szRecord);
-    }
-    return szText;
+    driver << "time " << machine.when << '\n'
+           << (machine.fCallsTold ? "calls\n" : "") << (machine.fRealSleep ? "realsleep\n" : "");
+    return driver.str();
 }
 
 } // namespace

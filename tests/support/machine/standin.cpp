@@ -23,77 +23,34 @@ namespace
 
 constexpr int STATUS_UNEXPECTED = 125;
 constexpr int HIGHEST_DESCRIPTOR = 256;
-constexpr size_t RECORD_SIZE = 65536;
 
-struct FIELD {
-    const char *pch;
-    size_t cb;
-};
-
-struct READER {
-    const char *pch;
-    const char *pEnd;
-};
-
-bool FieldRead(READER &reader, FIELD &field)
-{
-    if (reader.pch >= reader.pEnd) {
-        return false;
-    }
-    char *pEnd = nullptr;
-    field.cb = strtoul(reader.pch, &pEnd, 10);
-    field.pch = pEnd + 1;
-    reader.pch = field.pch + field.cb;
-    return true;
-}
-
-FIELD FieldNext(READER &reader)
-{
-    FIELD field = {"", 0};
-    (void)FieldRead(reader, field);
-    return field;
-}
-
-// A number's field ends with a blank, so that it stops before the length of the next field.
-long NumberNext(READER &reader)
-{
-    const FIELD field = FieldNext(reader);
-    return field.cb == 0 ? 0 : strtol(field.pch, nullptr, 10);
-}
-
-bool FieldIs(const FIELD &field, const char *sz)
-{
-    return field.cb == strlen(sz) && memcmp(field.pch, sz, field.cb) == 0;
-}
-
-READER FileRead(const char *szPath)
+std::string_view FileRead(const char *szPath)
 {
     const int fd = open(szPath, O_RDONLY | O_CLOEXEC);
     struct stat info = {};
     if (fd < 0 || fstat(fd, &info) != 0 || info.st_size == 0) {
-        return {"", ""};
+        return {};
     }
     const size_t cb = static_cast<size_t>(info.st_size);
-    // Read rather than mapped: numbers are converted up to the byte behind the last one.
-    char *const pch = static_cast<char *>(calloc(1, cb + 1));
+    char *const pch = static_cast<char *>(malloc(cb));
     const ssize_t cbRead = pch == nullptr ? -1 : read(fd, pch, cb);
     close(fd);
-    return cbRead < 0 ? READER{"", ""} : READER{pch, pch + cbRead};
+    return {pch, cbRead < 0 ? 0 : static_cast<size_t>(cbRead)};
 }
 
-bool PatternMatches(READER &row, int nArgument, char *const argv[])
+bool PatternMatches(std::string_view &row, int nArgument, char *const argv[])
 {
-    const long nPattern = NumberNext(row);
+    const long nPattern = WireNumber(row);
     bool fMatches = true;
     bool fRest = false;
     for (long i = 0; i < nPattern; i++) {
-        const FIELD pattern = FieldNext(row);
-        fRest = fRest || FieldIs(pattern, WIRE_ANY_REST);
-        if (fRest || FieldIs(pattern, WIRE_ANY_ARGUMENT)) {
+        const std::string_view pattern = WireField(row);
+        fRest = fRest || pattern == WIRE_ANY_REST;
+        if (fRest || pattern == WIRE_ANY_ARGUMENT) {
             fMatches = fMatches && (fRest || i < nArgument);
             continue;
         }
-        fMatches = fMatches && i < nArgument && FieldIs(pattern, argv[i]);
+        fMatches = fMatches && i < nArgument && pattern == argv[i];
     }
     return fMatches && (fRest || nPattern == nArgument);
 }
@@ -111,13 +68,13 @@ bool UseTake(unsigned int *pUsed, long nTimes)
     return true;
 }
 
-void PathCopy(const FIELD &field, char *szPath, size_t cbPath)
+void PathCopy(std::string_view field, char *szPath, size_t cbPath)
 {
-    snprintf(szPath, cbPath, "%.*s", static_cast<int>(field.cb), field.pch);
+    snprintf(szPath, cbPath, "%.*s", static_cast<int>(field.size()), field.data());
 }
 
 // No path at all is always there.
-bool IsThere(const FIELD &path)
+bool IsThere(std::string_view path)
 {
     char szPath[512] = "";
     PathCopy(path, szPath, sizeof(szPath));
@@ -125,7 +82,7 @@ bool IsThere(const FIELD &path)
 }
 
 // Finds the row of this call; `row` then stands at the answer.
-bool RowFind(int nArgument, char *const argv[], READER &row)
+bool RowFind(int nArgument, char *const argv[], std::string_view &row)
 {
     const int fd = open(WIRE_USED, O_RDWR | O_CLOEXEC);
     struct stat info = {};
@@ -139,12 +96,10 @@ bool RowFind(int nArgument, char *const argv[], READER &row)
         return false;
     }
     unsigned int *pUsed = static_cast<unsigned int *>(p);
-    READER rows = FileRead(WIRE_ROWS);
-    FIELD field = {};
-    for (; FieldRead(rows, field); pUsed++) {
-        row = {field.pch, field.pch + field.cb};
-        const long nTimes = NumberNext(row);
-        const bool fNow = IsThere(FieldNext(row));
+    std::string_view rows = FileRead(WIRE_ROWS);
+    for (; WireTake(rows, row); pUsed++) {
+        const long nTimes = WireNumber(row);
+        const bool fNow = IsThere(WireField(row));
         if (PatternMatches(row, nArgument, argv) && fNow && UseTake(pUsed, nTimes)) {
             return true;
         }
@@ -152,26 +107,11 @@ bool RowFind(int nArgument, char *const argv[], READER &row)
     return false;
 }
 
-struct RECORD {
-    size_t cb;
-    char ach[RECORD_SIZE];
-};
-
-void RecordAdd(RECORD &record, const char *sz)
-{
-    const int cb =
-        snprintf(record.ach + record.cb, sizeof(record.ach) - record.cb, "%zu:%s", strlen(sz), sz);
-    record.cb += static_cast<size_t>(cb);
-    if (record.cb >= sizeof(record.ach)) {
-        record.cb = sizeof(record.ach) - 1; // does not parse any more, which fails the test
-    }
-}
-
-void RecordAddNumber(RECORD &record, long number)
+void WireAddNumber(WIRE_RECORD &record, long number)
 {
     char szNumber[32] = "";
     snprintf(szNumber, sizeof(szNumber), "%ld", number);
-    RecordAdd(record, szNumber);
+    WireAdd(record, szNumber);
 }
 
 bool IsNull(int fd)
@@ -191,32 +131,27 @@ long DescriptorsCount()
 
 void CallRecord(bool fExpected, long nDescriptors, int nArgument, char *const argv[])
 {
-    static RECORD record;
-    RecordAdd(record, fExpected ? WIRE_COMMAND : WIRE_UNEXPECTED);
-    RecordAdd(record, reinterpret_cast<const char *>(getauxval(AT_EXECFN)));
+    static WIRE_RECORD record;
+    WireAdd(record, fExpected ? WIRE_COMMAND : WIRE_UNEXPECTED);
+    WireAdd(record, reinterpret_cast<const char *>(getauxval(AT_EXECFN)));
     for (int fd = STDIN_FILENO; fd <= STDERR_FILENO; fd++) {
-        RecordAddNumber(record, IsNull(fd));
+        WireAddNumber(record, IsNull(fd));
     }
-    RecordAddNumber(record, nDescriptors);
-    RecordAddNumber(record, nArgument);
+    WireAddNumber(record, nDescriptors);
+    WireAddNumber(record, nArgument);
     for (int i = 0; i < nArgument; i++) {
-        RecordAdd(record, argv[i]);
+        WireAdd(record, argv[i]);
     }
     for (char **psz = environ; *psz != nullptr; psz++) {
-        RecordAdd(record, *psz);
+        WireAdd(record, *psz);
     }
-    WireSend(record.ach, record.cb);
+    WireSend(record);
 }
 
-void BytesWrite(int fd, const char *pch, size_t cb)
+void BytesWrite(int fd, std::string_view bytes)
 {
-    while (cb > 0) {
-        const ssize_t cbWritten = write(fd, pch, cb);
-        if (cbWritten <= 0) {
-            return;
-        }
-        pch += cbWritten;
-        cb -= static_cast<size_t>(cbWritten);
+    for (ssize_t cb = 0; !bytes.empty() && (cb = write(fd, bytes.data(), bytes.size())) > 0;) {
+        bytes.remove_prefix(static_cast<size_t>(cb));
     }
 }
 
@@ -225,10 +160,10 @@ void Flood(size_t cb)
     static char achBlock[4096];
     memset(achBlock, 'x', sizeof(achBlock));
     while (cb > 0) {
-        const size_t cbNow = cb < sizeof(achBlock) ? cb : sizeof(achBlock);
-        BytesWrite(STDOUT_FILENO, achBlock, cbNow);
-        BytesWrite(STDERR_FILENO, achBlock, cbNow);
-        cb -= cbNow;
+        const std::string_view block(achBlock, cb < sizeof(achBlock) ? cb : sizeof(achBlock));
+        BytesWrite(STDOUT_FILENO, block);
+        BytesWrite(STDERR_FILENO, block);
+        cb -= block.size();
     }
 }
 
@@ -241,30 +176,30 @@ void FoldersMake(char *szPath)
     }
 }
 
-void FilesWrite(READER &row)
+void FilesWrite(std::string_view &row)
 {
-    for (long n = NumberNext(row); n > 0; n--) {
+    for (long n = WireNumber(row); n > 0; n--) {
         char szPath[512] = "";
-        PathCopy(FieldNext(row), szPath, sizeof(szPath));
-        const FIELD text = FieldNext(row);
+        PathCopy(WireField(row), szPath, sizeof(szPath));
+        const std::string_view text = WireField(row);
         FoldersMake(szPath);
         // A file is there as a whole or not at all, whenever this process is killed.
         char szNew[64] = "";
         snprintf(szNew, sizeof(szNew), WIRE_FOLDER "/new.%d", getpid());
         const int fd = open(szNew, O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, 0644);
         if (fd >= 0) {
-            BytesWrite(fd, text.pch, text.cb);
+            BytesWrite(fd, text);
             close(fd);
             (void)rename(szNew, szPath);
         }
     }
 }
 
-void FilesRemove(READER &row)
+void FilesRemove(std::string_view &row)
 {
-    for (long n = NumberNext(row); n > 0; n--) {
+    for (long n = WireNumber(row); n > 0; n--) {
         char szPath[512] = "";
-        PathCopy(FieldNext(row), szPath, sizeof(szPath));
+        PathCopy(WireField(row), szPath, sizeof(szPath));
         (void)remove(szPath);
     }
 }
@@ -282,24 +217,24 @@ void Meet(long nMeet)
 {
     constexpr useconds_t LOOK_AGAIN = 1000;
     const int fd = open(WIRE_MEETING, O_WRONLY | O_APPEND | O_CLOEXEC);
-    BytesWrite(fd, "+", 1);
+    BytesWrite(fd, "+");
     for (struct stat info = {}; fstat(fd, &info) == 0 && info.st_size < nMeet;) {
         (void)usleep(LOOK_AGAIN);
     }
     close(fd);
 }
 
-[[noreturn]] void Answer(READER row)
+[[noreturn]] void Answer(std::string_view row)
 {
-    const FIELD out = FieldNext(row);
-    const FIELD err = FieldNext(row);
-    const long status = NumberNext(row);
-    const long signal = NumberNext(row);
-    const long signalCaller = NumberNext(row);
-    const long msDelay = NumberNext(row);
-    const long nMeet = NumberNext(row);
-    const long cbFlood = NumberNext(row);
-    GrandchildLeave(NumberNext(row));
+    const std::string_view out = WireField(row);
+    const std::string_view err = WireField(row);
+    const long status = WireNumber(row);
+    const long signal = WireNumber(row);
+    const long signalCaller = WireNumber(row);
+    const long msDelay = WireNumber(row);
+    const long nMeet = WireNumber(row);
+    const long cbFlood = WireNumber(row);
+    GrandchildLeave(WireNumber(row));
     if (nMeet > 0) {
         Meet(nMeet);
     }
@@ -309,8 +244,8 @@ void Meet(long nMeet)
     FilesWrite(row);
     FilesRemove(row);
     Flood(static_cast<size_t>(cbFlood));
-    BytesWrite(STDOUT_FILENO, out.pch, out.cb);
-    BytesWrite(STDERR_FILENO, err.pch, err.cb);
+    BytesWrite(STDOUT_FILENO, out);
+    BytesWrite(STDERR_FILENO, err);
     if (signalCaller != 0) {
         (void)kill(getppid(), static_cast<int>(signalCaller));
     }
@@ -325,7 +260,7 @@ void Meet(long nMeet)
 int main(int argc, char *argv[])
 {
     const long nDescriptors = DescriptorsCount();
-    READER row = {};
+    std::string_view row = {};
     const bool fExpected = RowFind(argc, argv, row);
     CallRecord(fExpected, nDescriptors, argc, argv);
     if (!fExpected) {

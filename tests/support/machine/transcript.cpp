@@ -55,59 +55,35 @@ std::string LogLineText(const LOG_LINE &line)
     return "<" + std::to_string(line.priority) + ">" + line.szText + "\n";
 }
 
-// False at the end, and when what is there is no field.
-bool FieldTake(std::string_view &szRecord, std::string &szField)
-{
-    const size_t iColon = szRecord.find(':');
-    if (iColon == std::string_view::npos) {
-        return false;
-    }
-    const size_t cb = strtoul(std::string(szRecord.substr(0, iColon)).c_str(), nullptr, 10);
-    if (szRecord.size() - iColon - 1 < cb) {
-        return false;
-    }
-    szField = szRecord.substr(iColon + 1, cb);
-    szRecord.remove_prefix(iColon + 1 + cb);
-    return true;
-}
-
-int NumberTake(std::string_view &szRecord)
-{
-    std::string szField;
-    return FieldTake(szRecord, szField) ? atoi(szField.c_str()) : -1;
-}
-
 void CommandParse(std::string_view &szRecord, RUN_EVENT &event)
 {
-    (void)FieldTake(szRecord, event.szExecuted);
-    event.fNullInput = NumberTake(szRecord) == 1;
-    event.fNullOutput = NumberTake(szRecord) == 1;
-    event.fNullError = NumberTake(szRecord) == 1;
-    event.nDescriptors = NumberTake(szRecord);
-    std::string szField;
-    for (int n = NumberTake(szRecord); n > 0 && FieldTake(szRecord, szField); n--) {
-        event.argv.push_back(szField);
+    event.szExecuted = WireField(szRecord);
+    event.fNullInput = WireNumber(szRecord) == 1;
+    event.fNullOutput = WireNumber(szRecord) == 1;
+    event.fNullError = WireNumber(szRecord) == 1;
+    event.nDescriptors = static_cast<int>(WireNumber(szRecord));
+    std::string_view szField;
+    for (long n = WireNumber(szRecord); n > 0 && WireTake(szRecord, szField); n--) {
+        event.argv.emplace_back(szField);
     }
-    while (FieldTake(szRecord, szField)) {
-        event.environment.push_back(szField);
+    while (WireTake(szRecord, szField)) {
+        event.environment.emplace_back(szField);
     }
 }
 
 void EventParse(std::string_view &szRecord, RUN_EVENT &event)
 {
-    std::string szKind;
-    (void)FieldTake(szRecord, szKind);
+    const std::string_view szKind = WireField(szRecord);
     if (szKind == WIRE_COMMAND || szKind == WIRE_UNEXPECTED) {
         event.fExpected = szKind == WIRE_COMMAND;
         CommandParse(szRecord, event);
         return;
     }
     event.kind = szKind == WIRE_SLEEP ? EVENT_KIND::SLEEP : EVENT_KIND::FAULT;
-    event.argv.push_back(szKind);
-    std::string szField;
-    while (FieldTake(szRecord, szField)) {
+    event.argv.emplace_back(szKind);
+    for (std::string_view szField; WireTake(szRecord, szField);) {
         if (!szField.empty()) {
-            event.argv.push_back(szField);
+            event.argv.emplace_back(szField);
         }
     }
 }

@@ -2,11 +2,18 @@
 #pragma once
 
 // What the harness, the stand-in tools and the interposing library send one another, and where.
-// They may be built for different processors, so everything but the stand-ins' own counts is text:
-// a field is "LENGTH:BYTES", a record is a field that holds the fields of the record.
+// They may be built for different processors, so everything but the stand-ins' own counts is text.
+// Rows and records are fields "LENGTH:BYTES", as they may hold any byte; a row is itself a field.
+// The driver file is lines of words.
+//
+// Nothing here uses a function that can be made to fail, or wants more than the C library to run.
 
+#include <charconv>
 #include <cstddef>
+#include <cstdio>
+#include <cstring>
 #include <fcntl.h>
+#include <string_view>
 #include <sys/socket.h>
 #include <sys/syscall.h>
 #include <sys/un.h>
@@ -39,13 +46,56 @@
 #define WIRE_SLEEP "sleep"
 #define WIRE_FAULT "fault"
 
-// Sends the fields of one record. Uses no function that can be made to fail.
-inline void WireSend(const char *pch, size_t cb)
+// Takes the next field off a record. False at its end, and when what is there is no field.
+inline bool WireTake(std::string_view &record, std::string_view &field)
+{
+    size_t cb = 0;
+    const char *const pRecordEnd = record.data() + record.size();
+    const auto [pEnd, error] = std::from_chars(record.data(), pRecordEnd, cb);
+    if (error != std::errc() || pEnd == pRecordEnd || *pEnd != ':' ||
+        static_cast<size_t>(pRecordEnd - pEnd) <= cb) {
+        return false;
+    }
+    field = {pEnd + 1, cb};
+    record.remove_prefix(static_cast<size_t>(field.data() + cb - record.data()));
+    return true;
+}
+
+inline std::string_view WireField(std::string_view &record)
+{
+    std::string_view field;
+    (void)WireTake(record, field);
+    return field;
+}
+
+inline long WireNumber(std::string_view &record)
+{
+    const std::string_view field = WireField(record);
+    long number = 0;
+    (void)std::from_chars(field.data(), field.data() + field.size(), number);
+    return number;
+}
+
+// A record of what happened. One that is too long does not parse any more, which fails the test.
+struct WIRE_RECORD {
+    size_t cb;
+    char ach[65536];
+};
+
+inline void WireAdd(WIRE_RECORD &record, const char *sz)
+{
+    const size_t cbRoom = sizeof(record.ach) - record.cb;
+    record.cb +=
+        static_cast<size_t>(snprintf(record.ach + record.cb, cbRoom, "%zu:%s", strlen(sz), sz));
+    record.cb = record.cb < sizeof(record.ach) ? record.cb : sizeof(record.ach) - 1;
+}
+
+inline void WireSend(const WIRE_RECORD &record)
 {
     const struct sockaddr_un addresses[] = {{AF_UNIX, WIRE_LOG}, {AF_UNIX, WIRE_LOG_AWAY}};
     const long fd = syscall(SYS_socket, AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0);
     for (const struct sockaddr_un &address : addresses) {
-        if (syscall(SYS_sendto, fd, pch, cb, 0, &address, sizeof(address)) >= 0) {
+        if (syscall(SYS_sendto, fd, record.ach, record.cb, 0, &address, sizeof(address)) >= 0) {
             break;
         }
     }
