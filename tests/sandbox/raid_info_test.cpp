@@ -2,7 +2,7 @@
 #include "nurostoragecore/raid_info.h"
 
 #include "last_error.h"
-#include "sandbox.h"
+#include "steps.h"
 #include "streams.h"
 
 #include <gtest/gtest.h>
@@ -47,6 +47,11 @@ MACHINE ArrayMake(const MACHINE_MD &md)
     return machine;
 }
 
+std::string Told(const std::string &szWhat, const std::string &szError)
+{
+    return "<15>raid_info.cpp:# Failed to " + szWhat + ", errno=" + szError + "\n";
+}
+
 // The query fails with this code and these lines, hands nothing out and leaves nothing open.
 void ExpectQueryFails(const MACHINE &machine, const char *szPath, u32 code,
                       const std::string &szLog)
@@ -56,35 +61,47 @@ void ExpectQueryFails(const MACHINE &machine, const char *szPath, u32 code,
         RAID_INFO *pInfo = &before;
         openlog(nullptr, LOG_NDELAY, LOG_USER); // the log's own descriptor is none of the query's
         const int nOpen = DescriptorsCount();
-        RecordReset();
-        EXPECT_EQ(RAIDInfoGet(szPath, &pInfo), -1);
+        EXPECT_FAILS(RAIDInfoGet(szPath, &pInfo), -1, code);
         EXPECT_EQ(DescriptorsCount(), nOpen);
         EXPECT_EQ(pInfo, &before);
-        EXPECT_EQ(NLIBCErrGet(), code);
     });
     EXPECT_EQ(LogText(result), szLog);
 }
 
-void ExpectQueryFails(const MACHINE_MD &md, u32 code, const std::string &szLog)
+// For the command, an array that cannot be queried is one that is not there.
+void ExpectNotFound(const MACHINE &machine, u32 code, const std::string &szLog)
 {
-    ExpectQueryFails(ArrayMake(md), ("/dev/md" + std::to_string(md.nMd)).c_str(), code, szLog);
+    SCOPED_TRACE(szLog);
+    ExpectQueryFails(machine, "/dev/md2", code, szLog);
+    const RUN_RESULT result = RunEnds(machine, {"status", "2"}, 1, "RAID /dev/md2 is not found\n");
+    EXPECT_EQ(LogText(result), szLog);
 }
 
-// Queries /dev/mdN of the machine and lets the body look at the record.
-void WithInfo(const MACHINE_MD &md, const std::function<void(const RAID_INFO &)> &body)
+// An array md2 with these answers.
+void ExpectNotFound(MACHINE_MD md, u32 code, const std::string &szLog)
 {
-    const std::string szPath = "/dev/md" + std::to_string(md.nMd);
-    MachineCall(ArrayMake(md), [&] {
-        RecordReset();
+    md.nMd = 2;
+    ExpectNotFound(ArrayMake(md), code, szLog);
+}
+
+// Queries the path and lets the body look at the record.
+RUN_RESULT WithInfo(const MACHINE &machine, const std::string &szPath,
+                    const std::function<void(const RAID_INFO &)> &body)
+{
+    return MachineCall(machine, [&] {
         RAID_INFO *pInfo = nullptr;
+        openlog(nullptr, LOG_NDELAY, LOG_USER);
         const int nOpen = DescriptorsCount();
-        ASSERT_EQ(RAIDInfoGet(szPath.c_str(), &pInfo), 1);
-        ASSERT_NE(pInfo, nullptr);
+        EXPECT_QUIET(RAIDInfoGet(szPath.c_str(), &pInfo), 1);
         EXPECT_EQ(DescriptorsCount(), nOpen);
-        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
+        ASSERT_NE(pInfo, nullptr);
         body(*pInfo);
         RAIDInfoFree(pInfo);
     });
+}
+RUN_RESULT WithInfo(const MACHINE_MD &md, const std::function<void(const RAID_INFO &)> &body)
+{
+    return WithInfo(ArrayMake(md), "/dev/md" + std::to_string(md.nMd), body);
 }
 
 // One request on the array's node, by itself.
@@ -160,77 +177,56 @@ TEST(RaidInfo, EveryLevelIsOneBit)
 
 TEST(RaidInfo, AnUnsupportedLevelIsOnlyLogged)
 {
-    const RUN_RESULT result = MachineCall(ArrayMake({.nMd = 2, .level = 4}), [] {
-        RAID_INFO *pInfo = nullptr;
-        ASSERT_EQ(RAIDInfoGet("/dev/md2", &pInfo), 1);
-        EXPECT_EQ(pInfo->level, 0U);
-        EXPECT_EQ(pInfo->deviceSize, GIB);
-        RAIDInfoFree(pInfo);
+    const RUN_RESULT result = WithInfo({.nMd = 2, .level = 4}, [](const RAID_INFO &info) {
+        EXPECT_EQ(info.level, 0U);
+        EXPECT_EQ(info.deviceSize, GIB);
     });
     EXPECT_EQ(LogText(result), "<15>raid_info.cpp:# Not supported RAID level: 4\n");
 }
 
-TEST(RaidInfo, ThePathMayGoOnBehindTheNumber)
-{
-    MACHINE machine = ArrayMake({.nMd = 2});
-    MachineLink(machine, "/dev/md2p1", "md2");
-    MachineCall(machine, [] {
-        RAID_INFO *pInfo = nullptr;
-        ASSERT_EQ(RAIDInfoGet("/dev/md2p1", &pInfo), 1);
-        EXPECT_EQ(pInfo->nMd, 2);
-        EXPECT_STREQ(pInfo->szPath, "/dev/md2p1");
-        RAIDInfoFree(pInfo);
-    });
-}
+struct PATH_CASE {
+    const char *szName;
+    std::string szPath; // leads to md2
+    std::string szRecorded;
+};
 
-TEST(RaidInfo, ALongPathIsCutInTheRecord)
+TEST(RaidInfo, ThePathIsTakenAsItIsAndRecordedUpTo127Characters)
 {
     // Through folders that lead back, so that it is the whole path that is opened.
     std::string szLong = "/dev/md2";
     while (szLong.size() < 150) {
-        szLong += "x/..";
-        szLong += "/md2";
+        szLong += "x/../md2";
     }
-    MACHINE machine = ArrayMake({.nMd = 2});
-    MachineFolder(machine, "/dev/md2x");
-    MachineCall(machine, [&] {
-        RAID_INFO *pInfo = nullptr;
-        ASSERT_EQ(RAIDInfoGet(szLong.c_str(), &pInfo), 1);
-        EXPECT_EQ(pInfo->szPath, szLong.substr(0, 127));
-        RAIDInfoFree(pInfo);
-    });
-}
-
-TEST(RaidInfo, MembersAreThoseOfTheWholePath)
-{
-    // Cut to what the record holds, it would be the path of md0.
-    const std::string szLong = "/dev/md" + std::string(130, '0') + "2";
+    const std::string szZeros = "/dev/md" + std::string(130, '0');
     MACHINE machine = ArrayMake({.nMd = 2, .members = {{"sda3"}}});
-    machine.links[szLong] = "/dev/md2";
-    MachineCall(machine, [&] {
-        RAID_INFO *pInfo = nullptr;
-        ASSERT_EQ(RAIDInfoGet(szLong.c_str(), &pInfo), 1);
-        EXPECT_EQ(pInfo->nMd, 2);
-        EXPECT_NE(pInfo->pDisks, nullptr);
-        EXPECT_STREQ(pInfo->pDisks == nullptr ? "" : pInfo->pDisks->szPath, "/dev/sda3");
-        RAIDInfoFree(pInfo);
-    });
+    MachineLink(machine, "/dev/md2p1", "md2");
+    MachineLink(machine, szZeros + "2", "/dev/md2");
+    MachineFolder(machine, "/dev/md2x");
+    for (const PATH_CASE &row : {
+             PATH_CASE{"it may go on behind the number", "/dev/md2p1", "/dev/md2p1"},
+             {"a long one is cut", szLong, szLong.substr(0, 127)},
+             // Cut to what the record holds, it would be the path of md0.
+             {"members are those of the whole path", szZeros + "2", szZeros.substr(0, 127)},
+         }) {
+        SCOPED_TRACE(row.szName);
+        WithInfo(machine, row.szPath, [&row](const RAID_INFO &info) {
+            EXPECT_EQ(info.nMd, 2);
+            EXPECT_EQ(info.szPath, row.szRecorded);
+            ASSERT_NE(info.pDisks, nullptr);
+            EXPECT_STREQ(info.pDisks->szPath, "/dev/sda3");
+        });
+    }
 }
 
 // A folder opens for reading alone.
 TEST(RaidInfo, TheNodeIsOpenedForReading)
 {
-    MACHINE machine = ArrayMake({.nMd = 2});
-    MachineRemove(machine, "/dev/md2");
+    MACHINE machine = Without(ArrayMake({.nMd = 2}), "/dev/md2");
     MachineFolder(machine, "/dev/md2");
-    QuietCall(machine, [] {
-        RAID_INFO *pInfo = nullptr;
-        ASSERT_EQ(RAIDInfoGet("/dev/md2", &pInfo), 1);
-        EXPECT_EQ(pInfo->arraySize, GIB);
-        RAIDInfoFree(pInfo);
-    });
+    const RUN_RESULT result = WithInfo(
+        machine, "/dev/md2", [](const RAID_INFO &info) { EXPECT_EQ(info.arraySize, GIB); });
+    EXPECT_EQ(LogText(result), "");
 }
-
 TEST(RaidInfo, FreeingNothingIsAllowed)
 {
     MachineCall(MachineMake(), [] {
@@ -246,67 +242,43 @@ struct DEVICE_SIZE_CASE {
     const char *szWhat;
     MACHINE_MD md;
     u64 cb;
+    const char *szFile = "5000\n";
 };
 
 TEST(RaidInfo, TheDeviceSizeHasItsSources)
 {
-    constexpr int FIELD = 1000;
-    const char *const FILE_TEXT = "5000\n";
+    constexpr u64 OF_FIELD = 1024000;
+    constexpr u64 OF_FILE = 5120000;
     const DEVICE_SIZE_CASE cases[] = {
-        {"0.90 takes the field",
-         {.majorVersion = 0, .size = FIELD, .szComponentSize = FILE_TEXT},
-         FIELD * 1024ULL},
-        {"0.90 takes the field above 4 GiB too",
-         {.majorVersion = 0, .size = FIELD, .arraySize = 5 * GIB, .szComponentSize = FILE_TEXT},
-         FIELD * 1024ULL},
-        {"0.90 takes a field of 0",
-         {.majorVersion = 0, .size = 0, .szComponentSize = FILE_TEXT},
-         0},
-        {"0.90 extends the sign",
-         {.majorVersion = 0, .size = -1, .szComponentSize = FILE_TEXT},
-         UINT64_MAX - 1023},
-        {"1.x takes the field of a small array",
-         {.size = FIELD, .arraySize = GIB, .szComponentSize = FILE_TEXT},
-         FIELD * 1024ULL},
-        {"1.x, the last size that is small",
-         {.size = FIELD, .arraySize = 0xFFFFFFFE, .szComponentSize = FILE_TEXT},
-         FIELD * 1024ULL},
-        {"1.x, the first size that is not",
-         {.size = FIELD, .arraySize = 0xFFFFFFFF, .szComponentSize = FILE_TEXT},
-         5000 * 1024ULL},
-        {"1.x, 4 GiB",
-         {.size = FIELD, .arraySize = 4 * GIB, .szComponentSize = FILE_TEXT},
-         5000 * 1024ULL},
-        {"1.x, a high word and nothing below",
-         {.size = FIELD, .arraySize = 64 * GIB, .szComponentSize = FILE_TEXT},
-         5000 * 1024ULL},
-        {"1.x, a field of 0",
-         {.size = 0, .arraySize = GIB, .szComponentSize = FILE_TEXT},
-         5000 * 1024ULL},
-        {"1.x, members beyond 2 TiB",
-         {.size = 0, .arraySize = GIB << 13, .szComponentSize = "8589934592\n"},
-         GIB << 13},
-        {"1.x without the file", {.size = 0, .szComponentSize = NO_FILE}, 0},
-        {"any version but 0 is 1.x",
-         {.majorVersion = 2, .size = 0, .szComponentSize = "7\n"},
-         7168},
-        {"negative ones too", {.majorVersion = -1, .size = 0, .szComponentSize = "7\n"}, 7168},
-        {"RAID 0 has none", {.level = 0, .size = FIELD}, 0},
-        {"linear has none", {.level = -1, .size = FIELD}, 0},
-        {"RAID 0 has none from the file either",
-         {.level = 0, .size = 0, .arraySize = 8 * GIB, .szComponentSize = FILE_TEXT},
-         0},
-        {"RAID 10 has one", {.level = 10, .size = FIELD}, FIELD * 1024ULL},
+        {"0.90 takes the field", {.majorVersion = 0, .size = 1000}, OF_FIELD},
+        {"above 4 GiB too", {.majorVersion = 0, .size = 1000, .arraySize = 5 * GIB}, OF_FIELD},
+        {"0.90 takes a field of 0", {.majorVersion = 0, .size = 0}, 0},
+        {"0.90 extends the sign", {.majorVersion = 0, .size = -1}, UINT64_MAX - 1023},
+        {"1.x takes the field of a small array", {.size = 1000, .arraySize = GIB}, OF_FIELD},
+        {"the last size that is small", {.size = 1000, .arraySize = 0xFFFFFFFE}, OF_FIELD},
+        {"the first size that is not", {.size = 1000, .arraySize = 0xFFFFFFFF}, OF_FILE},
+        {"1.x, 4 GiB", {.size = 1000, .arraySize = 4 * GIB}, OF_FILE},
+        {"a high word and nothing below", {.size = 1000, .arraySize = 64 * GIB}, OF_FILE},
+        {"1.x, a field of 0", {.size = 0, .arraySize = GIB}, OF_FILE},
+        {"beyond 2 TiB", {.size = 0, .arraySize = GIB << 13}, GIB << 13, "8589934592\n"},
+        {"1.x without the file", {.size = 0}, 0, NO_FILE},
+        {"any version but 0 is 1.x", {.majorVersion = 2, .size = 0}, 7168, "7\n"},
+        {"negative ones too", {.majorVersion = -1, .size = 0}, 7168, "7\n"},
+        {"RAID 0 has none", {.level = 0, .size = 1000}, 0},
+        {"linear has none", {.level = -1, .size = 1000}, 0},
+        {"none from the file", {.level = 0, .size = 0, .arraySize = 8 * GIB}, 0},
+        {"RAID 10 has one", {.level = 10, .size = 1000}, OF_FIELD},
     };
-    for (const DEVICE_SIZE_CASE &one : cases) {
-        SCOPED_TRACE(one.szWhat);
-        WithInfo(one.md, [&](const RAID_INFO &info) {
-            EXPECT_EQ(info.deviceSize, one.cb);
-            EXPECT_EQ(info.arraySize, one.md.arraySize);
+    for (const DEVICE_SIZE_CASE &row : cases) {
+        SCOPED_TRACE(row.szWhat);
+        MACHINE_MD md = row.md;
+        md.szComponentSize = row.szFile;
+        WithInfo(md, [&](const RAID_INFO &info) {
+            EXPECT_EQ(info.deviceSize, row.cb);
+            EXPECT_EQ(info.arraySize, row.md.arraySize);
         });
     }
 }
-
 struct COMPONENT_CASE {
     std::string szText;
     u64 nSector;
@@ -340,30 +312,29 @@ TEST(ComponentSize, TheFileIsANumberOfKib)
     }
 }
 
-TEST(ComponentSize, WhatCannotBeReadIsNothing)
+u64 ComponentSizeOfMd9()
 {
-    WithArray({.nMd = 2, .szComponentSize = NO_FILE}, [](int fd) {
-        EXPECT_EQ(RAIDComponentSizeGet(fd), 0U);
-        EXPECT_EQ(RAIDComponentSizeGet(-1), 0U);
-    });
-    MACHINE machine = ArrayMake({.nMd = 2, .szComponentSize = NO_FILE});
-    MachineFolder(machine, "/sys/block/md2/md/component_size");
-    MachineCall(machine, [] {
-        const int fd = open("/dev/md2", O_RDONLY);
-        EXPECT_EQ(RAIDComponentSizeGet(fd), 0U);
-        close(fd);
-    });
+    const int fd = open("/dev/md9", O_RDONLY);
+    const u64 nSector = RAIDComponentSizeGet(fd);
+    close(fd);
+    return nSector;
 }
 
+TEST(ComponentSize, WhatCannotBeReadIsNothing)
+{
+    MACHINE machine = ArrayMake({.nMd = 9, .szComponentSize = NO_FILE});
+    MachineCall(machine, [] {
+        EXPECT_EQ(ComponentSizeOfMd9(), 0U);
+        EXPECT_EQ(RAIDComponentSizeGet(-1), 0U);
+    });
+    MachineFolder(machine, "/sys/block/md9/md/component_size");
+    MachineCall(machine, [] { EXPECT_EQ(ComponentSizeOfMd9(), 0U); });
+}
 TEST(ComponentSize, TheMinorNumberNamesTheArray)
 {
-    MACHINE machine = ArrayMake({.nMd = 2, .szComponentSize = "1\n", .deviceMinor = 300});
+    MACHINE machine = ArrayMake({.nMd = 9, .szComponentSize = "1\n", .deviceMinor = 300});
     MachineFile(machine, "/sys/block/md300/md/component_size", "21\n");
-    MachineCall(machine, [] {
-        const int fd = open("/dev/md2", O_RDONLY);
-        EXPECT_EQ(RAIDComponentSizeGet(fd), 42U);
-        close(fd);
-    });
+    MachineCall(machine, [] { EXPECT_EQ(ComponentSizeOfMd9(), 42U); });
 }
 
 // ---- the partitionable driver ------------------------------------------------------------------
@@ -380,31 +351,24 @@ MACHINE PartitionableMake(const std::string &szDevices)
     MachineFile(machine, "/proc/devices", szDevices);
     return machine;
 }
-
-u64 ComponentSizeOfMd9()
-{
-    const int fd = open("/dev/md9", O_RDONLY);
-    const u64 nSector = RAIDComponentSizeGet(fd);
-    close(fd);
-    return nSector;
-}
-
 struct DEVICES_CASE {
     const char *szWhat;
     std::string szDevices;
     u64 nSector;
 };
 
-void ExpectDevicesRead(const DEVICES_CASE &one)
+void ExpectDevicesRead(const std::vector<DEVICES_CASE> &cases)
 {
-    SCOPED_TRACE(one.szWhat);
-    MachineCall(PartitionableMake(one.szDevices),
-                [&] { EXPECT_EQ(ComponentSizeOfMd9(), one.nSector); });
+    for (const DEVICES_CASE &row : cases) {
+        SCOPED_TRACE(row.szWhat);
+        MachineCall(PartitionableMake(row.szDevices),
+                    [&] { EXPECT_EQ(ComponentSizeOfMd9(), row.nSector); });
+    }
 }
 
 TEST(ComponentSize, TheDriverStandsInTheBlockSection)
 {
-    const DEVICES_CASE cases[] = {
+    ExpectDevicesRead({
         {"a plain list", "Character devices:\n  1 mem\n\nBlock devices:\n  9 md\n254 mdp\n",
          PARTITIONABLE},
         {"another number", "Block devices:\n253 mdp\n", PLAIN},
@@ -428,15 +392,12 @@ TEST(ComponentSize, TheDriverStandsInTheBlockSection)
         {"a number with text behind it", "Block devices:\n254abc mdp\n", PARTITIONABLE},
         {"no line end", "Block devices:\n254 mdp", PARTITIONABLE},
         {"an empty file", "", PLAIN},
-    };
-    for (const DEVICES_CASE &one : cases) {
-        ExpectDevicesRead(one);
-    }
+    });
 }
 
 TEST(ComponentSize, WordsAreReadWithCommentsAndQuotes)
 {
-    const DEVICES_CASE cases[] = {
+    ExpectDevicesRead({
         {"a comment to the end of the line", "Block devices:\n# 254 mdp\n", PLAIN},
         {"a comment behind words", "Block devices: # 253 mdp\n254 mdp\n", PARTITIONABLE},
         {"a comment without a line end", "Block devices:\n253 mdp2 #", PLAIN},
@@ -448,27 +409,24 @@ TEST(ComponentSize, WordsAreReadWithCommentsAndQuotes)
         {"one quote in the other", "Block devices:\n\"'\" 254 mdp '\"'\n", PARTITIONABLE},
         {"an odd quote ends with its line", "Block devices:\n253 o'x\n254 mdp\n", PARTITIONABLE},
         {"an odd double quote, too", "Block devices:\n253 \"x\n254 mdp\n255 y\"\n", PARTITIONABLE},
-    };
-    for (const DEVICES_CASE &one : cases) {
-        ExpectDevicesRead(one);
-    }
+    });
 }
 
 TEST(ComponentSize, WordsMayBeLong)
 {
     for (const size_t cb : {98U, 99U, 100U, 101U, 102U, 199U, 200U, 201U, 1000U, 5000U}) {
         const std::string szLong(cb, 'x');
-        ExpectDevicesRead(
-            {"a long word between", "Block devices:\n254 " + szLong + " mdp\n", PARTITIONABLE});
-        ExpectDevicesRead({"a long word at the end", "Block devices:\n254 " + szLong, PLAIN});
-        ExpectDevicesRead({"a long word that ends like the name",
-                           "Block devices:\n254 " + szLong + "mdp\n", PLAIN});
+        ExpectDevicesRead({
+            {"between", "Block devices:\n254 " + szLong + " mdp\n", PARTITIONABLE},
+            {"at the end", "Block devices:\n254 " + szLong, PLAIN},
+            {"ends like the name", "Block devices:\n254 " + szLong + "mdp\n", PLAIN},
+        });
     }
 }
 
 TEST(ComponentSize, TheFixUpsOfTheWordReaderHarmNothing)
 {
-    const DEVICES_CASE cases[] = {
+    ExpectDevicesRead({
         {"a bracket behind active", "Block devices:\n254 md0 active(auto-read-only) mdp\n",
          PARTITIONABLE},
         {"a bracket behind a word that ends in it", "Block devices:\n254 inactive(x mdp\n",
@@ -479,26 +437,22 @@ TEST(ComponentSize, TheFixUpsOfTheWordReaderHarmNothing)
         {"the bracket is a separator", "Block devices:\n254 active(mdp\n", PARTITIONABLE},
         {"no other bracket is", "Block devices:\n254 act(mdp\n", PLAIN},
         {"the bracket ends the word", "Block devices:\n253 254active(mdp mdp\n", PARTITIONABLE},
-    };
-    for (const DEVICES_CASE &one : cases) {
-        ExpectDevicesRead(one);
-    }
+    });
 }
 
 TEST(ComponentSize, WithoutAListThereIsNoSuchDriver)
 {
-    MACHINE machine = PartitionableMake("");
-    MachineRemove(machine, "/proc/devices");
-    QuietCall(machine, [] { EXPECT_QUIET(ComponentSizeOfMd9(), PLAIN); });
+    QuietCall(Without(PartitionableMake(""), "/proc/devices"),
+              [] { EXPECT_QUIET(ComponentSizeOfMd9(), PLAIN); });
 }
 
 // Without memory for a word the kernel's list names no driver, so the array is not partitionable.
 TEST(ComponentSize, WithoutMemoryNoDriverIsKnown)
 {
-    MACHINE machine = PartitionableMake("Block devices:\n254 mdp\n");
+    const MACHINE machine = PartitionableMake("Block devices:\n254 mdp\n");
     MachineCall(machine, [] { EXPECT_EQ(ComponentSizeOfMd9(), PARTITIONABLE); });
-    machine.faults = {{.szFunction = "realloc", .error = ENOMEM}};
-    MachineCall(machine, [] { EXPECT_EQ(ComponentSizeOfMd9(), PLAIN); });
+    MachineCall(WithFault(machine, {.szFunction = "realloc"}),
+                [] { EXPECT_EQ(ComponentSizeOfMd9(), PLAIN); });
 }
 
 TEST(ComponentSize, TheDriverIsLookedUpUntilItIsFound)
@@ -515,9 +469,9 @@ TEST(ComponentSize, TheDriverIsLookedUpUntilItIsFound)
 TEST(ComponentSize, TheMinorIsSharedByTheArraysPartitions)
 {
     for (const unsigned int deviceMinor : {0U, 63U}) {
-        MACHINE machine = ArrayMake({.nMd = 9, .deviceMajor = 254, .deviceMinor = deviceMinor});
-        MachineFile(machine, "/sys/block/md_d0/md/component_size", "2\n");
-        MachineCall(machine, [] { EXPECT_EQ(ComponentSizeOfMd9(), PARTITIONABLE); });
+        const MACHINE array = ArrayMake({.nMd = 9, .deviceMajor = 254, .deviceMinor = deviceMinor});
+        MachineCall(WithFile(array, "/sys/block/md_d0/md/component_size", "2\n"),
+                    [] { EXPECT_EQ(ComponentSizeOfMd9(), PARTITIONABLE); });
     }
 }
 
@@ -537,10 +491,8 @@ TEST(RaidInfoFailure, AnotherPathIsRefusedBeforeItIsOpened)
 {
     for (const char *const szPath : {"/dev/sda", "/dev/md", "/dev/mdx", "/dev/md_d2", "md2",
                                      "/dev//md2", "/DEV/md2", "", " /dev/md2", "/dev/m2"}) {
-        MACHINE machine = ArrayMake({.nMd = 2});
         // Would be logged as another failure if it came so far.
-        machine.faults = {{.szFunction = "open", .nCall = 1, .error = EIO, .fGoOn = true}};
-        ExpectQueryFails(machine, szPath, 0xBE00,
+        ExpectQueryFails(WithFault(ArrayMake({.nMd = 2}), {.szFunction = "open"}), szPath, 0xBE00,
                          std::string("<15>raid_info.cpp:# invalide path ") + szPath +
                              ", errno=Success\n");
     }
@@ -548,90 +500,78 @@ TEST(RaidInfoFailure, AnotherPathIsRefusedBeforeItIsOpened)
 
 TEST(RaidInfoFailure, WithoutMemory)
 {
-    MACHINE machine = ArrayMake({.nMd = 2});
-    machine.faults = {{.szFunction = "calloc", .nCall = 1, .error = ENOMEM}};
-    ExpectQueryFails(machine, "/dev/md2", 0x0200,
-                     "<15>raid_info.cpp:# Failed to calloc, errno=Cannot allocate memory\n");
+    const MACHINE machine = ArrayMake({.nMd = 2});
+    ExpectNotFound(WithFault(machine, {.szFunction = "calloc"}), 0x0200,
+                   Told("calloc", "Cannot allocate memory"));
 }
 
 TEST(RaidInfoFailure, ANodeThatDoesNotOpen)
 {
-    ExpectQueryFails(MachineMake(), "/dev/md5", 0x0900,
-                     "<15>raid_info.cpp:# Failed to open /dev/md5, "
-                     "errno=No such file or directory\n");
+    ExpectNotFound(MachineMake(), 0x0900, Told("open /dev/md2", "No such file or directory"));
 }
 
-TEST(RaidInfoFailure, TheArrayInformation)
-{
-    ExpectQueryFails({.nMd = 2, .errnoInfo = EIO}, 0x8000,
-                     "<15>raid_info.cpp:# Failed to ioctl for raid status, "
-                     "errno=Input/output error\n"
-                     "<15>raid_info.cpp:# Failed to ioctl for raid status, errno=0X8000\n");
-    ExpectQueryFails({.nMd = 2, .errnoInfo = EINTR}, 0xA700,
-                     "<15>raid_info.cpp:# Failed to ioctl for raid status, errno=0XA700\n");
-}
+constexpr char STATUS[] = "ioctl for raid status";
+constexpr char SIZE[] = "ioctl for raid size";
+constexpr char SYNC[] = "ioctl for sync status";
+constexpr char DISKS[] = "get disk list for /dev/md2";
 
 // The absence is overwritten on its way up, so an inactive array is a failure like any other.
-TEST(RaidInfoFailure, AnInactiveArray)
+TEST(RaidInfoFailure, TheArrayInformation)
 {
-    ExpectQueryFails({.nMd = 2, .errnoInfo = ENODEV}, 0x8000,
-                     "<15>raid_info.cpp:# Failed to ioctl for raid status, errno=No such device\n"
-                     "<15>raid_info.cpp:# Failed to ioctl for raid status, errno=0X8000\n");
+    ExpectNotFound({.errnoInfo = EIO}, 0x8000,
+                   Told(STATUS, "Input/output error") + Told(STATUS, "0X8000"));
+    ExpectNotFound({.errnoInfo = ENODEV}, 0x8000,
+                   Told(STATUS, "No such device") + Told(STATUS, "0X8000"));
+    ExpectNotFound({.errnoInfo = EINTR}, 0xA700, Told(STATUS, "0XA700"));
 }
 
 TEST(RaidInfoFailure, TheSize)
 {
-    ExpectQueryFails({.nMd = 2, .errnoSize = EIO}, 0x8000,
-                     "<15>raid_info.cpp:# Failed to ioctl for raid status, "
-                     "errno=Input/output error\n"
-                     "<15>raid_info.cpp:# Failed to ioctl for raid size, errno=0X8000\n");
-    ExpectQueryFails({.nMd = 2, .errnoSize = ENODEV}, 0x0600,
-                     "<15>raid_info.cpp:# Failed to ioctl for raid size, errno=0X600\n");
+    ExpectNotFound({.errnoSize = EIO}, 0x8000,
+                   Told(STATUS, "Input/output error") + Told(SIZE, "0X8000"));
+    ExpectNotFound({.errnoSize = ENODEV}, 0x0600, Told(SIZE, "0X600"));
 }
 
 TEST(RaidInfoFailure, TheMemberList)
 {
-    MACHINE machine = ArrayMake({.nMd = 2, .members = {{"sda3"}}});
-    machine.faults = {{.szFunction = "glob", .nCall = 1, .error = EIO}};
-    ExpectQueryFails(machine, "/dev/md2", 0x8000,
-                     "<15>raid_disk.cpp:# failed to glob '/sys/block/md2/md/dev-*', "
-                     "errno=Input/output error\n"
-                     "<15>raid_info.cpp:# Failed to get disk list for /dev/md2, errno=0X8000\n");
+    const MACHINE machine = ArrayMake({.nMd = 2, .members = {{"sda3"}}});
+    ExpectNotFound(WithFault(machine, {.szFunction = "glob", .error = EIO}), 0x8000,
+                   "<15>raid_disk.cpp:# failed to glob '/sys/block/md2/md/dev-*', "
+                   "errno=Input/output error\n" +
+                       Told(DISKS, "0X8000"));
 }
 
 TEST(RaidInfoFailure, TheResync)
 {
-    ExpectQueryFails({.nMd = 2, .errnoSync = EIO, .members = {{"sda3"}}}, 0x8000,
-                     "<15>raid_info.cpp:# Failed to ioctl for sync status, "
-                     "errno=Input/output error\n"
-                     "<15>raid_info.cpp:# Failed to get disk list for /dev/md2, errno=0X8000\n");
-    ExpectQueryFails({.nMd = 2, .errnoSync = ENODEV, .members = {{"sda3"}}}, 0x0600,
-                     "<15>raid_info.cpp:# Failed to get disk list for /dev/md2, errno=0X600\n");
+    ExpectNotFound({.errnoSync = EIO, .members = {{"sda3"}}}, 0x8000,
+                   Told(SYNC, "Input/output error") + Told(DISKS, "0X8000"));
+    ExpectNotFound({.errnoSync = ENOTTY}, 0x8000,
+                   Told(SYNC, "Inappropriate ioctl for device") + Told(DISKS, "0X8000"));
+    ExpectNotFound({.errnoSync = ENODEV, .members = {{"sda3"}}}, 0x0600, Told(DISKS, "0X600"));
 }
 
 TEST(RaidInfoFailure, TheHealth)
 {
-    ExpectQueryFails({.nMd = 2, .errnoHealth = EIO, .members = {{"sda3"}}}, 0x8000,
-                     "<15>raid_info.cpp:# Failed to ioctl for raid status, "
-                     "errno=Input/output error\n"
-                     "<15>raid_info.cpp:# Failed to ioctl for raid size, errno=0X8000\n");
-    ExpectQueryFails({.nMd = 2, .errnoHealth = ENODEV}, 0x0600,
-                     "<15>raid_info.cpp:# Failed to ioctl for raid size, errno=0X600\n");
-    ExpectQueryFails({.nMd = 2, .errnoHealth = EINTR}, 0xA700,
-                     "<15>raid_info.cpp:# Failed to ioctl for raid size, errno=0XA700\n");
-    ExpectQueryFails({.nMd = 2, .health = 3, .members = {{"sda3"}}}, 0x8000,
-                     "<15>raid_info.cpp:# unknown raid status, status=3\n"
-                     "<15>raid_info.cpp:# Failed to ioctl for raid size, errno=0X8000\n");
+    ExpectNotFound({.errnoHealth = EIO, .members = {{"sda3"}}}, 0x8000,
+                   Told(STATUS, "Input/output error") + Told(SIZE, "0X8000"));
+    ExpectNotFound({.errnoHealth = ENOTTY}, 0x8000,
+                   Told(STATUS, "Inappropriate ioctl for device") + Told(SIZE, "0X8000"));
+    ExpectNotFound({.errnoHealth = ENODEV}, 0x0600, Told(SIZE, "0X600"));
+    ExpectNotFound({.errnoHealth = EINTR}, 0xA700, Told(SIZE, "0XA700"));
+    for (const int health : {3, -1, 255}) {
+        ExpectNotFound({.health = health, .members = {{"sda3"}}}, 0x8000,
+                       "<15>raid_info.cpp:# unknown raid status, status=" + std::to_string(health) +
+                           "\n" + Told(SIZE, "0X8000"));
+    }
 }
 
 // Of two steps that fail the first one alone is told.
 TEST(RaidInfoFailure, TheStepsHaveAnOrder)
 {
-    const std::string szLevel = "<15>raid_info.cpp:# Not supported RAID level: 4\n";
-    ExpectQueryFails({.nMd = 2, .level = 4, .errnoSize = ENODEV}, 0x0600,
-                     szLevel + "<15>raid_info.cpp:# Failed to ioctl for raid size, errno=0X600\n");
-    ExpectQueryFails({.nMd = 2, .level = 4, .errnoInfo = EINTR, .errnoSize = ENODEV}, 0xA700,
-                     "<15>raid_info.cpp:# Failed to ioctl for raid status, errno=0XA700\n");
+    ExpectNotFound({.level = 4, .errnoSize = ENODEV}, 0x0600,
+                   "<15>raid_info.cpp:# Not supported RAID level: 4\n" + Told(SIZE, "0X600"));
+    ExpectNotFound({.level = 4, .errnoInfo = EINTR, .errnoSize = ENODEV}, 0xA700,
+                   Told(STATUS, "0XA700"));
 
     const std::string szMember =
         "<15>raid_disk.cpp:# Failed to get disk slot, errno=Success\n"
@@ -639,15 +579,13 @@ TEST(RaidInfoFailure, TheStepsHaveAnOrder)
         "<15>raid_disk.cpp:# Failed to create disk info from /sys/block/md2/md/dev-sda3 "
         ",errno=0XA00\n";
     const std::vector<MACHINE_MEMBER> members = {{"sda3", "in_sync\n", ""}};
-    ExpectQueryFails({.nMd = 2, .errnoSize = ENODEV, .errnoSync = EIO, .members = members}, 0x0600,
-                     "<15>raid_info.cpp:# Failed to ioctl for raid size, errno=0X600\n");
-    ExpectQueryFails({.nMd = 2, .errnoSync = ENODEV, .members = members}, 0x0600,
-                     szMember + "<15>raid_info.cpp:# Failed to get disk list for /dev/md2, "
-                                "errno=0X600\n");
-    ExpectQueryFails({.nMd = 2, .errnoHealth = ENODEV, .members = members}, 0x0600,
-                     szMember + "<15>raid_info.cpp:# Failed to ioctl for raid size, errno=0X600\n");
-    ExpectQueryFails({.nMd = 2, .errnoHealth = EINTR, .errnoSync = ENODEV}, 0x0600,
-                     "<15>raid_info.cpp:# Failed to get disk list for /dev/md2, errno=0X600\n");
+    ExpectNotFound({.errnoSize = ENODEV, .errnoSync = EIO, .members = members}, 0x0600,
+                   Told(SIZE, "0X600"));
+    ExpectNotFound({.errnoSync = ENODEV, .members = members}, 0x0600,
+                   szMember + Told(DISKS, "0X600"));
+    ExpectNotFound({.errnoHealth = ENODEV, .members = members}, 0x0600,
+                   szMember + Told(SIZE, "0X600"));
+    ExpectNotFound({.errnoHealth = EINTR, .errnoSync = ENODEV}, 0x0600, Told(DISKS, "0X600"));
 }
 
 // ---- the requests by themselves ----------------------------------------------------------------
@@ -656,8 +594,7 @@ TEST(RaidRequest, NullIsABadParameter)
 {
     const RUN_RESULT result = WithArray({.nMd = 2}, [](int fd) {
         RAID_REBUILD_STATUS rebuild = {};
-        EXPECT_EQ(RAIDIoctlInfo(fd, nullptr), -1);
-        EXPECT_EQ(NLIBCErrGet(), 0x0D00U);
+        EXPECT_FAILS(RAIDIoctlInfo(fd, nullptr), -1, 0x0D00U);
         EXPECT_FAILS(RAIDIoctlSize(fd, nullptr), -1, 0x0D00U);
         EXPECT_FAILS(RAIDIoctlStatus(fd, nullptr), -1, 0x0D00U);
         EXPECT_FAILS(RAIDRebuildStatusGet(fd, nullptr), -1, 0x0D00U);
@@ -693,11 +630,10 @@ TEST(RaidRequest, TheArrayInformationIsTheDriversRecord)
 }
 
 struct REQUEST_FAILURE_CASE {
-    const char *szName;
     MACHINE_MD md;
     long long (*pAsk)(int fd);
     u32 code;
-    const char *szLog = "";
+    std::string szLog = "";
 };
 
 long long InfoAsk(int fd)
@@ -733,49 +669,27 @@ long long ResyncAsk(int fd)
 TEST(RaidRequest, FailsWithItsOwnCodeOrTheCallsOwn)
 {
     const REQUEST_FAILURE_CASE cases[] = {
-        {"information, interrupted", {.errnoInfo = EINTR}, InfoAsk, 0xA700},
-        {"information, no array",
-         {.errnoInfo = ENODEV},
-         InfoAsk,
-         0x8000,
-         "raid status, errno=No such device"},
-        {"information", {.errnoInfo = EFAULT}, InfoAsk, 0x8000, "raid status, errno=Bad address"},
-        {"size, no array", {.errnoSize = ENODEV}, SizeAsk, 0x0600},
-        {"size, interrupted",
-         {.errnoSize = EINTR},
-         SizeAsk,
-         0x8000,
-         "raid status, errno=Interrupted system call"},
-        {"size", {.errnoSize = EIO}, SizeAsk, 0x8000, "raid status, errno=Input/output error"},
-        {"health, no array", {.errnoHealth = ENODEV}, HealthAsk, 0x0600},
-        {"health, interrupted", {.errnoHealth = EINTR}, HealthAsk, 0xA700},
-        {"health",
-         {.errnoHealth = ENOTTY},
+        {{.errnoInfo = EINTR}, InfoAsk, 0xA700},
+        {{.errnoInfo = ENODEV}, InfoAsk, 0x8000, Told(STATUS, "No such device")},
+        {{.errnoInfo = EFAULT}, InfoAsk, 0x8000, Told(STATUS, "Bad address")},
+        {{.errnoSize = ENODEV}, SizeAsk, 0x0600},
+        {{.errnoSize = EINTR}, SizeAsk, 0x8000, Told(STATUS, "Interrupted system call")},
+        {{.errnoSize = EIO}, SizeAsk, 0x8000, Told(STATUS, "Input/output error")},
+        {{.errnoHealth = ENODEV}, HealthAsk, 0x0600},
+        {{.errnoHealth = EINTR}, HealthAsk, 0xA700},
+        {{.errnoHealth = ENOTTY},
          HealthAsk,
          0x8000,
-         "raid status, errno=Inappropriate ioctl for device"},
-        {"resync, no array", {.errnoSync = ENODEV}, ResyncAsk, 0x0600},
-        {"resync, interrupted",
-         {.errnoSync = EINTR},
-         ResyncAsk,
-         0x8000,
-         "sync status, errno=Interrupted system call"},
-        {"resync",
-         {.errnoSync = ENOTTY},
-         ResyncAsk,
-         0x8000,
-         "sync status, errno=Inappropriate ioctl for device"},
+         Told(STATUS, "Inappropriate ioctl for device")},
+        {{.errnoSync = ENODEV}, ResyncAsk, 0x0600},
+        {{.errnoSync = EINTR}, ResyncAsk, 0x8000, Told(SYNC, "Interrupted system call")},
+        {{.errnoSync = ENOTTY}, ResyncAsk, 0x8000, Told(SYNC, "Inappropriate ioctl for device")},
     };
     for (const REQUEST_FAILURE_CASE &row : cases) {
-        SCOPED_TRACE(row.szName);
-        const RUN_RESULT result = WithArray(row.md, [&row](int fd) {
-            EXPECT_EQ(row.pAsk(fd), -1);
-            EXPECT_EQ(NLIBCErrGet(), row.code);
-        });
-        EXPECT_EQ(LogText(result),
-                  *row.szLog == '\0'
-                      ? ""
-                      : std::string("<15>raid_info.cpp:# Failed to ioctl for ") + row.szLog + "\n");
+        SCOPED_TRACE(testing::Message() << "row " << &row - cases);
+        const RUN_RESULT result =
+            WithArray(row.md, [&row](int fd) { EXPECT_FAILS(row.pAsk(fd), -1, row.code); });
+        EXPECT_EQ(LogText(result), row.szLog);
     }
 }
 
@@ -791,8 +705,7 @@ TEST(RaidRequest, TheHealthIsMapped)
     for (const int health : {3, 4, -1}) {
         const RUN_RESULT result = WithArray({.nMd = 2, .health = health}, [&](int fd) {
             u32 status = 99;
-            EXPECT_EQ(RAIDIoctlStatus(fd, &status), -1);
-            EXPECT_EQ(NLIBCErrGet(), 0x8000U);
+            EXPECT_FAILS(RAIDIoctlStatus(fd, &status), -1, 0x8000U);
         });
         EXPECT_EQ(LogText(result), "<15>raid_info.cpp:# unknown raid status, status=" +
                                        std::to_string(health) + "\n");
