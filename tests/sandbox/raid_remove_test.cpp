@@ -36,20 +36,14 @@ std::string KeysOf(const NLIBHASH *pMap)
     return szText;
 }
 
+// One call of a row's name, on this machine.
+void Expect(const char *szName, const std::function<long long()> &call, int result,
+            const STEPS &steps, const MACHINE &machine = MachineWithMirror(), u32 code = OLD_CODE)
+{
+    (void)ExpectCall({szName, machine, call, result, code, steps});
+}
+
 // ---- one command -------------------------------------------------------------------------------
-
-struct COMMAND_CASE {
-    TOOL_ANSWER answer;
-    int result;
-};
-
-const COMMAND_CASE COMMAND_CASES[] = {
-    {{}, 0},
-    {{.szErr = "mdadm: stopped\n"}, 0}, // only the status counts
-    {{.status = 1}, -1},
-    {{.szErr = "mdadm: busy\n", .status = 255}, -1},
-    {{.signal = SIGKILL}, -1},
-};
 
 const STEP STOP_TOLD = {"<11>raid_remove.cpp:# Failed to mdadm stop '/dev/md2'"};
 const STEP ZERO_TOLD = {"<11>raid_remove.cpp:# Failed to zero RAID superblock '/dev/sda3'"};
@@ -66,62 +60,42 @@ long long Zero()
 
 TEST(RAIDRemove, StopAndZeroAreOneCommandEach)
 {
-    for (const COMMAND_CASE &row : COMMAND_CASES) {
-        SCOPED_TRACE(testing::Message() << row.answer.status << row.answer.szErr);
-        const STEPS stop = {{STOP_MD2, row.answer}};
-        const STEPS zero = {{"/sbin/mdadm --zero-superblock /dev/sda3", row.answer}};
-        ExpectCalls({{.szName = "stop",
-                      .call = Stop,
-                      .result = row.result,
-                      .steps = row.result == 0 ? stop : stop + STEPS{STOP_TOLD}},
-                     {.szName = "zero",
-                      .call = Zero,
-                      .result = row.result,
-                      .steps = row.result == 0 ? zero : zero + STEPS{ZERO_TOLD}}});
+    for (const TOOL_ANSWER &answer : {TOOL_ANSWER{}, {.szErr = "mdadm: stopped\n"}}) {
+        Expect("stop", Stop, 0, {{STOP_MD2, answer}}); // only the status counts
+        Expect("zero", Zero, 0, {{"/sbin/mdadm --zero-superblock /dev/sda3", answer}});
+    }
+    for (const TOOL_ANSWER &answer : {TOOL_ANSWER{.status = 1},
+                                      {.szErr = "mdadm: busy\n", .status = 255},
+                                      {.signal = SIGKILL}}) {
+        Expect("stop", Stop, -1, {{STOP_MD2, answer}, STOP_TOLD});
+        Expect("zero", Zero, -1, {{"/sbin/mdadm --zero-superblock /dev/sda3", answer}, ZERO_TOLD});
     }
 }
 
 TEST(RAIDRemove, AToolThatCannotBeRunFails)
 {
     const MACHINE missing = WithTool(MachineMake(), "/sbin/mdadm", TOOL_KIND::MISSING);
-    ExpectCalls({{.szName = "no pipe",
-                  .machine = WithFault(MachineMake(), {.szFunction = "pipe2", .error = EMFILE}),
-                  .call = Stop,
-                  .result = -1,
-                  .code = ERR_BAD_PARAMETER, // of the stream that is not there
-                  .steps = {{"fault pipe2 1"}, STOP_TOLD}},
-                 {.szName = "nothing to stop with",
-                  .machine = missing,
-                  .call = Stop,
-                  .result = -1,
-                  .steps = {STOP_TOLD}},
-                 {.szName = "nothing to wipe with",
-                  .machine = missing,
-                  .call = Zero,
-                  .result = -1,
-                  .steps = {ZERO_TOLD}}});
+    Expect("nothing to stop with", Stop, -1, {STOP_TOLD}, missing);
+    Expect("nothing to wipe with", Zero, -1, {ZERO_TOLD}, missing);
+    Expect("no pipe", Stop, -1, {{"fault pipe2 1"}, STOP_TOLD},
+           WithFault(MachineMake(), {.szFunction = "pipe2", .error = EMFILE}),
+           ERR_BAD_PARAMETER); // of the stream that is not there
 }
 
 TEST(RAIDRemove, BadArgumentsAreLoggedAndRunNothing)
 {
-    const RUN_RESULT result = MachineCall(MachineWithMirror(), [] {
-        const RAID_INFO info = RecordOf("/dev/md2");
-        RecordReset();
-        EXPECT_EQ(RAIDRemoveByInfo(nullptr), -1);
-        EXPECT_EQ(RAIDRemove(nullptr, nullptr), -1);
-        EXPECT_EQ(RAIDStop(nullptr), -1);
-        EXPECT_EQ(RAIDZeroSuperblock(nullptr), -1);
-        EXPECT_EQ(RAIDCleanSuperblock(nullptr, "uuid", nullptr), -1);
-        EXPECT_EQ(RAIDCleanSuperblock(&info, nullptr, nullptr), -1);
-        EXPECT_EQ(RAIDUUIDHashForRemoveGet(nullptr), -1);
-        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
-    });
-    std::string szExpected;
-    for (int i = 0; i < 7; i++) {
-        szExpected += "<11>raid_remove.cpp:# Bad parameters\n";
+    const RAID_INFO info = RecordOf("/dev/md2");
+    for (const std::function<long long()> &call : std::vector<std::function<long long()>>{
+             [] { return RAIDRemoveByInfo(nullptr); },
+             [] { return RAIDRemove(nullptr, nullptr); },
+             [] { return RAIDStop(nullptr); },
+             [] { return RAIDZeroSuperblock(nullptr); },
+             [] { return RAIDCleanSuperblock(nullptr, "uuid", nullptr); },
+             [&info] { return RAIDCleanSuperblock(&info, nullptr, nullptr); },
+             [] { return RAIDUUIDHashForRemoveGet(nullptr); },
+         }) {
+        Expect("null", call, -1, {{"<11>raid_remove.cpp:# Bad parameters"}});
     }
-    EXPECT_EQ(LogText(result), szExpected);
-    EXPECT_EQ(TranscriptText(result), "");
 }
 
 // ---- the UUID of a running array ---------------------------------------------------------------
@@ -146,87 +120,52 @@ long long UuidFail()
 TEST(RAIDUUIDGet, IsThatOfTheMemberThatSortsLast)
 {
     const STEPS examined = {Examined("sdb3", UUID_MD2)};
-    ExpectCalls({{.szName = "whole",
-                  .machine = MachineWithMirror(),
-                  .call = [] { return UuidGet(UUID_MD2); },
-                  .result = 1,
-                  .steps = examined},
-                 {.szName = "cut to the buffer",
-                  .machine = MachineWithMirror(),
-                  .call = [] { return UuidGet("5b1f", 5); },
-                  .result = 1,
-                  .steps = examined},
-                 {.szName = "no room",
-                  .machine = MachineWithMirror(),
-                  .call = [] { return UuidGet("", 1); },
-                  .result = 1,
-                  .steps = examined}});
+    Expect(
+        "whole", [] { return UuidGet(UUID_MD2); }, 1, examined);
+    Expect(
+        "cut to the buffer", [] { return UuidGet("5b1f", 5); }, 1, examined);
+    Expect(
+        "no room", [] { return UuidGet("", 1); }, 1, examined);
 }
 
 TEST(RAIDUUIDGet, BadArgumentsSetACodeAndRunNothing)
 {
-    const RUN_RESULT result = MachineCall(MachineWithMirror(), [] {
+    IdleCall(MachineWithMirror(), [] {
         char szUuid[64] = "before";
-        const auto refused = [&szUuid](const char *szMd, char *szBuf, int cbBuf) {
-            RecordReset();
-            EXPECT_EQ(RAIDUUIDGet(szMd, szBuf, cbBuf), -1);
-            EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
-            EXPECT_STREQ(szUuid, "before");
-        };
-        refused(nullptr, szUuid, sizeof(szUuid));
-        refused("/dev/md2", nullptr, sizeof(szUuid));
-        refused("/dev/md2", szUuid, 0);
-        refused("/dev/md2", szUuid, -1);
-        refused("/dev/md2", szUuid, INT_MIN);
+        EXPECT_FAILS(RAIDUUIDGet(nullptr, szUuid, sizeof(szUuid)), -1, ERR_BAD_PARAMETER);
+        EXPECT_FAILS(RAIDUUIDGet("/dev/md2", nullptr, sizeof(szUuid)), -1, ERR_BAD_PARAMETER);
+        for (const int cbBuf : {0, -1, INT_MIN}) {
+            EXPECT_FAILS(RAIDUUIDGet("/dev/md2", szUuid, cbBuf), -1, ERR_BAD_PARAMETER);
+        }
+        EXPECT_STREQ(szUuid, "before");
     });
-    EXPECT_EQ(LogText(result), "");
-    EXPECT_EQ(TranscriptText(result), "");
 }
+
+const STEP NO_MD2 = {
+    "<15>raid_info.cpp:# Failed to open /dev/md2, errno=No such file or directory"};
+const STEP NO_INFO = {"<11>raid_remove.cpp:# Failed to get RAID info [/dev/md2], ret = -1"};
 
 TEST(RAIDUUIDGet, FailsWithoutAnArrayMembersOrASuperblock)
 {
-    const STEP told = {"<11>raid_remove.cpp:# Failed to get RAID info [/dev/md2], ret = -1"};
+    const std::string szBlank =
+        "<11>raid_remove.cpp:# Disk [/dev/sdb3] in RAID [/dev/md2] has no RAID superblock, ret=";
     MACHINE inactive = MachineWithMirror();
     inactive.arrays[0].errnoInfo = ENODEV;
     MACHINE empty = MachineMake();
     MachineMdAdd(empty, {.nMd = 2});
-    ExpectCalls(
-        {{.szName = "no array",
-          .call = UuidFail,
-          .result = -1,
-          .code = ERR_OPEN_FAILED,
-          .steps =
-              {{"<15>raid_info.cpp:# Failed to open /dev/md2, errno=No such file or directory"},
-               told}},
-         // The driver's "no such device" ends up as a plain failure.
-         {.szName = "inactive",
-          .machine = inactive,
-          .call = UuidFail,
-          .result = -1,
-          .code = ERR_SYSCALL_FAILED,
-          .steps = {{"<15>raid_info.cpp:# Failed to ioctl for raid status, errno=No such device"},
-                    {"<15>raid_info.cpp:# Failed to ioctl for raid status, errno=0X8000"},
-                    told}},
-         {.szName = "no members",
-          .machine = empty,
-          .call = UuidFail,
-          .result = -1,
-          .code = ERR_NO_MEMBER_DISK},
-         {.szName = "a blank member",
-          .machine = MachineWithMirror(),
-          .call = UuidFail,
-          .result = -1,
-          .steps = {ExaminedBlank("sdb3"),
-                    {"<11>raid_remove.cpp:# Disk [/dev/sdb3] in RAID [/dev/md2] has no RAID "
-                     "superblock, ret=0"}}},
-         {.szName = "a broken report",
-          .machine = MachineWithMirror(),
-          .call = UuidFail,
-          .result = -1,
-          .steps = {{"/sbin/mdadm -E /dev/sdb3", {.szOut = "Version : none\n"}},
-                    {"<11>raid_superblock.cpp:# bad version format: 'none'."},
-                    {"<11>raid_remove.cpp:# Disk [/dev/sdb3] in RAID [/dev/md2] has no RAID "
-                     "superblock, ret=-1"}}}});
+    Expect("no array", UuidFail, -1, {NO_MD2, NO_INFO}, MachineMake(), ERR_OPEN_FAILED);
+    // The driver's "no such device" ends up as a plain failure.
+    Expect("inactive", UuidFail, -1,
+           {{"<15>raid_info.cpp:# Failed to ioctl for raid status, errno=No such device"},
+            {"<15>raid_info.cpp:# Failed to ioctl for raid status, errno=0X8000"},
+            NO_INFO},
+           inactive, ERR_SYSCALL_FAILED);
+    Expect("no members", UuidFail, -1, {}, empty, ERR_NO_MEMBER_DISK);
+    Expect("a blank member", UuidFail, -1, {ExaminedBlank("sdb3"), {szBlank + "0"}});
+    Expect("a broken report", UuidFail, -1,
+           {{"/sbin/mdadm -E /dev/sdb3", {.szOut = "Version : none\n"}},
+            {"<11>raid_superblock.cpp:# bad version format: 'none'."},
+            {szBlank + "-1"}});
 }
 
 // ---- the map -----------------------------------------------------------------------------------
@@ -249,10 +188,8 @@ long long MapFillNothing()
 
 TEST(RAIDUUIDHashForRemoveGet, ExaminesDataPartitionsOfSdDisksInByteOrder)
 {
-    MACHINE machine = MachineMake();
-    for (const char *const szDisk : {"sdb", "sda", "isdc", "nvme0n1", "mmcblk0", "vda", "xvda"}) {
-        DiskWithPartitionsAdd(machine, szDisk, 4);
-    }
+    MACHINE machine =
+        MachineWithDisks({"sdb", "sda", "isdc", "nvme0n1", "mmcblk0", "vda", "xvda"}, 4);
     MachinePartitionAdd(machine, "sda", 10, 9000000, 2048);
     MachinePartitionAdd(machine, "sda", 20, 9900000, 2048);
     MachineMdAdd(machine, {.nMd = 2});
@@ -269,39 +206,31 @@ TEST(RAIDUUIDHashForRemoveGet, ExaminesDataPartitionsOfSdDisksInByteOrder)
                       "uuid of " + szName);
         }
     };
-    (void)ExpectCall({.szName = "seven disks",
-                      .machine = machine,
-                      .call = [&body] { return MapFill(body); },
-                      .steps = steps});
+    Expect(
+        "seven disks", [&body] { return MapFill(body); }, 0, steps, machine);
 }
 
 TEST(RAIDUUIDHashForRemoveGet, LeavesOutWhatHasNoSuperblock)
 {
-    MACHINE machine = MachineMake();
-    DiskWithPartitionsAdd(machine, "sda", 6);
     const auto body = [](const NLIBHASH *pMap) {
         EXPECT_EQ(KeysOf(pMap), "/dev/sda6\n/dev/sda5\n"); // slots 2 and 17
         EXPECT_STREQ(NLIBCHashGet(pMap, "/dev/sda5"), ""); // a report, and no UUID in it
         EXPECT_STREQ(NLIBCHashGet(pMap, "/dev/sda6"), UUID_MD2);
     };
-    (void)ExpectCall(
-        {.szName = "four reports",
-         .machine = machine,
-         .call = [&body] { return MapFill(body); },
-         .steps = {ExaminedBlank("sda3"),
-                   {"/sbin/mdadm -E /dev/sda4",
-                    {.szOut = "UUID : half read\nDevice Role : Journal\nUUID : never\n"}},
-                   {"<11>raid_superblock.cpp:# bad device order format: 'Journal'."},
-                   {"/sbin/mdadm -E /dev/sda5", {.szOut = "   MBR Magic : aa55\n"}},
-                   Examined("sda6", UUID_MD2)}});
+    Expect(
+        "four reports", [&body] { return MapFill(body); }, 0,
+        {ExaminedBlank("sda3"),
+         {"/sbin/mdadm -E /dev/sda4",
+          {.szOut = "UUID : half read\nDevice Role : Journal\nUUID : never\n"}},
+         {"<11>raid_superblock.cpp:# bad device order format: 'Journal'."},
+         {"/sbin/mdadm -E /dev/sda5", {.szOut = "   MBR Magic : aa55\n"}},
+         Examined("sda6", UUID_MD2)},
+        MachineWithDisks({"sda"}, 6));
 }
 
 TEST(RAIDUUIDHashForRemoveGet, AddsToTheMapAndFollowsIt)
 {
-    MACHINE machine = MachineMake();
-    for (const char *const szDisk : {"sda", "sdb", "sdc", "sdd", "sde"}) {
-        DiskWithPartitionsAdd(machine, szDisk, 8);
-    }
+    MACHINE machine = MachineWithDisks({"sda", "sdb", "sdc", "sdd", "sde"}, 8);
     MachineTool(machine, "/sbin/mdadm -E *", {.szOut = ReportOf(UUID_MD2), .nTimes = 30});
     MachineCall(machine, [] {
         const auto body = [](const NLIBHASH *pMap) {
@@ -317,52 +246,46 @@ TEST(RAIDUUIDHashForRemoveGet, AddsToTheMapAndFollowsIt)
 
 TEST(RAIDUUIDHashForRemoveGet, TellsAMachineWithoutPartitionsFromAFailure)
 {
-    ExpectCalls(
-        {{.szName = "a map that refuses a pair",
-          .machine = MachineWithMirror(),
-          .call =
-              [] {
-                  PNLIBHASH pMap = nullptr;
-                  const int result = RAIDUUIDHashForRemoveGet(&pMap);
-                  EXPECT_EQ(pMap, nullptr);
-                  return result;
-              },
-          .steps = {Examined("sda3", UUID_MD2), Examined("sdb3", UUID_MD2)}},
-         {.szName = "no partitions",
-          .machine = WithFile(MachineMake(), "/proc/partitions", "\n"),
-          .call = MapFillNothing},
-         {.szName = "no list of the kernel",
-          .machine = Without(MachineMake(), "/proc/partitions"),
-          .call = MapFillNothing,
-          .result = -1,
-          .code = ERR_OPEN_FAILED,
-          .steps = {
-              {"<11>partition_enum.cpp:# Failed to read line of /proc/partitions, errno=0x900"},
-              {"<11>raid_remove.cpp:# Fail to enum partition path"}}}});
+    const auto refused = [] {
+        PNLIBHASH pMap = nullptr;
+        const int result = RAIDUUIDHashForRemoveGet(&pMap);
+        EXPECT_EQ(pMap, nullptr);
+        return result;
+    };
+    Expect("a map that refuses a pair", refused, 0,
+           {Examined("sda3", UUID_MD2), Examined("sdb3", UUID_MD2)});
+    Expect("no partitions", MapFillNothing, 0, {},
+           WithFile(MachineMake(), "/proc/partitions", "\n"));
+    Expect("no list of the kernel", MapFillNothing, -1,
+           {{"<11>partition_enum.cpp:# Failed to read line of /proc/partitions, errno=0x900"},
+            {"<11>raid_remove.cpp:# Fail to enum partition path"}},
+           Without(MachineMake(), "/proc/partitions"), ERR_OPEN_FAILED);
 }
 
 // ---- cleaning ----------------------------------------------------------------------------------
 
-long long Clean(const char *szUuid = UUID_MD2, PNLIBHASH pMap = nullptr)
+long long CleanBy(const char *szUuid, PNLIBHASH pMap)
 {
     const RAID_INFO info = {};
     return RAIDCleanSuperblock(&info, szUuid, pMap);
 }
 
+long long Clean()
+{
+    return CleanBy(UUID_MD2, nullptr);
+}
+
 // The home slots of sda3, sdb3, ... sdp3 are 16, 17, ... 31, and the last is slot 0 of 31.
 TEST(RAIDCleanSuperblock, WipesInTheOrderOfTheMap)
 {
-    MACHINE machine = MachineMake();
+    const std::vector<std::string> disks = {"sda", "sdb", "sdo", "sdp", "sdq"};
     STEPS steps;
-    for (const std::string szDisk : {"sda", "sdb", "sdo", "sdp", "sdq"}) {
-        DiskWithPartitionsAdd(machine, szDisk, 3);
+    for (const std::string &szDisk : disks) {
         steps.push_back(Examined(szDisk + "3", UUID_MD2));
     }
-    (void)ExpectCall({.szName = "five disks",
-                      .machine = machine,
-                      .call = [] { return Clean(); },
-                      .steps = steps + Wiped("sdp3") + Wiped("sdq3") + Wiped("sda3") +
-                               Wiped("sdb3") + Wiped("sdo3")});
+    Expect("five disks", Clean, 0,
+           steps + Wiped("sdp3") + Wiped("sdq3") + Wiped("sda3") + Wiped("sdb3") + Wiped("sdo3"),
+           MachineWithDisks(disks, 3));
 }
 
 // Twenty-five members: the table has grown to 119 slots, and the order is that of the new table.
@@ -370,8 +293,7 @@ TEST(RAIDCleanSuperblock, WipesEveryMemberOfALargeArray)
 {
     constexpr int ORDER[] = {15, 25, 11, 21, 18, 14, 24, 10, 20, 17, 27, 13, 23,
                              3,  4,  26, 6,  5,  8,  7,  16, 9,  12, 22, 19};
-    MACHINE machine = MachineMake();
-    DiskWithPartitionsAdd(machine, "sda", 27);
+    MACHINE machine = MachineWithDisks({"sda"}, 27);
     // The order of the questions is told elsewhere.
     MachineTool(machine, "/sbin/mdadm -E *", {.szOut = ReportOf(UUID_MD2), .nTimes = 25});
     STEPS wiped;
@@ -386,45 +308,34 @@ TEST(RAIDCleanSuperblock, WipesEveryMemberOfALargeArray)
 
 TEST(RAIDCleanSuperblock, ComparesWholeUuids)
 {
-    MACHINE machine = MachineMake();
-    DiskWithPartitionsAdd(machine, "sda", 8);
-    (void)ExpectCall(
-        {.szName = "six UUIDs",
-         .machine = machine,
-         .call = [] { return Clean("aa:bb"); },
-         .steps = STEPS{Examined("sda3", "aa:bb"), Examined("sda4", "aa:b"),
-                        Examined("sda5", "aa:bbb"), Examined("sda6", "AA:BB"), Examined("sda7", ""),
-                        Examined("sda8", "aa:bb (local to host box)")} +
-                  Wiped("sda8") + Wiped("sda3")}); // slots 3 and 16
+    Expect(
+        "six UUIDs", [] { return CleanBy("aa:bb", nullptr); }, 0,
+        STEPS{Examined("sda3", "aa:bb"), Examined("sda4", "aa:b"), Examined("sda5", "aa:bbb"),
+              Examined("sda6", "AA:BB"), Examined("sda7", ""),
+              Examined("sda8", "aa:bb (local to host box)")} +
+            Wiped("sda8") + Wiped("sda3"), // slots 3 and 16
+        MachineWithDisks({"sda"}, 8));
 }
 
 TEST(RAIDCleanSuperblock, AnEmptyUuidIsAValueLikeAnyOther)
 {
-    MACHINE machine = MachineMake();
-    DiskWithPartitionsAdd(machine, "sda", 5);
-    (void)ExpectCall(
-        {.szName = "no UUID",
-         .machine = machine,
-         .call = [] { return Clean(""); },
-         .steps = STEPS{Examined("sda3", UUID_MD2),
-                        {"/sbin/mdadm -E /dev/sda4", {.szOut = "   MBR Magic : aa55\n"}},
-                        ExaminedBlank("sda5")} +
-                  Wiped("sda4")});
+    Expect(
+        "no UUID", [] { return CleanBy("", nullptr); }, 0,
+        STEPS{Examined("sda3", UUID_MD2),
+              {"/sbin/mdadm -E /dev/sda4", {.szOut = "   MBR Magic : aa55\n"}},
+              ExaminedBlank("sda5")} +
+            Wiped("sda4"),
+        MachineWithDisks({"sda"}, 5));
 }
 
+// Slots 1, 16 and 17: the second of three.
 TEST(RAIDCleanSuperblock, AFailedWipeLeavesTheLaterOnesUntouched)
 {
-    MACHINE machine = MachineMake();
-    DiskWithPartitionsAdd(machine, "sda", 5);
-    // Slots 1, 16 and 17: the second of three.
-    (void)ExpectCall({.szName = "the second fails",
-                      .machine = machine,
-                      .call = [] { return Clean(); },
-                      .result = -1,
-                      .steps = STEPS{Examined("sda3", UUID_MD2), Examined("sda4", UUID_MD2),
-                                     Examined("sda5", UUID_MD2)} +
-                               Wiped("sda4") +
-                               WipeFailed("sda3", {.szErr = "mdadm: busy\n", .status = 1})});
+    Expect(
+        "the second fails", Clean, -1,
+        STEPS{Examined("sda3", UUID_MD2), Examined("sda4", UUID_MD2), Examined("sda5", UUID_MD2)} +
+            Wiped("sda4") + WipeFailed("sda3", {.szErr = "mdadm: busy\n", .status = 1}),
+        MachineWithDisks({"sda"}, 5));
     EXPECT_EQ(OperationErrors(),
               "Nov 05 01:02:03 command=\"/sbin/mdadm --zero-superblock /dev/sda3\" "
               "Error=\"mdadm: busy \"\n");
@@ -434,59 +345,47 @@ TEST(RAIDCleanSuperblock, TakesTheCallersMapAndLeavesItToHim)
 {
     const auto cleanBy = [] {
         PNLIBHASH pMap = MapOf({{"/dev/sda3", UUID_MD3}, {"/dev/sdb3", UUID_MD2}});
-        const long long result = Clean(UUID_MD2, pMap);
+        const long long result = CleanBy(UUID_MD2, pMap);
         EXPECT_EQ(KeysOf(pMap), "/dev/sda3\n/dev/sdb3\n");
         NLIBCHashFree(pMap);
         return result;
     };
     const auto cleanByEmpty = [] {
-        PNLIBHASH pMap = NLIBCHashAlloc(512);
-        const long long result = Clean(UUID_MD2, pMap);
+        PNLIBHASH pMap = MapOf({});
+        const long long result = CleanBy(UUID_MD2, pMap);
         NLIBCHashFree(pMap);
         return result;
     };
-    ExpectCalls({{.szName = "a map of two",
-                  .machine = MachineWithMirror(),
-                  .call = cleanBy,
-                  .steps = Wiped("sdb3")},
-                 {.szName = "an empty map", .machine = MachineWithMirror(), .call = cleanByEmpty}});
+    Expect("a map of two", cleanBy, 0, Wiped("sdb3"));
+    Expect("an empty map", cleanByEmpty, 0, {});
+}
+
+// A map or list that cannot be had, and what says so.
+void ExpectNoMemory(const char *szFault, const std::function<long long()> &call,
+                    const MACHINE_FAULT &fault, const char *szTold)
+{
+    Expect(szFault, call, -1, {{szFault}, {std::string("<11>raid_remove.cpp:# Fail to ") + szTold}},
+           WithFault(MachineWithMirror(), fault), ERR_OUT_OF_MEMORY);
 }
 
 TEST(RAIDCleanSuperblock, FailsWhenListOrMapCannotBeMadeOrFilled)
 {
+    Expect("no partitions", Clean, -1,
+           {{"<11>partition_enum.cpp:# There's no line in /proc/partitions"},
+            {"<11>raid_remove.cpp:# Fail to enum partition path"},
+            {"<11>raid_remove.cpp:# Fail to get RAID UUID hash"}},
+           WithFile(MachineMake(), "/proc/partitions", ""));
+    ExpectNoMemory("fault malloc 1", Clean, {.szFunction = "malloc"}, "alloc RAID UUID list");
+    ExpectNoMemory("fault calloc 1", Clean, {.szFunction = "calloc"}, "alloc RAID UUID hash");
+
     PNLIBHASH pMap = MapOf({{std::string(300, 'a'), UUID_MD2}, {std::string(300, 'b'), UUID_MD2}});
-    ExpectCalls(
-        {{.szName = "no partitions",
-          .machine = WithFile(MachineMake(), "/proc/partitions", ""),
-          .call = [] { return Clean(); },
-          .result = -1,
-          .steps = {{"<11>partition_enum.cpp:# There's no line in /proc/partitions"},
-                    {"<11>raid_remove.cpp:# Fail to enum partition path"},
-                    {"<11>raid_remove.cpp:# Fail to get RAID UUID hash"}}},
-         {.szName = "no list",
-          .machine = WithFault(MachineWithMirror(), {.szFunction = "malloc"}),
-          .call = [] { return Clean(); },
-          .result = -1,
-          .code = ERR_OUT_OF_MEMORY,
-          .steps = {{"fault malloc 1"}, {"<11>raid_remove.cpp:# Fail to alloc RAID UUID list"}}},
-         {.szName = "no map",
-          .machine = WithFault(MachineWithMirror(), {.szFunction = "calloc"}),
-          .call = [] { return Clean(); },
-          .result = -1,
-          .code = ERR_OUT_OF_MEMORY,
-          .steps = {{"fault calloc 1"}, {"<11>raid_remove.cpp:# Fail to alloc RAID UUID hash"}}},
-         {.szName = "no list of the map's own",
-          .machine = WithFault(MachineWithMirror(), {.szFunction = "malloc"}),
-          .call = [&pMap] { return RAIDUUIDHashForRemoveGet(&pMap); },
-          .result = -1,
-          .code = ERR_OUT_OF_MEMORY,
-          .steps = {{"fault malloc 1"}, {"<11>raid_remove.cpp:# Fail to alloc RAID UUID list"}}},
-         {.szName = "keys that do not fit", // the first is the list itself
-          .machine = WithFault(MachineMake(), {.szFunction = "malloc", .nCall = 2}),
-          .call = [pMap] { return Clean(UUID_MD2, pMap); },
-          .result = -1,
-          .code = ERR_OUT_OF_MEMORY,
-          .steps = {{"fault malloc 2"}, {"<11>raid_remove.cpp:# Fail to get hash key list"}}}});
+    ExpectNoMemory(
+        "fault malloc 1", [&pMap] { return RAIDUUIDHashForRemoveGet(&pMap); },
+        {.szFunction = "malloc"}, "alloc RAID UUID list");
+    // Keys that do not fit; the first is the list itself.
+    ExpectNoMemory(
+        "fault malloc 2", [pMap] { return CleanBy(UUID_MD2, pMap); },
+        {.szFunction = "malloc", .nCall = 2}, "get hash key list");
     EXPECT_EQ(pMap->nEntry, 2);
     NLIBCHashFree(pMap);
 }
@@ -498,16 +397,9 @@ void ExpectRemoval(const char *szName, const STEPS &steps, const std::string &sz
                    int result = 0, const MACHINE &machine = MachineWithMirror(),
                    u32 code = OLD_CODE)
 {
-    const auto call = [&szUuid] {
-        const RAID_INFO info = RecordOf("/dev/md2", szUuid);
-        return RAIDRemoveByInfo(&info);
-    };
-    (void)ExpectCall({.szName = szName,
-                      .machine = machine,
-                      .call = call,
-                      .result = result,
-                      .code = code,
-                      .steps = steps});
+    const RAID_INFO info = RecordOf("/dev/md2", szUuid);
+    Expect(
+        szName, [&info] { return RAIDRemoveByInfo(&info); }, result, steps, machine, code);
 }
 
 TEST(RAIDRemove, StopsThenCleans)
@@ -537,11 +429,8 @@ TEST(RAIDRemove, TakesTheCallersMapAndLeavesItToHim)
         NLIBCHashFree(pMap);
         return result;
     };
-    (void)ExpectCall(
-        {.szName = "for the UUID alone",
-         .machine = MachineWithMirror(),
-         .call = call,
-         .steps = STEPS{Examined("sdb3", UUID_MD2), {STOP_MD2}, CLEAN_TOLD} + Wiped("sdz9")});
+    Expect("for the UUID alone", call, 0,
+           STEPS{Examined("sdb3", UUID_MD2), {STOP_MD2}, CLEAN_TOLD} + Wiped("sdz9"));
 }
 
 TEST(RAIDRemove, AStopIsTriedThreeTimes)
@@ -562,13 +451,8 @@ TEST(RAIDRemove, WithoutAUuidItOnlyStops)
                    {"<11>raid_remove.cpp:# Disk [/dev/sdb3] in RAID [/dev/md2] has no RAID "
                     "superblock, ret=0"},
                    {STOP_MD2}});
-    MACHINE machine = MachineMake();
-    DiskWithPartitionsAdd(machine, "sda", 3);
-    ExpectRemoval("an array that does not run",
-                  {{"<15>raid_info.cpp:# Failed to open /dev/md2, errno=No such file or directory"},
-                   {"<11>raid_remove.cpp:# Failed to get RAID info [/dev/md2], ret = -1"},
-                   {STOP_MD2}},
-                  "", 0, machine, ERR_OPEN_FAILED);
+    ExpectRemoval("an array that does not run", {NO_MD2, NO_INFO, {STOP_MD2}}, "", 0,
+                  MachineWithDisks({"sda"}, 3), ERR_OPEN_FAILED);
 }
 
 TEST(RAIDRemove, AnEmptyUuidThatWasReadIsCleanedToo)
@@ -590,16 +474,17 @@ TEST(RAIDRemove, ACleaningThatFailsIsNoFailure)
 
 TEST(RAIDRemove, MembersOfOtherArraysAreLeftAlone)
 {
-    MACHINE machine = MachineMake();
-    STEPS steps = {{STOP_MD2}, CLEAN_TOLD};
-    for (const std::string szDisk : {"sda", "sdb"}) {
-        DiskWithPartitionsAdd(machine, szDisk, 5);
-        steps = steps + STEPS{Examined(szDisk + "3", UUID_MD2), Examined(szDisk + "4", UUID_MD3),
-                              Examined(szDisk + "5", UUID_MD2)};
-    }
     ExpectRemoval("two arrays",
-                  steps + Wiped("sda3") + Wiped("sda5") + Wiped("sdb3") + Wiped("sdb5"), UUID_MD2,
-                  0, machine);
+                  STEPS{{STOP_MD2},
+                        CLEAN_TOLD,
+                        Examined("sda3", UUID_MD2),
+                        Examined("sda4", UUID_MD3),
+                        Examined("sda5", UUID_MD2),
+                        Examined("sdb3", UUID_MD2),
+                        Examined("sdb4", UUID_MD3),
+                        Examined("sdb5", UUID_MD2)} +
+                      Wiped("sda3") + Wiped("sda5") + Wiped("sdb3") + Wiped("sdb5"),
+                  UUID_MD2, 0, MachineWithDisks({"sda", "sdb"}, 5));
 }
 
 } // namespace

@@ -75,12 +75,20 @@ inline void DiskWithPartitionsAdd(MACHINE &machine, const std::string &szDisk, i
     }
 }
 
+// Disks of so many partitions each.
+inline MACHINE MachineWithDisks(const std::vector<std::string> &disks, int nPartition)
+{
+    MACHINE machine = MachineMake();
+    for (const std::string &szDisk : disks) {
+        DiskWithPartitionsAdd(machine, szDisk, nPartition);
+    }
+    return machine;
+}
+
 // Two disks with three partitions, md2 on the third of each.
 inline MACHINE MachineWithMirror()
 {
-    MACHINE machine = MachineMake();
-    DiskWithPartitionsAdd(machine, "sda", 3);
-    DiskWithPartitionsAdd(machine, "sdb", 3);
+    MACHINE machine = MachineWithDisks({"sda", "sdb"}, 3);
     MachineMdAdd(machine, {.nMd = 2, .members = {{"sda3"}, {"sdb3", "in_sync\n", "1\n"}}});
     return machine;
 }
