@@ -2,6 +2,7 @@
 #include "nurostoragecore/lvm.h"
 
 #include "removal_machine.h"
+#include "streams.h"
 
 #include <cerrno>
 #include <climits>
@@ -15,132 +16,125 @@
 namespace
 {
 
-constexpr char PVS[] = "/sbin/pvs -o pv_name,vg_name,lv_name,origin --noheading --separator :";
-
-// What pvs lists, with the two blanks that it sets in front.
-MACHINE MachineWithRows(const std::string &szRows)
+void Expect(const char *szName, const std::function<long long()> &call, const STEPS &steps,
+            const MACHINE &machine = MachineMake(), u32 code = OLD_CODE, int result = 0)
 {
-    MACHINE machine = MachineMake();
-    MachineTool(machine, PVS, {.szOut = szRows});
-    return machine;
+    (void)ExpectCall({szName, machine, call, result, code, steps});
 }
 
 // ---- looking it up -----------------------------------------------------------------------------
 
 struct ROW_CASE {
     const char *szRows;
-    int result;
-    const char *szPath;
-    const char *szLog;
+    const char *szPath; // NO_PATH: it fails
+    STEPS told = {};
 };
 
 constexpr char NO_PATH[] = "before";
 
-constexpr ROW_CASE ROW_CASES[] = {
-    {"  /dev/md2:vg1:lv1:\n", 0, "/dev/vg1/lv1", ""},
-    {"  /dev/md2:vg1:lv1:origin\n", 0, "/dev/vg1/lv1", ""},
-    {"  /dev/md2:vg1:lv1:a:b:c\n", 0, "/dev/vg1/lv1", ""},
-    {"  /dev/md2:vg1:lv1:", 0, "/dev/vg1/lv1", ""},
-    {"  /dev/sda5:vg0:root:\n  /dev/md2:vg1:lv1:\n  /dev/sdb5:vg0:home:\n", 0, "/dev/vg1/lv1", ""},
+const ROW_CASE ROW_CASES[] = {
+    {"  /dev/md2:vg1:lv1:\n", "/dev/vg1/lv1"},
+    {"  /dev/md2:vg1:lv1:origin\n", "/dev/vg1/lv1"},
+    {"  /dev/md2:vg1:lv1:a:b:c\n", "/dev/vg1/lv1"},
+    {"  /dev/md2:vg1:lv1:", "/dev/vg1/lv1"},
+    {"  /dev/sda5:vg0:root:\n  /dev/md2:vg1:lv1:\n  /dev/sdb5:vg0:home:\n", "/dev/vg1/lv1"},
     // Of several volumes the last one counts, and free space is a row too.
-    {"  /dev/md2:vg1:lv1:\n  /dev/md2:vg1:lv2:\n", 0, "/dev/vg1/lv2", ""},
-    {"  /dev/md2:vg1:lv2:\n  /dev/md2:vg1:lv1:\n", 0, "/dev/vg1/lv1", ""},
-    {"  /dev/md2:vg1:lv1:\n  /dev/md2:vg1::\n", 0, "/dev/vg1/", ""},
-    {"  /dev/md2:::\n", 0, "/dev//", ""},
-    {"  /dev/md2:vg1:lv1:\n  /dev/md2\n", -1, NO_PATH,
-     "<11>lvm.cpp:# Invalid pvs result [  /dev/md2\n]. separator ':' not found\n"},
+    {"  /dev/md2:vg1:lv1:\n  /dev/md2:vg1:lv2:\n", "/dev/vg1/lv2"},
+    {"  /dev/md2:vg1:lv2:\n  /dev/md2:vg1:lv1:\n", "/dev/vg1/lv1"},
+    {"  /dev/md2:vg1:lv1:\n  /dev/md2:vg1::\n", "/dev/vg1/"},
+    {"  /dev/md2:::\n", "/dev//"},
+    {"  /dev/md2:vg1:lv1:\n  /dev/md2\n",
+     NO_PATH,
+     {{"<11>lvm.cpp:# Invalid pvs result [  /dev/md2\n]. separator ':' not found"}}},
     // Anywhere in the row.
-    {"  /dev/md20:vg20:lv20:\n", 0, "/dev/vg20/lv20", ""},
-    {"  /dev/md2:vg1:lv1:\n  /dev/md21:vg21:lv21:\n", 0, "/dev/vg21/lv21", ""},
-    {"  /dev/sda5:vg0:lv0:/dev/md2\n", 0, "/dev/vg0/lv0", ""},
+    {"  /dev/md20:vg20:lv20:\n", "/dev/vg20/lv20"},
+    {"  /dev/md2:vg1:lv1:\n  /dev/md21:vg21:lv21:\n", "/dev/vg21/lv21"},
+    {"  /dev/sda5:vg0:lv0:/dev/md2\n", "/dev/vg0/lv0"},
     // None.
-    {"", -1, NO_PATH, ""},
-    {"\n", -1, NO_PATH, ""},
-    {"  /dev/md1:vg1:lv1:\n  /dev/sda5:vg0:root:\n", -1, NO_PATH, ""},
-    {"  /dev/MD2:vg1:lv1:\n", -1, NO_PATH, ""},
+    {"", NO_PATH},
+    {"\n", NO_PATH},
+    {"  /dev/md1:vg1:lv1:\n  /dev/sda5:vg0:root:\n", NO_PATH},
+    {"  /dev/MD2:vg1:lv1:\n", NO_PATH},
     // Rows that are cut short.
-    {"  /dev/md2\n", -1, NO_PATH,
-     "<11>lvm.cpp:# Invalid pvs result [  /dev/md2\n]. separator ':' not found\n"},
-    {"  /dev/md2", -1, NO_PATH,
-     "<11>lvm.cpp:# Invalid pvs result [  /dev/md2]. separator ':' not found\n"},
-    {"  /dev/md2:vg1\n", -1, NO_PATH, "<11>lvm.cpp:# pvg=vg1\n\n"},
-    {"  /dev/md2:", -1, NO_PATH, "<11>lvm.cpp:# pvg=\n"},
-    {"  /dev/md2:vg1:lv1\n", -1, NO_PATH, "<11>lvm.cpp:# plv=lv1\n\n"},
-    {"  /dev/md2:vg1:", -1, NO_PATH, "<11>lvm.cpp:# plv=\n"},
+    {"  /dev/md2\n",
+     NO_PATH,
+     {{"<11>lvm.cpp:# Invalid pvs result [  /dev/md2\n]. separator ':' not found"}}},
+    {"  /dev/md2",
+     NO_PATH,
+     {{"<11>lvm.cpp:# Invalid pvs result [  /dev/md2]. separator ':' not found"}}},
+    {"  /dev/md2:vg1\n", NO_PATH, {{"<11>lvm.cpp:# pvg=vg1\n"}}},
+    {"  /dev/md2:", NO_PATH, {{"<11>lvm.cpp:# pvg="}}},
+    {"  /dev/md2:vg1:lv1\n", NO_PATH, {{"<11>lvm.cpp:# plv=lv1\n"}}},
+    {"  /dev/md2:vg1:", NO_PATH, {{"<11>lvm.cpp:# plv="}}},
 };
+
+// The device's volume, in a buffer of so many bytes; what is behind them stays, and no stream is
+// left open.
+long long PathGet(const char *szExpected, int cbPath = 256)
+{
+    openlog(nullptr, LOG_NDELAY, LOG_USER); // so that the log takes no new descriptor
+    const int nOpen = DescriptorsCount();
+    char szPath[257] = "before";
+    szPath[cbPath] = 'x';
+    const int result = LVMGetLVPath("/dev/md2", szPath, cbPath);
+    EXPECT_EQ(szPath[cbPath], 'x');
+    EXPECT_STREQ(szPath, szExpected);
+    EXPECT_EQ(DescriptorsCount(), nOpen);
+    return result;
+}
 
 TEST(LVMGetLVPath, IsThatOfTheLastRowWithTheDevice)
 {
     for (const ROW_CASE &row : ROW_CASES) {
-        const RUN_RESULT result = MachineCall(MachineWithRows(row.szRows), [&row] {
-            char szPath[256] = "before";
-            RecordReset();
-            EXPECT_EQ(LVMGetLVPath("/dev/md2", szPath, sizeof(szPath)), row.result) << row.szRows;
-            EXPECT_STREQ(szPath, row.szPath) << row.szRows;
-            EXPECT_EQ(NLIBCErrGet(), OLD_CODE) << row.szRows;
-        });
-        EXPECT_EQ(LogText(result), row.szLog) << row.szRows;
-        EXPECT_EQ(TranscriptText(result), std::string(PVS) + "\n");
+        Expect(
+            row.szRows, [&row] { return PathGet(row.szPath); }, Pvs(row.szRows) + row.told,
+            MachineMake(), OLD_CODE, row.szPath == NO_PATH ? -1 : 0);
     }
 }
 
 // As many as 1023 characters, the last separator among them, and a longer row comes in pieces.
 TEST(LVMGetLVPath, ARowMayFillTheWholeLine)
 {
-    const std::string szRow = "/dev/md2:vg1:lv1:";
     const struct {
         size_t nBlank;
+        const char *szPath;
         int result;
-    } cases[] = {{1023 - szRow.size(), 0}, {1019, -1}, {1023, 0}};
+    } cases[] = {{1006, "/dev/vg1/lv1", 0}, {1019, NO_PATH, -1}, {1023, "/dev/vg1/lv1", 0}};
     for (const auto &row : cases) {
-        SCOPED_TRACE(row.nBlank);
-        MachineCall(MachineWithRows(std::string(row.nBlank, ' ') + szRow + "origin\n"), [&row] {
-            char szPath[256] = "before";
-            EXPECT_EQ(LVMGetLVPath("/dev/md2", szPath, sizeof(szPath)), row.result);
-            EXPECT_STREQ(szPath, row.result == 0 ? "/dev/vg1/lv1" : "before");
-        });
+        Expect(
+            "blanks before it", [&row] { return PathGet(row.szPath); },
+            Pvs(std::string(row.nBlank, ' ') + "/dev/md2:vg1:lv1:origin\n"), MachineMake(),
+            OLD_CODE, row.result);
     }
 }
 
 TEST(LVMGetLVPath, IsCutToTheBuffer)
 {
-    MachineCall(MachineWithRows("  /dev/md2:vg1:lv1:\n"), [] {
-        char szPath[16] = "xxxxxxxxxxxxxxx";
-        EXPECT_EQ(LVMGetLVPath("/dev/md2", szPath, 8), 0);
-        EXPECT_STREQ(szPath, "/dev/vg");
-        EXPECT_EQ(szPath[8], 'x');
-    });
+    Expect(
+        "8 bytes", [] { return PathGet("/dev/vg", 8); }, Pvs(ROW_MD2));
 }
 
 TEST(LVMGetLVPath, BadArgumentsRunNothing)
 {
-    const RUN_RESULT result = MachineCall(MachineMake(), [] {
+    IdleCall(MachineMake(), [] {
         char szPath[256] = "before";
-        RecordReset();
-        EXPECT_EQ(LVMGetLVPath(nullptr, szPath, sizeof(szPath)), -1);
-        EXPECT_EQ(LVMGetLVPath("/dev/md2", nullptr, sizeof(szPath)), -1);
-        EXPECT_EQ(LVMGetLVPath("/dev/md2", szPath, 0), -1);
-        EXPECT_EQ(LVMGetLVPath("/dev/md2", szPath, -1), -1);
-        EXPECT_EQ(LVMGetLVPath("/dev/md2", szPath, INT_MIN), -1);
-        EXPECT_EQ(LVMRmLVPath(nullptr), -1);
+        EXPECT_QUIET(LVMGetLVPath(nullptr, szPath, sizeof(szPath)), -1);
+        EXPECT_QUIET(LVMGetLVPath("/dev/md2", nullptr, sizeof(szPath)), -1);
+        EXPECT_QUIET(LVMGetLVPath("/dev/md2", szPath, 0), -1);
+        EXPECT_QUIET(LVMGetLVPath("/dev/md2", szPath, -1), -1);
+        EXPECT_QUIET(LVMGetLVPath("/dev/md2", szPath, INT_MIN), -1);
+        EXPECT_QUIET(LVMRmLVPath(nullptr), -1);
         EXPECT_STREQ(szPath, "before");
-        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
     });
-    EXPECT_EQ(OrderText(result), "");
 }
 
 TEST(LVMGetLVPath, WarningsAndTheStatusAreNotAsked)
 {
-    MACHINE machine = MachineMake();
-    MachineTool(machine, PVS,
-                {.szOut = "  /dev/md2:vg1:lv1:\n",
-                 .szErr = "  WARNING: /dev/md2:wrong:wrong: is missing\n",
-                 .status = 5});
-    const RUN_RESULT result = MachineCall(machine, [] {
-        char szPath[256] = "";
-        EXPECT_EQ(LVMGetLVPath("/dev/md2", szPath, sizeof(szPath)), 0);
-        EXPECT_STREQ(szPath, "/dev/vg1/lv1");
-    });
+    STEPS steps = Pvs(ROW_MD2);
+    steps[0].answer.szErr = "  WARNING: /dev/md2:wrong:wrong: is missing\n";
+    steps[0].answer.status = 5;
+    const RUN_RESULT result = ExpectCall(
+        {.szName = "a warning", .call = [] { return PathGet("/dev/vg1/lv1"); }, .steps = steps});
     EXPECT_EQ(OperationErrors(), "");
     ASSERT_EQ(result.events.size(), 1U);
     EXPECT_TRUE(result.events[0].fNullInput);
@@ -148,124 +142,65 @@ TEST(LVMGetLVPath, WarningsAndTheStatusAreNotAsked)
     EXPECT_EQ(result.events[0].nDescriptors, 0);
 }
 
-TEST(LVMGetLVPath, TheStreamIsClosedOnEveryWayOut)
-{
-    for (const char *const szRows : {"", "  /dev/md2\n", "  /dev/md2:vg1\n", "  /dev/md2:vg1:lv1\n",
-                                     "  /dev/md2:vg1:lv1:\n"}) {
-        MachineCall(MachineWithRows(szRows), [] {
-            openlog(nullptr, LOG_NDELAY, LOG_USER); // so that the log takes no new descriptor
-            const int fdBefore = dup(STDIN_FILENO);
-            char szPath[256] = "";
-            (void)LVMGetLVPath("/dev/md2", szPath, sizeof(szPath));
-            EXPECT_EQ(dup(STDIN_FILENO), fdBefore + 1);
-        });
-    }
-}
-
-TEST(LVMGetLVPath, ACommandThatCannotBeStartedIsTold)
-{
-    MACHINE machine = MachineMake();
-    machine.faults = {{.szFunction = "pipe2", .error = EMFILE, .fGoOn = true}};
-    const RUN_RESULT result = MachineCall(machine, [] {
-        char szPath[256] = "before";
-        RecordReset();
-        EXPECT_EQ(LVMGetLVPath("/dev/md2", szPath, sizeof(szPath)), -1);
-        EXPECT_STREQ(szPath, "before");
-        EXPECT_EQ(NLIBCErrGet(), ERR_PIPE_FAILED);
-        RecordReset();
-        EXPECT_EQ(LVMRmLVPath("/dev/md2"), 0); // as if there was none
-        EXPECT_EQ(NLIBCErrGet(), ERR_PIPE_FAILED);
-    });
-    const std::string szTold = "<11>lvm.cpp:# Fail to do [/sbin/pvs -o "
-                               "pv_name,vg_name,lv_name,origin --noheading --separator :]\n";
-    EXPECT_EQ(LogText(result), szTold + szTold);
-}
-
-// ---- taking it down ----------------------------------------------------------------------------
-
-constexpr char ROW_MD2[] = "  /dev/md2:vg1:lv1:\n";
-
-STEPS Pvs(const std::string &szRows)
-{
-    return {{PVS, {.szOut = szRows}}};
-}
-
-const STEP LV_FAILED = {"<11>lvm.cpp:# Failed to /sbin/lvremove -f /dev/vg1/lv1"};
-const STEP VG_FAILED = {"<11>lvm.cpp:# Failed to /sbin/vgremove -f /dev/vg1"};
-const STEP PV_FAILED = {"<11>lvm.cpp:# Failed to /sbin/pvremove -f /dev/md2"};
-const STEPS REMOVED = {{"/sbin/lvremove -f /dev/vg1/lv1"},
-                       {"/sbin/vgremove -f /dev/vg1"},
-                       {"/sbin/pvremove -f /dev/md2"}};
-
 long long Remove()
 {
     return LVMRmLVPath("/dev/md2");
 }
 
+TEST(LVMGetLVPath, ACommandThatCannotBeStartedIsTold)
+{
+    const MACHINE machine = WithFault(MachineMake(), {.szFunction = "pipe2", .error = EMFILE});
+    const STEPS steps = {{"fault pipe2 1"},
+                         {"<11>lvm.cpp:# Fail to do [/sbin/pvs -o "
+                          "pv_name,vg_name,lv_name,origin --noheading --separator :]"}};
+    Expect(
+        "no path", [] { return PathGet(NO_PATH); }, steps, machine, ERR_PIPE_FAILED, -1);
+    Expect("as if there was none", Remove, steps, machine, ERR_PIPE_FAILED);
+}
+
+// ---- taking it down ----------------------------------------------------------------------------
+
 TEST(LVMRmLVPath, WithoutAWholeRowNothingIsRun)
 {
-    ExpectCalls({{.szName = "no row", .call = Remove, .steps = Pvs("")},
-                 {.szName = "another device",
-                  .call = Remove,
-                  .steps = Pvs("  /dev/md1:vg1:lv1:\n  /dev/sdb5:vg0:root:\n")},
-                 {.szName = "a broken row",
-                  .call = Remove,
-                  .steps = Pvs("  /dev/md2:vg1\n") + STEPS{{"<11>lvm.cpp:# pvg=vg1\n"}}},
-                 {.szName = "no tool",
-                  .machine = WithTool(MachineMake(), "/sbin/pvs", TOOL_KIND::MISSING),
-                  .call = Remove},
-                 {.szName = "no mount table",
-                  .machine = Without(MachineMake(), "/proc/mounts"),
-                  .call = Remove,
-                  .result = -1,
-                  .steps = Pvs(ROW_MD2) + STEPS{{"<11>lvm.cpp:# Failed to open /proc/mounts"}}}});
+    Expect("no row", Remove, Pvs(""));
+    Expect("another device", Remove, Pvs("  /dev/md1:vg1:lv1:\n  /dev/sdb5:vg0:root:\n"));
+    Expect("a broken row", Remove, Pvs("  /dev/md2:vg1\n") + STEPS{{"<11>lvm.cpp:# pvg=vg1\n"}});
+    Expect("no tool", Remove, {}, WithTool(MachineMake(), "/sbin/pvs", TOOL_KIND::MISSING));
+    Expect("no mount table", Remove,
+           Pvs(ROW_MD2) + STEPS{{"<11>lvm.cpp:# Failed to open /proc/mounts"}},
+           Without(MachineMake(), "/proc/mounts"), OLD_CODE, -1);
 }
 
 TEST(LVMRmLVPath, RemovesVolumeGroupAndPhysicalVolume)
 {
-    ExpectCalls(
-        {{.szName = "a volume", .call = Remove, .steps = Pvs(ROW_MD2) + REMOVED},
-         // A group with free space has no volume in its last row.
-         {.szName = "free space",
-          .call = Remove,
-          .steps = Pvs("  /dev/md2:vg1:lv1:\n  /dev/md2:vg1::\n") +
-                   STEPS{{"/sbin/lvremove -f /dev/vg1/"},
-                         {"/sbin/vgremove -f /dev/vg1"},
-                         {"/sbin/pvremove -f /dev/md2"}}},
-         // A longer number is taken for the device.
-         {.szName = "md20",
-          .call = Remove,
-          .steps = Pvs("  /dev/md20:vg20:lv20:\n") + STEPS{{"/sbin/lvremove -f /dev/vg20/lv20"},
-                                                           {"/sbin/vgremove -f /dev/vg20"},
-                                                           {"/sbin/pvremove -f /dev/md2"}}}});
+    Expect("a volume", Remove, Pvs(ROW_MD2) + LVM_REMOVED);
+    Expect("free space, so the last row has no volume", Remove,
+           Pvs("  /dev/md2:vg1:lv1:\n  /dev/md2:vg1::\n") +
+               STEPS{{"/sbin/lvremove -f /dev/vg1/"}, VG_REMOVED, PV_REMOVED});
+    Expect("a longer number is taken for the device", Remove,
+           Pvs("  /dev/md20:vg20:lv20:\n") + STEPS{{"/sbin/lvremove -f /dev/vg20/lv20"},
+                                                   {"/sbin/vgremove -f /dev/vg20"},
+                                                   PV_REMOVED});
 }
 
 TEST(LVMRmLVPath, EveryFailureIsToldAndNoneEndsIt)
 {
     MACHINE missing = MachineMake();
-    for (const char *const szTool : {"/sbin/lvremove", "/sbin/vgremove", "/sbin/pvremove"}) {
-        missing.tools[szTool] = TOOL_KIND::MISSING;
+    STEPS told;
+    for (const STEP &step : LVM_REMOVED) {
+        missing.tools[step.szText.substr(0, step.szText.find(' '))] = TOOL_KIND::MISSING;
+        told.push_back(RemoverFailed(step, {})[1]);
     }
-    ExpectCalls(
-        {{.szName = "missing tools",
-          .machine = missing,
-          .call = Remove,
-          .steps = Pvs(ROW_MD2) + STEPS{LV_FAILED, VG_FAILED, PV_FAILED}},
-         // What the runner could not even start it has on record itself.
-         {.szName = "no pipe",
-          .machine = WithFault(MachineMake(),
-                               {.szFunction = "pipe2", .nCall = 2, .error = EMFILE, .fGoOn = true}),
-          .call = Remove,
-          .code = ERR_BAD_PARAMETER,
-          .steps = Pvs(ROW_MD2) + STEPS{{"fault pipe2 2"}, {"fault pipe2 3"}, {"fault pipe2 4"}}},
-         {.szName = "each in its way",
-          .call = Remove,
-          .steps = Pvs(ROW_MD2) + STEPS{{REMOVED[0].szText, {.szErr = "  in use\n", .status = 5}},
-                                        LV_FAILED,
-                                        {REMOVED[1].szText, {.status = 1}},
-                                        VG_FAILED,
-                                        {REMOVED[2].szText, {.signal = 9}},
-                                        PV_FAILED}}});
+    Expect("missing tools", Remove, Pvs(ROW_MD2) + told, missing);
+    // What the runner could not even start it has on record itself.
+    Expect("no pipe", Remove,
+           Pvs(ROW_MD2) + STEPS{{"fault pipe2 2"}, {"fault pipe2 3"}, {"fault pipe2 4"}},
+           WithFault(MachineMake(),
+                     {.szFunction = "pipe2", .nCall = 2, .error = EMFILE, .fGoOn = true}),
+           ERR_BAD_PARAMETER);
+    Expect("each in its way", Remove,
+           Pvs(ROW_MD2) + RemoversFailed({.szErr = "  in use\n", .status = 5}, {.status = 1},
+                                         {.signal = SIGKILL}));
     EXPECT_EQ(OperationErrors(),
               "Nov 05 01:02:03 command=\"/sbin/lvremove -f /dev/vg1/lv1\" Error=\"  in use \"\n");
 }
@@ -287,16 +222,13 @@ void ExpectMounts(const char *szName, const std::string &szMounts,
         MachineFolder(machine, szFolder);
     }
     const auto call = [&folders] {
-        const int result = LVMRmLVPath("/dev/md2");
+        const long long result = Remove();
         for (const std::string &szFolder : folders) {
             EXPECT_EQ(access(szFolder.c_str(), F_OK), szFolder == "/stays" ? 0 : -1) << szFolder;
         }
         return result;
     };
-    (void)ExpectCall({.szName = szName,
-                      .machine = machine,
-                      .call = call,
-                      .steps = Pvs(ROW_MD2) + steps + REMOVED});
+    Expect(szName, call, Pvs(ROW_MD2) + steps + LVM_REMOVED, machine);
 }
 
 TEST(LVMRmLVPath, UnmountsInTheOrderOfTheTable)
@@ -339,9 +271,9 @@ TEST(LVMRmLVPath, EscapesOfTheTableAreRead)
         WithFile(MachineMake(), "/proc/mounts", "/dev/vg1/lv1s1 /my\\040volume ext4 rw 0 0\n");
     MachineFolder(machine, "/my volume");
     MachineTool(machine, {"/bin/umount", "-R", "-A", "-k", "/my volume"});
-    StepsExpect(machine, Pvs(ROW_MD2) + STEPS{{"/sbin/lvremove -f /dev/vg1/lv1s1"}} + REMOVED);
+    StepsExpect(machine, Pvs(ROW_MD2) + STEPS{{"/sbin/lvremove -f /dev/vg1/lv1s1"}} + LVM_REMOVED);
     QuietCall(machine, [] {
-        EXPECT_EQ(LVMRmLVPath("/dev/md2"), 0);
+        EXPECT_EQ(Remove(), 0);
         EXPECT_EQ(access("/my volume", F_OK), -1);
     });
 }
@@ -350,13 +282,10 @@ TEST(LVMRmLVPath, EmptyFieldsAreTakenAsTheyAre)
 {
     MACHINE machine = WithFile(MachineMake(), "/proc/mounts", "/dev//s1 /volume1 ext4 rw 0 0\n");
     MachineFolder(machine, "/volume1");
-    (void)ExpectCall({.szName = "no group, no volume",
-                      .machine = machine,
-                      .call = Remove,
-                      .steps = Pvs("  /dev/md2:::\n") + Unmounted("/dev//s1", "/volume1") +
-                               STEPS{{"/sbin/lvremove -f /dev//"},
-                                     {"/sbin/vgremove -f /dev/"},
-                                     {"/sbin/pvremove -f /dev/md2"}}});
+    Expect("no group, no volume", Remove,
+           Pvs("  /dev/md2:::\n") + Unmounted("/dev//s1", "/volume1") +
+               STEPS{{"/sbin/lvremove -f /dev//"}, {"/sbin/vgremove -f /dev/"}, PV_REMOVED},
+           machine);
 }
 
 // Of a longer path the first 255 characters are the volume, and the "s" comes behind them.
@@ -369,15 +298,11 @@ TEST(LVMRmLVPath, AVolumePathIsCutTo255Characters)
                  szVolume + "1 /volume1 ext4 rw 0 0\n" + szVolume + "s1 /volume2 ext4 rw 0 0\n");
     MachineFolder(machine, "/volume2");
     for (const char *const szBehind : {"", "w"}) {
-        (void)ExpectCall(
-            {.szName = "255 characters or more",
-             .machine = machine,
-             .call = Remove,
-             .steps = Pvs("  /dev/md2:vg1:" + std::string(246, 'v') + szBehind + ":\n") +
-                      Unmounted(szVolume + "s1", "/volume2") +
-                      STEPS{{"/sbin/lvremove -f " + szVolume},
-                            {"/sbin/vgremove -f /dev/vg1"},
-                            {"/sbin/pvremove -f /dev/md2"}}});
+        Expect("255 characters or more", Remove,
+               Pvs("  /dev/md2:vg1:" + std::string(246, 'v') + szBehind + ":\n") +
+                   Unmounted(szVolume + "s1", "/volume2") +
+                   STEPS{{"/sbin/lvremove -f " + szVolume}, VG_REMOVED, PV_REMOVED},
+               machine);
     }
 }
 
@@ -413,11 +338,7 @@ MACHINE MachineWithMount()
 void ExpectMount(const char *szName, const STEPS &steps,
                  const MACHINE &machine = MachineWithMount(), u32 code = OLD_CODE)
 {
-    (void)ExpectCall({.szName = szName,
-                      .machine = machine,
-                      .call = Remove,
-                      .code = code,
-                      .steps = Pvs(ROW_MD2) + steps + REMOVED});
+    Expect(szName, Remove, Pvs(ROW_MD2) + steps + LVM_REMOVED, machine, code);
 }
 
 // Told before the pause. The mount has a second to go before its folder is taken away.
@@ -458,8 +379,11 @@ TEST(LVMRmLVPath, TheUnmountHasNoStreamsAndOnlyThePath)
 {
     MACHINE machine = MachineWithMount();
     machine.environment["SECRET"] = "1";
-    StepsExpect(machine, Pvs(ROW_MD2) + STEPS{UMOUNT, MOUNT_LV} + REMOVED);
-    const RUN_RESULT result = MachineCall(machine, [] { EXPECT_EQ(Remove(), 0); });
+    const RUN_RESULT result =
+        ExpectCall({.szName = "a mount",
+                    .machine = machine,
+                    .call = Remove,
+                    .steps = Pvs(ROW_MD2) + STEPS{UMOUNT, PAUSE, MOUNT_LV} + LVM_REMOVED});
     ASSERT_GE(result.events.size(), 2U);
     const RUN_EVENT &unmount = result.events[1];
     EXPECT_EQ(unmount.argv[0], "/bin/umount");

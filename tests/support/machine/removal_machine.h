@@ -58,11 +58,45 @@ inline const STEP LIMIT_TOLD = {"<11>raid_remove.cpp:# Reach RAID stop retry lim
 inline const STEP CLEAN_TOLD = {"<11>raid_remove.cpp:# [Info] clean RAID superblock of /dev/md2"};
 
 // The steps after a mirror of sda3 and sdb3 has been stopped.
+inline STEPS MirrorExamined()
+{
+    return {CLEAN_TOLD, Examined("sda3", UUID_MD2), Examined("sdb3", UUID_MD2)};
+}
+
 inline STEPS MirrorWiped()
 {
-    return STEPS{CLEAN_TOLD, Examined("sda3", UUID_MD2), Examined("sdb3", UUID_MD2)} +
-           Wiped("sda3") + Wiped("sdb3");
+    return MirrorExamined() + Wiped("sda3") + Wiped("sdb3");
 }
+
+// ---- LVM ---------------------------------------------------------------------------------------
+
+// With the two blanks that pvs sets in front.
+inline constexpr char ROW_MD2[] = "  /dev/md2:vg1:lv1:\n";
+
+inline STEPS Pvs(const std::string &szRows)
+{
+    return {{"/sbin/pvs -o pv_name,vg_name,lv_name,origin --noheading --separator :",
+             {.szOut = szRows}}};
+}
+
+inline const STEP LV_REMOVED = {"/sbin/lvremove -f /dev/vg1/lv1"};
+inline const STEP VG_REMOVED = {"/sbin/vgremove -f /dev/vg1"};
+inline const STEP PV_REMOVED = {"/sbin/pvremove -f /dev/md2"};
+inline const STEPS LVM_REMOVED = {LV_REMOVED, VG_REMOVED, PV_REMOVED};
+
+// One of these that fails, and what is told of it.
+inline STEPS RemoverFailed(const STEP &step, const TOOL_ANSWER &answer)
+{
+    return {{step.szText, answer}, {"<11>lvm.cpp:# Failed to " + step.szText}};
+}
+
+inline STEPS RemoversFailed(const TOOL_ANSWER &lv, const TOOL_ANSWER &vg, const TOOL_ANSWER &pv)
+{
+    return RemoverFailed(LV_REMOVED, lv) + RemoverFailed(VG_REMOVED, vg) +
+           RemoverFailed(PV_REMOVED, pv);
+}
+
+// ---- machines ----------------------------------------------------------------------------------
 
 // Partitions 1 to nPartition.
 inline void DiskWithPartitionsAdd(MACHINE &machine, const std::string &szDisk, int nPartition)
