@@ -10,14 +10,6 @@
 namespace
 {
 
-constexpr char PVS[] = "/sbin/pvs -o pv_name,vg_name,lv_name,origin --noheading --separator :";
-constexpr char ROW_MD2[] = "  /dev/md2:vg1:lv1:\n";
-
-STEPS Pvs(const std::string &szRows)
-{
-    return {{PVS, {.szOut = szRows}}};
-}
-
 const STEPS NO_LVM = Pvs("");
 const STEPS MIRROR_STOPPED = {Examined("sdb3", UUID_MD2), {STOP_MD2}};
 const STEPS MIRROR_REMOVED = MIRROR_STOPPED + MirrorWiped();
@@ -28,11 +20,7 @@ const STEPS NO_MOUNTS = {{"<11>lvm.cpp:# Failed to open /proc/mounts"}, {"sleep 
 RUN_RESULT ExpectDestroy(const char *szName, const MACHINE &machine, const std::string &szOut,
                          const STEPS &steps)
 {
-    return ExpectRun({.szName = szName,
-                      .machine = machine,
-                      .arguments = {"destroy", "2"},
-                      .szOut = szOut,
-                      .steps = steps});
+    return ExpectRun({szName, machine, {"destroy", "2"}, szOut, 0, steps});
 }
 
 // ---- without LVM -------------------------------------------------------------------------------
@@ -65,10 +53,7 @@ TEST(Destroy, AnInactiveArrayIsAMissingOne)
 
 TEST(Destroy, OtherArraysOnTheSameDisksAreLeftAlone)
 {
-    MACHINE machine = MachineMake();
-    for (const char *const szDisk : {"sda", "sdb"}) {
-        DiskWithPartitionsAdd(machine, szDisk, 4);
-    }
+    MACHINE machine = MachineWithDisks({"sda", "sdb"}, 4);
     MachineMdAdd(machine, {.nMd = 2, .members = {{"sda3"}, {"sdb3"}}});
     MachineMdAdd(machine, {.nMd = 3, .members = {{"sda4"}, {"sdb4"}}});
     ExpectDestroy("beside md3", machine, "",
@@ -81,10 +66,7 @@ TEST(Destroy, OtherArraysOnTheSameDisksAreLeftAlone)
 // Even when it carries the array's UUID, a system or swap partition is not looked at.
 TEST(Destroy, ASystemArrayIsStoppedAndKeepsItsSuperblocks)
 {
-    MACHINE machine = MachineMake();
-    for (const char *const szDisk : {"sda", "sdb"}) {
-        DiskWithPartitionsAdd(machine, szDisk, 3);
-    }
+    MACHINE machine = MachineWithDisks({"sda", "sdb"}, 3);
     MachineMdAdd(machine, {.nMd = 0, .members = {{"sda1"}, {"sdb1"}}});
     ExpectRuns({{.szName = "md0",
                  .machine = machine,
@@ -117,8 +99,7 @@ TEST(Destroy, AnArrayThatCannotBeStoppedIsNoFailure)
 TEST(Destroy, AFailedWipeIsNoFailure)
 {
     ExpectDestroy("no wipe", MachineWithMirror(), "",
-                  NO_LVM + MIRROR_STOPPED +
-                      STEPS{CLEAN_TOLD, Examined("sda3", UUID_MD2), Examined("sdb3", UUID_MD2)} +
+                  NO_LVM + MIRROR_STOPPED + MirrorExamined() +
                       WipeFailed("sda3", {.szErr = "mdadm: Couldn't open /dev/sda3\nfor write\n",
                                           .status = 2}));
     EXPECT_EQ(OperationErrors(),
@@ -171,10 +152,6 @@ TEST(Destroy, WithoutMdadmTheArrayStays)
 
 // ---- with LVM ----------------------------------------------------------------------------------
 
-const STEPS LVM_REMOVED = {{"/sbin/lvremove -f /dev/vg1/lv1"},
-                           {"/sbin/vgremove -f /dev/vg1"},
-                           {"/sbin/pvremove -f /dev/md2"}};
-
 TEST(Destroy, TheLvmStackGoesFirstAndInSilence)
 {
     MACHINE machine = WithFile(MachineWithMirror(), "/proc/mounts",
@@ -192,13 +169,7 @@ TEST(Destroy, TheLvmStackGoesFirstAndInSilence)
 TEST(Destroy, LvmRemoversThatFailAreNotPrinted)
 {
     ExpectDestroy("removers fail", MachineWithMirror(), "",
-                  Pvs(ROW_MD2) +
-                      STEPS{{"/sbin/lvremove -f /dev/vg1/lv1", {.status = 5}},
-                            {"<11>lvm.cpp:# Failed to /sbin/lvremove -f /dev/vg1/lv1"},
-                            {"/sbin/vgremove -f /dev/vg1", {.status = 5}},
-                            {"<11>lvm.cpp:# Failed to /sbin/vgremove -f /dev/vg1"},
-                            {"/sbin/pvremove -f /dev/md2", {.status = 5}},
-                            {"<11>lvm.cpp:# Failed to /sbin/pvremove -f /dev/md2"}} +
+                  Pvs(ROW_MD2) + RemoversFailed({.status = 5}, {.status = 5}, {.status = 5}) +
                       MIRROR_REMOVED);
 }
 
