@@ -4,6 +4,7 @@
 #include "removal_machine.h"
 
 #include <cerrno>
+#include <csignal>
 #include <gtest/gtest.h>
 #include <string>
 
@@ -79,16 +80,20 @@ TEST(Destroy, ASystemArrayIsStoppedAndKeepsItsSuperblocks)
                                 ExaminedBlank("sdb3")}}});
 }
 
-// Each try is told before the pause that follows it.
+// Each try is told before the pause that follows it, and the superblocks are left alone.
 TEST(Destroy, AnArrayThatCannotBeStoppedIsNoFailure)
 {
     const TOOL_ANSWER busy = {
         .szErr = "mdadm: Cannot get exclusive access to /dev/md2:Perhaps a running process, "
                  "mounted filesystem or active volume group?\n",
         .status = 1};
-    ExpectDestroy("busy", MachineWithMirror(), "",
-                  NO_LVM + STEPS{Examined("sdb3", UUID_MD2)} + 3 * StopFailed(busy) +
-                      STEPS{LIMIT_TOLD});
+    for (const TOOL_ANSWER &answer :
+         {TOOL_ANSWER{.status = 255}, TOOL_ANSWER{.signal = SIGKILL},
+          TOOL_ANSWER{.signal = SIGSEGV}, TOOL_ANSWER{.status = 1, .cbFlood = 1U << 20U}, busy}) {
+        ExpectDestroy("no stop", MachineWithMirror(), "",
+                      NO_LVM + STEPS{Examined("sdb3", UUID_MD2)} + 3 * StopFailed(answer) +
+                          STEPS{LIMIT_TOLD});
+    }
     const std::string szError =
         "Nov 05 01:02:03 command=\"/sbin/mdadm -S /dev/md2\" Error=\"mdadm: Cannot get exclusive "
         "access to /dev/md2:Perhaps a running process, mounted filesystem or active volume group? "
@@ -127,27 +132,31 @@ TEST(Destroy, WarningsOfToolsThatSucceedAreKept)
               "Error=\"-- warned \"\n");
 }
 
-TEST(Destroy, AFloodOfErrorsDoesNotBlock)
+TEST(Destroy, AFloodOnBothStreamsBlocksNobody)
 {
-    constexpr size_t FLOOD = 10 * 1024 * 1024;
-    MACHINE machine = MachineWithMirror();
-    ExpectDestroy("flood", machine, "",
-                  NO_LVM + STEPS{Examined("sdb3", UUID_MD2), {STOP_MD2, {.cbFlood = FLOOD}}} +
-                      MirrorWiped());
+    constexpr size_t FLOOD = 50UL * 1024UL * 1024UL;
+    STEPS flooded = NO_LVM + MIRROR_STOPPED;
+    flooded[0].answer.cbFlood = FLOOD;
+    flooded[2].answer.cbFlood = FLOOD;
+    ExpectDestroy("flood", MachineWithMirror(), "", flooded + MirrorWiped());
     // The whole line is cut to 2047 bytes, so the closing quote is not there.
     EXPECT_EQ(OperationErrors().size(), 2048U);
     EXPECT_EQ(OperationErrors().substr(2040), "xxxxxxx\n");
+    EXPECT_EQ(OperationErrors().find('\n'), 2047U);
 }
 
-TEST(Destroy, WithoutMdadmTheArrayStays)
+TEST(Destroy, WithoutToolsTheArrayStays)
 {
-    STEPS tries = 3 * StopFailed({});
-    std::erase_if(tries, [](const STEP &step) { return step.szText == STOP_MD2; });
-    ExpectDestroy("no mdadm", WithTool(MachineWithMirror(), "/sbin/mdadm", TOOL_KIND::MISSING), "",
-                  NO_LVM +
-                      STEPS{{"<11>raid_remove.cpp:# Disk [/dev/sdb3] in RAID [/dev/md2] has no "
-                             "RAID superblock, ret=0"}} +
-                      tries + STEPS{LIMIT_TOLD});
+    STEPS steps = STEPS{{"<11>raid_remove.cpp:# Disk [/dev/sdb3] in RAID [/dev/md2] has no RAID "
+                         "superblock, ret=0"}} +
+                  3 * StopFailed({}) + STEPS{LIMIT_TOLD};
+    std::erase_if(steps, [](const STEP &step) { return step.szText == STOP_MD2; });
+    for (const TOOL_KIND kind :
+         {TOOL_KIND::MISSING, TOOL_KIND::FOLDER, TOOL_KIND::NOT_EXECUTABLE}) {
+        const MACHINE machine = WithTool(MachineWithMirror(), "/sbin/mdadm", kind);
+        ExpectDestroy("no mdadm", machine, "", NO_LVM + steps);
+        ExpectDestroy("no pvs either", WithTool(machine, "/sbin/pvs", kind), "", steps);
+    }
 }
 
 // ---- with LVM ----------------------------------------------------------------------------------
@@ -184,7 +193,7 @@ TEST(Destroy, LvmOfAMissingArrayIsTakenDownFirst)
 {
     ExpectDestroy("taken down", MachineMake(), "Not found /dev/md2 \n",
                   Pvs(ROW_MD2) + LVM_REMOVED + NO_MD2);
-    ExpectDestroy("cannot start", Without(MachineMake(), "/proc/mounts"),
+    ExpectDestroy("cannot start", Without(MachineMake(), "/proc"),
                   "Found LVM on /dev/md2, remove it \nNot found /dev/md2 \n",
                   Pvs(ROW_MD2) + NO_MOUNTS + NO_MD2);
 }

@@ -26,7 +26,6 @@ using namespace std::string_literals; // texts with a NUL in them
 namespace
 {
 
-constexpr char PVS[] = "/sbin/pvs -o pv_name,vg_name,lv_name,origin --noheading --separator :";
 constexpr char REPORT[] = "/dev/md2 is running, status: NORMAL, rebuilding: None\n"
                           "Device level: RAID 1\n"
                           "Device size: 1024 MB (1073741824 bytes) \n"
@@ -37,18 +36,12 @@ constexpr char REPORT[] = "/dev/md2 is running, status: NORMAL, rebuilding: None
 
 // ---- the two machines that most cases are about ------------------------------------------------
 
-void WipesExpect(MACHINE &machine)
-{
-    StepsExpect(machine, STEPS{Examined("sdb3", UUID_MD2)} + MirrorWiped());
-}
-
 // A mirror that "destroy 2" takes down, command by command.
-MACHINE MirrorToDestroy()
+MACHINE MirrorToDestroy(const TOOL_ANSWER &answer = {})
 {
     MACHINE machine = MachineWithMirror();
-    MachineTool(machine, PVS);
-    MachineTool(machine, STOP_MD2);
-    WipesExpect(machine);
+    StepsExpect(machine,
+                Pvs("") + STEPS{{STOP_MD2, answer}, Examined("sdb3", UUID_MD2)} + MirrorWiped());
     return machine;
 }
 
@@ -77,9 +70,9 @@ MACHINE DisksToInit()
     return machine;
 }
 
-void InitsysTells(const MACHINE &machine)
+RUN_RESULT InitsysTells(const MACHINE &machine)
 {
-    RunEnds(machine, {"initsys"}, 0, "");
+    return RunEnds(machine, {"initsys"}, 0, "");
 }
 
 // Whatever of its commands a run gets to, in any number; none but these may run.
@@ -105,14 +98,92 @@ void LimitSet(__rlimit_resource resource, rlim_t value)
 
 } // namespace
 
+// ---- surroundings that change nothing ----------------------------------------------------------
+
+namespace
+{
+
+// Programs with the tools' names stand where PATH leads.
+void EnvironmentSpoil(MACHINE &machine)
+{
+    machine.environment = {{"PATH", "/evil::."},      {"IFS", "/dev"},
+                           {"ENV", "/evil/profile"},  {"BASH_ENV", "/evil/profile"},
+                           {"SHELL", "/evil/sh"},     {"LANG", "de_DE.UTF-8"},
+                           {"LC_ALL", "tr_TR.UTF-8"}, {"LD_LIBRARY_PATH", "/evil"},
+                           {"LD_BIND_NOW", "1"},      {"MALLOC_PERTURB_", "85"},
+                           {"POSIXLY_CORRECT", "1"},  {"TZ", "%s/../../evil"}};
+    for (const char *const szTool : {"mdadm", "sfdisk", "pvs", "sh"}) {
+        MachineFile(machine, std::string("/evil/") + szTool, "#!/bin/sh\n: >/evil/ran\n", 0755);
+    }
+    MachineFile(machine, "/evil/profile", ": >/evil/ran\n");
+}
+
+// The pipes of the tools then have the numbers of the standard streams.
+void StreamsClose()
+{
+    (void)close_range(STDIN_FILENO, STDERR_FILENO, 0);
+}
+
+void PipeSignalIgnore()
+{
+    (void)signal(SIGPIPE, SIG_IGN);
+}
+
+void SignalsBlock()
+{
+    sigset_t all;
+    (void)sigfillset(&all);
+    (void)sigprocmask(SIG_SETMASK, &all, nullptr);
+}
+
+struct SURROUNDINGS {
+    const char *szName;
+    void (*prepare)() = nullptr;
+    void (*change)(MACHINE &machine) = [](MACHINE &) {};
+};
+
+struct HostileSurroundings : testing::TestWithParam<SURROUNDINGS> {
+    static MACHINE In(MACHINE machine)
+    {
+        machine.prepare = GetParam().prepare;
+        GetParam().change(machine);
+        return machine;
+    }
+};
+
+constexpr SURROUNDINGS SURROUNDINGS_CASES[] = {
+    {"NoStreams", StreamsClose},
+    {"AnIgnoredPipeSignal", PipeSignalIgnore},
+    {"BlockedSignals", SignalsBlock},
+    {"AnEnvironmentOfOtherTools", nullptr, EnvironmentSpoil},
+    {"NoEnvironment", nullptr, [](MACHINE &machine) { machine.environment = {}; }},
+    {"NoLog", nullptr, [](MACHINE &machine) { machine.fNoLog = true; }},
+};
+
+} // namespace
+
+TEST_P(HostileSurroundings, ChangeNothingOfARemoval)
+{
+    DestroyTells(In(MirrorToDestroy()));
+    EXPECT_FALSE(MachineFileRead("/evil/ran").has_value());
+}
+
+TEST_P(HostileSurroundings, ChangeNothingOfAnInstallation)
+{
+    InitsysTells(In(DisksToInit()));
+    EXPECT_FALSE(MachineFileRead("/evil/ran").has_value());
+}
+
+INSTANTIATE_TEST_SUITE_P(All, HostileSurroundings, testing::ValuesIn(SURROUNDINGS_CASES),
+                         [](const auto &row) { return row.param.szName; });
+
 // ---- standard streams --------------------------------------------------------------------------
 
 TEST(HostileStreams, AReportWithoutStandardOutputIsStillARun)
 {
     MACHINE machine = MachineWithMirror();
     machine.prepare = [] { (void)close(STDOUT_FILENO); };
-    const RUN_RESULT result = RunEnds(machine, {"status", "2"}, 0);
-    EXPECT_EQ(result.szOut + result.szErr, "");
+    RunEnds(machine, {"status", "2"}, 0, "");
 }
 
 TEST(HostileStreams, AReportNeedsNoStandardInputOrError)
@@ -129,34 +200,21 @@ TEST(HostileStreams, AMissingArrayWithoutStandardOutputIsNotFound)
 {
     MACHINE machine = MachineMake();
     machine.prepare = [] { (void)close(STDOUT_FILENO); };
-    const RUN_RESULT result = RunEnds(machine, {"status", "7"}, 1);
-    EXPECT_EQ(result.szOut + result.szErr, "");
     // The log's socket has not become the standard output.
-    EXPECT_EQ(LogText(result), "<15>raid_info.cpp:# Failed to open /dev/md7, errno=No such file or "
-                               "directory\n");
-}
-
-// The pipes of the tools then have the numbers of the standard streams.
-TEST(HostileStreams, DestroyNeedsNone)
-{
-    MACHINE machine = MirrorToDestroy();
-    machine.prepare = [] { (void)close_range(STDIN_FILENO, STDERR_FILENO, 0); };
-    DestroyTells(machine);
-}
-
-TEST(HostileStreams, InitsysNeedsNone)
-{
-    MACHINE machine = DisksToInit();
-    machine.prepare = [] { (void)close_range(STDIN_FILENO, STDERR_FILENO, 0); };
-    InitsysTells(machine);
+    ExpectRuns({{.szName = "md7",
+                 .machine = machine,
+                 .arguments = {"status", "7"},
+                 .status = 1,
+                 .steps = {{"<15>raid_info.cpp:# Failed to open /dev/md7, errno=No such file or "
+                            "directory"}}}});
 }
 
 TEST(HostileStreams, AToolOfTheShellHasAllThree)
 {
     MACHINE machine = DisksToInit();
-    machine.prepare = [] { (void)close_range(STDIN_FILENO, STDERR_FILENO, 0); };
+    machine.prepare = StreamsClose;
     int nCreated = 0;
-    for (const RUN_EVENT &event : MachineRun(machine, {"initsys"}).events) {
+    for (const RUN_EVENT &event : InitsysTells(machine).events) {
         if (event.kind == EVENT_KIND::COMMAND && event.argv[1] == "-C") {
             nCreated++;
             EXPECT_TRUE(event.fNullInput && event.fNullOutput && event.fNullError);
@@ -174,7 +232,7 @@ TEST(HostileStreams, AReaderThatIsGoneDoesNotChangeTheStatus)
         (void)dup2(fds[1], STDOUT_FILENO);
         (void)close(fds[0]);
         (void)close(fds[1]);
-        (void)signal(SIGPIPE, SIG_IGN);
+        PipeSignalIgnore();
     };
     RunEnds(machine, {"status", "2"}, 0);
 }
@@ -217,9 +275,8 @@ TEST(HostileLimits, FewDescriptorsEndInitsysInOrder)
 
 TEST(HostileLimits, WithOneDescriptorTooFewAnArrayIsNotFound)
 {
-    MACHINE machine = MachineWithMirror();
-    machine.faults = {{.szFunction = "open", .error = EMFILE, .fGoOn = true}};
-    RunEnds(machine, {"status", "2"}, 1, "RAID /dev/md2 is not found\n");
+    RunEnds(WithFault(MachineWithMirror(), {.szFunction = "open", .error = EMFILE, .fGoOn = true}),
+            {"status", "2"}, 1, "RAID /dev/md2 is not found\n");
 }
 
 // A sanitizer needs terabytes of addresses.
@@ -315,25 +372,7 @@ TEST(HostileSignals, ChildrenThatReapThemselvesLeaveNoStatus)
     });
 }
 
-TEST(HostileSignals, AnIgnoredPipeSignalChangesNothing)
-{
-    MACHINE machine = MirrorToDestroy();
-    machine.prepare = [] { (void)signal(SIGPIPE, SIG_IGN); };
-    DestroyTells(machine);
-}
-
-TEST(HostileSignals, BlockedSignalsChangeNothing)
-{
-    MACHINE machine = DisksToInit();
-    machine.prepare = [] {
-        sigset_t all;
-        (void)sigfillset(&all);
-        (void)sigprocmask(SIG_SETMASK, &all, nullptr);
-    };
-    InitsysTells(machine);
-}
-
-// ---- umask, environment ------------------------------------------------------------------------
+// ---- umask -------------------------------------------------------------------------------------
 
 TEST(HostileUmask, FilesAreMadeWhateverItHides)
 {
@@ -347,57 +386,11 @@ TEST(HostileUmask, FilesAreMadeWhateverItHides)
 
 TEST(HostileUmask, TheErrorLogIsWrittenWhateverItHides)
 {
-    MACHINE machine = MachineWithMirror();
-    MachineTool(machine, PVS);
-    MachineTool(machine, STOP_MD2, {.szErr = "mdadm: stopped /dev/md2\n"});
-    WipesExpect(machine);
+    MACHINE machine = MirrorToDestroy({.szErr = "mdadm: stopped /dev/md2\n"});
     machine.prepare = [] { (void)umask(0777); };
     DestroyTells(machine);
     EXPECT_EQ(OperationErrors(), "Nov 05 01:02:03 command=\"/sbin/mdadm -S /dev/md2\" "
                                  "Error=\"mdadm: stopped /dev/md2 \"\n");
-}
-
-namespace
-{
-
-// Programs with the tools' names stand where PATH leads.
-void HostileEnvironment(MACHINE &machine)
-{
-    machine.environment = {{"PATH", "/evil::."},      {"IFS", "/dev"},
-                           {"ENV", "/evil/profile"},  {"BASH_ENV", "/evil/profile"},
-                           {"SHELL", "/evil/sh"},     {"LANG", "de_DE.UTF-8"},
-                           {"LC_ALL", "tr_TR.UTF-8"}, {"LD_LIBRARY_PATH", "/evil"},
-                           {"LD_BIND_NOW", "1"},      {"MALLOC_PERTURB_", "85"},
-                           {"POSIXLY_CORRECT", "1"},  {"TZ", "%s/../../evil"}};
-    for (const char *const szTool : {"mdadm", "sfdisk", "pvs", "sh"}) {
-        MachineFile(machine, std::string("/evil/") + szTool, "#!/bin/sh\n: >/evil/ran\n", 0755);
-    }
-    MachineFile(machine, "/evil/profile", ": >/evil/ran\n");
-}
-
-} // namespace
-
-TEST(HostileEnvironment, DestroyRunsTheSameTools)
-{
-    MACHINE machine = MirrorToDestroy();
-    HostileEnvironment(machine);
-    DestroyTells(machine);
-    EXPECT_FALSE(MachineFileRead("/evil/ran").has_value());
-}
-
-TEST(HostileEnvironment, InitsysGivesItsShellTheSameCommands)
-{
-    MACHINE machine = DisksToInit();
-    HostileEnvironment(machine);
-    InitsysTells(machine);
-    EXPECT_FALSE(MachineFileRead("/evil/ran").has_value());
-}
-
-TEST(HostileEnvironment, NoneAtAllIsEnough)
-{
-    MACHINE machine = DisksToInit();
-    machine.environment = {};
-    InitsysTells(machine);
 }
 
 // ---- names in /sys and /proc -------------------------------------------------------------------
@@ -411,24 +404,20 @@ const std::vector<std::string> NAMES = {"sda 1",  "sda\n1", "sda%s%n%d", "sda'1"
 
 } // namespace
 
-TEST(HostileNames, MembersAreToldAsTheyAre)
+TEST(HostileNames, MembersAreToldAsTheyAreUpTo120Characters)
 {
+    std::vector<std::pair<std::string, std::string>> names = {
+        {"sd" + std::string(240, 'a'), "sd" + std::string(120, 'a')}};
     for (const std::string &szName : NAMES) {
+        names.emplace_back(szName, szName);
+    }
+    for (const auto &[szName, szTold] : names) {
         MACHINE machine = MachineMake();
         MachineMdAdd(machine, {.nMd = 2, .members = {{szName}}});
         const RUN_RESULT result = RunEnds(machine, {"status", "2"}, 0);
-        EXPECT_NE(result.szOut.find("\t [/dev/" + szName + ": Normal]\n\n"), std::string::npos)
+        EXPECT_NE(result.szOut.find("\t [/dev/" + szTold + ": Normal]\n\n"), std::string::npos)
             << result.szOut;
     }
-}
-
-TEST(HostileNames, ALongMemberIsCut)
-{
-    MACHINE machine = MachineMake();
-    MachineMdAdd(machine, {.nMd = 2, .members = {{"sd" + std::string(240, 'a')}}});
-    const RUN_RESULT result = RunEnds(machine, {"status", "2"}, 0);
-    EXPECT_NE(result.szOut.find("\t [/dev/sd" + std::string(120, 'a') + ": Normal]\n"),
-              std::string::npos);
 }
 
 // Up to its first character that is no letter, a disk's name is the disk's.
@@ -455,10 +444,10 @@ TEST(HostileNames, PartitionsAreExaminedAsOneArgument)
                 "major minor  #blocks  name\n\n   8 3 1 sda3\n   8 4 1 sd%s%n4\n   8 5 1 sd';x;'5\n"
                 "   8 6 1 sd\xe4\xff"
                 "6\n   8 7 1 sd a7\n");
-    MachineTool(machine, PVS);
-    MachineTool(machine, STOP_MD2);
     StepsExpect(machine,
-                STEPS{Examined("sdb3", UUID_MD2), Examined("sda3", UUID_MD2)} + Wiped("sda3"));
+                Pvs("") +
+                    STEPS{{STOP_MD2}, Examined("sdb3", UUID_MD2), Examined("sda3", UUID_MD2)} +
+                    Wiped("sda3"));
     for (const char *const szPath : {"/dev/sd%s%n4", "/dev/sd';x;'5",
                                      "/dev/sd\xe4\xff"
                                      "6"}) {
@@ -541,12 +530,6 @@ void NothingIsKnown(MACHINE machine)
     EXPECT_NE(LogText(result).find(NO_MASKS), std::string::npos);
 }
 
-void OneDiskIsKnown(MACHINE machine)
-{
-    BlankDiskAdd(machine, "sda");
-    RunEnds(machine, {"enumformatalldisks"}, 1, "1 ");
-}
-
 } // namespace
 
 TEST(HostileConf, AFolderHoldsNoKey)
@@ -581,26 +564,23 @@ TEST(HostileConf, APipeIsWaitedForUntilItsWriterCloses)
 
 TEST(HostileConf, ALineOfTenMegabytesIsReadWhole)
 {
-    constexpr size_t TEN_MEGABYTES = 10UL * 1024UL * 1024UL;
-    MACHINE machine = MachineMake();
-    MachineConf(machine, "usbportcfg=" + std::string(TEN_MEGABYTES, '1'));
-    NothingIsKnown(machine);
-    MachineConf(machine, std::string(TEN_MEGABYTES, 'x') + "\n" + CONF_RAID);
-    OneDiskIsKnown(machine);
+    const std::string szLong(10UL * 1024UL * 1024UL, 'x');
+    NothingIsKnown(MachineWithConf("usbportcfg=" + szLong));
+    MACHINE machine = MachineWithConf(szLong + "\n" + CONF_RAID);
+    BlankDiskAdd(machine, "sda");
+    RunEnds(machine, {"enumformatalldisks"}, 1, "1 ");
 }
 
-TEST(HostileConf, LineEndsOfTwoCharactersAreTrimmed)
+// Line ends of two characters are trimmed, and a line ends at its NUL.
+TEST(HostileConf, ItsLinesMayEndOddly)
 {
-    MACHINE machine = MachineMake();
-    MachineConf(machine, "maxdisks=4\r\nusbportcfg=0x30\r\ninternalportcfg=\"0xf\"\r\n");
-    OneDiskIsKnown(machine);
-}
-
-TEST(HostileConf, ALineEndsAtItsNul)
-{
-    MACHINE machine = MachineMake();
-    MachineConf(machine, "\0\0\nusbportcfg=0x30\0=\ninternalportcfg=0xf\0x\n"s);
-    OneDiskIsKnown(machine);
+    for (const std::string &szText :
+         {"maxdisks=4\r\nusbportcfg=0x30\r\ninternalportcfg=\"0xf\"\r\n"s,
+          "\0\0\nusbportcfg=0x30\0=\ninternalportcfg=0xf\0x\n"s}) {
+        MACHINE machine = MachineWithConf(szText);
+        BlankDiskAdd(machine, "sda");
+        RunEnds(machine, {"enumformatalldisks"}, 1, "1 ");
+    }
 }
 
 TEST(HostileConf, AnEmptyOneAndOneOfBytesHoldNoKey)
@@ -609,11 +589,8 @@ TEST(HostileConf, AnEmptyOneAndOneOfBytesHoldNoKey)
     for (int i = 0; i < 65536; i++) {
         szBytes += static_cast<char>((i * 7919) >> 5);
     }
-    for (const std::string &szText : {std::string(), szBytes}) {
-        MACHINE machine = MachineMake();
-        MachineConf(machine, szText);
-        NothingIsKnown(machine);
-    }
+    NothingIsKnown(MachineWithConf(""));
+    NothingIsKnown(MachineWithConf(szBytes));
 }
 
 // ---- file systems that are full or missing -----------------------------------------------------
@@ -635,10 +612,7 @@ void FullMount(const char *szFolder)
 
 TEST(HostileDisks, AFullLogChangesNothingOfARemoval)
 {
-    MACHINE machine = MachineWithMirror();
-    MachineTool(machine, PVS);
-    MachineTool(machine, STOP_MD2, {.szErr = "mdadm: stopped /dev/md2\n"});
-    WipesExpect(machine);
+    MACHINE machine = MirrorToDestroy({.szErr = "mdadm: stopped /dev/md2\n"});
     machine.prepare = [] { FullMount("/var/log"); };
     const RUN_RESULT result = RunEnds(machine, {"destroy", "2"}, 0);
     EXPECT_NE(
@@ -658,13 +632,6 @@ TEST(HostileDisks, AFullTmpDoesNotChangeTheAnswer)
               "<11>conf.cpp:# Failed to touch '/tmp/.not.dualhead'\n");
 }
 
-TEST(HostileDisks, NoLogNoMatter)
-{
-    MACHINE machine = MirrorToDestroy();
-    machine.fNoLog = true;
-    DestroyTells(machine);
-}
-
 TEST(HostileDisks, WithoutSysAnArrayHasNoMembersAndAMachineNoDisks)
 {
     MACHINE machine = MachineWithMirror();
@@ -677,91 +644,25 @@ TEST(HostileDisks, WithoutSysAnArrayHasNoMembersAndAMachineNoDisks)
 
 TEST(HostileDisks, WithoutProcAnArrayIsStoppedAndNothingWiped)
 {
-    MACHINE machine = MachineWithMirror();
-    MachineRemove(machine, "/proc");
-    MachineTool(machine, PVS);
-    MachineTool(machine, STOP_MD2);
-    StepsExpect(machine, {Examined("sdb3", UUID_MD2)});
-    const RUN_RESULT result = RunEnds(machine, {"destroy", "2"}, 0);
-    EXPECT_NE(LogText(result).find("<11>raid_remove.cpp:# Fail to enum partition path\n"),
-              std::string::npos);
-}
-
-TEST(HostileDisks, WithoutProcLvmIsSaidToBeFoundAndLeftAlone)
-{
-    MACHINE machine = MachineMake();
-    MachineRemove(machine, "/proc");
-    MachineTool(machine, PVS, {.szOut = "  /dev/md2:vg1:lv1:\n"});
-    const RUN_RESULT result = RunEnds(machine, {"destroy", "2"}, 0,
-                                      "Found LVM on /dev/md2, remove it \nNot found /dev/md2 \n");
-    EXPECT_EQ(LogErrors(result), "<11>lvm.cpp:# Failed to open /proc/mounts\n");
+    ExpectRuns({{.szName = "no /proc",
+                 .machine = Without(MachineWithMirror(), "/proc"),
+                 .arguments = {"destroy", "2"},
+                 .steps = Pvs("") + STEPS{Examined("sdb3", UUID_MD2),
+                                          {STOP_MD2},
+                                          CLEAN_TOLD,
+                                          {"<11>partition_enum.cpp:# Failed to read line of "
+                                           "/proc/partitions, errno=0x900"},
+                                          {"<11>raid_remove.cpp:# Fail to enum partition path"},
+                                          {"<11>raid_remove.cpp:# Fail to get RAID UUID hash"}}}});
 }
 
 // ---- tools -------------------------------------------------------------------------------------
-
-namespace
-{
-
-// Three attempts, none of which can succeed; the superblocks are left alone.
-void StopFails(MACHINE machine, const std::string &szWhat)
-{
-    const RUN_RESULT result = MachineRun(machine, {"destroy", "2"});
-    EXPECT_EQ(result.status, 0) << szWhat;
-    EXPECT_EQ(result.szOut, "") << szWhat;
-    EXPECT_NE(LogText(result).find("<11>raid_remove.cpp:# Reach RAID stop retry limit\n"),
-              std::string::npos)
-        << szWhat;
-    EXPECT_EQ(TranscriptText(result).find("zero-superblock"), std::string::npos) << szWhat;
-}
-
-} // namespace
-
-TEST(HostileTools, OnesThatCannotRunStopNothing)
-{
-    for (const TOOL_KIND kind :
-         {TOOL_KIND::MISSING, TOOL_KIND::FOLDER, TOOL_KIND::NOT_EXECUTABLE}) {
-        MACHINE machine = MachineWithMirror();
-        machine.tools["/sbin/mdadm"] = kind;
-        machine.tools["/sbin/pvs"] = kind;
-        StopFails(machine, std::to_string(static_cast<int>(kind)));
-    }
-}
-
-TEST(HostileTools, OnesThatFailOrDieStopNothing)
-{
-    for (const TOOL_ANSWER &answer :
-         {TOOL_ANSWER{.status = 255, .nTimes = 3}, TOOL_ANSWER{.signal = SIGKILL, .nTimes = 3},
-          TOOL_ANSWER{.signal = SIGSEGV, .nTimes = 3},
-          TOOL_ANSWER{.status = 1, .cbFlood = 1U << 20U, .nTimes = 3}}) {
-        MACHINE machine = MachineWithMirror();
-        MachineTool(machine, PVS);
-        StepsExpect(machine, {Examined("sdb3", UUID_MD2)});
-        MachineTool(machine, STOP_MD2, answer);
-        StopFails(machine, std::to_string(answer.status) + "/" + std::to_string(answer.signal));
-    }
-}
-
-TEST(HostileTools, AFloodOnBothStreamsBlocksNobody)
-{
-    constexpr size_t FLOOD_SIZE = 50UL * 1024UL * 1024UL;
-    MACHINE machine = MachineWithMirror();
-    MachineTool(machine, PVS, {.cbFlood = FLOOD_SIZE});
-    MachineTool(machine, STOP_MD2, {.cbFlood = FLOOD_SIZE});
-    WipesExpect(machine);
-    DestroyTells(machine);
-    const std::string szLog = MachineFileRead("/var/log/space_operation_error.log").value_or("");
-    EXPECT_EQ(szLog.size(), 2048U);
-    EXPECT_EQ(szLog.find('\n'), 2047U);
-}
 
 // A report is read to its end, and the end comes with the last holder of the stream.
 TEST(HostileTools, AGrandchildThatHoldsTheStreamIsWaitedFor)
 {
     constexpr int MS_HELD = 700;
-    MACHINE machine = MachineWithMirror();
-    MachineTool(machine, PVS);
-    MachineTool(machine, STOP_MD2, {.msGrandchild = MS_HELD});
-    WipesExpect(machine);
+    MACHINE machine = MirrorToDestroy({.msGrandchild = MS_HELD});
     machine.fMayLeaveChildren = true;
     const RUN_RESULT result = RunEnds(machine, {"destroy", "2"}, 0);
     EXPECT_GE(result.seconds, MS_HELD / 1000.0);
