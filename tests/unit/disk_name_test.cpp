@@ -117,11 +117,6 @@ TEST(DiskIndexGet, NumbersEveryNameOfUpToThreeLettersInTurn)
     }
 }
 
-TEST(DiskIndexGet, NullIsNoDiskAndSetsNoCode)
-{
-    EXPECT_QUIET(DiskIndexGet(nullptr), -1);
-}
-
 struct NUMBER_CASE {
     const char *szName;
     size_t cbDisk;
@@ -228,28 +223,6 @@ TEST(DiskPartitionNumGet, TakesDisksOfUpTo31LettersIntoTheUsualBuffer)
     EXPECT_TRUE(IsRestKept(disk));
 }
 
-TEST(DiskPartitionNumGet, RefusesBadArguments)
-{
-    GUARDED_BUFFER disk(0);
-    char *const szDisk = disk.text.data();
-    const struct {
-        const char *szName;
-        char *szDisk;
-        int cbDisk;
-    } rows[] = {{nullptr, szDisk, 32},
-                {"sda1", nullptr, 32},
-                {"sda1", szDisk, 0},
-                {"sda1", szDisk, -1},
-                {"sda1", szDisk, INT_MIN}};
-    for (const auto &row : rows) {
-        EXPECT_FAILS(DiskPartitionNumGet(row.szName, row.szDisk, row.cbDisk), -1,
-                     ERR_BAD_PARAMETER);
-        EXPECT_STREQ(NLIBCErrGetFile(), "disk_name.cpp");
-        EXPECT_GT(NLIBCErrGetLine(), 1);
-        EXPECT_TRUE(IsRestKept(disk));
-    }
-}
-
 struct REMOVE_CASE {
     const char *szPart;
     const char *szDisk;
@@ -329,19 +302,6 @@ TEST(DiskPartitionNumRemove, TakesUpTo31CharactersIntoTheUsualBuffer)
     EXPECT_EQ(DiskPartitionNumRemove(Letters(32).c_str(), disk.text.data(), 32), -1);
     EXPECT_EQ(DiskPartitionNumRemove((Letters(31) + "1").c_str(), disk.text.data(), 32), -1);
     EXPECT_TRUE(IsRestKept(disk));
-}
-
-TEST(DiskPartitionNumRemove, RefusesBadArgumentsWithoutACode)
-{
-    GUARDED_BUFFER disk(0);
-    RecordReset();
-    EXPECT_EQ(DiskPartitionNumRemove(nullptr, disk.text.data(), 32), -1);
-    EXPECT_EQ(DiskPartitionNumRemove("sda1", nullptr, 32), -1);
-    EXPECT_EQ(DiskPartitionNumRemove("sda1", disk.text.data(), 0), -1);
-    EXPECT_EQ(DiskPartitionNumRemove("sda1", disk.text.data(), -1), -1);
-    EXPECT_EQ(DiskPartitionNumRemove("sda1", disk.text.data(), 4), -1);
-    EXPECT_TRUE(IsRestKept(disk));
-    EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
 }
 
 struct PARTITION_CASE {
@@ -476,12 +436,6 @@ TEST(DiskDevicePartitionNameGet, RefusesWhatHasNoPartitions)
     }
     EXPECT_TRUE(IsRestKept(out));
     EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
-}
-
-TEST(DiskIsExist, NullIsABadParameter)
-{
-    EXPECT_FAILS(DiskIsExist(nullptr), -1, ERR_BAD_PARAMETER);
-    EXPECT_STREQ(NLIBCErrGetFile(), "disk_name.cpp");
 }
 
 TEST(DiskIsExist, WhatIsNoBlockDeviceDoesNotExist)

@@ -58,17 +58,6 @@ TEST(DiskContainerFromPortType, MapsThePortTypes)
             << row.type;
         EXPECT_EQ(mask, row.mask) << row.type;
     }
-    EXPECT_EQ(DiskContainerFromPortType(INTERNAL_DEVICE, nullptr), -1);
-    EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
-}
-
-TEST(DiskContainerGet, RefusesNullWithoutACode)
-{
-    u32 mask = OLD_MASK;
-    RecordReset();
-    EXPECT_EQ(DiskContainerGet(nullptr, &mask), -1);
-    EXPECT_EQ(DiskContainerGet("mmcblk0", nullptr), -1);
-    EXPECT_EQ(mask, OLD_MASK);
     EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
 }
 
@@ -79,14 +68,6 @@ TEST(DiskContainerGet, HasNoneForCardsAndTheBootDevice)
         EXPECT_EQ(DiskContainerGet(szPath, &mask), -1) << szPath;
         EXPECT_EQ(mask, OLD_MASK) << szPath;
     }
-}
-
-TEST(DiskPathParse, RefusesNull)
-{
-    DISK_PATH_INFO info = {};
-    EXPECT_FAILS(DiskPathParse(nullptr, &info), -1, ERR_BAD_PARAMETER);
-    EXPECT_STREQ(NLIBCErrGetFile(), "disk_path.cpp");
-    EXPECT_FAILS(DiskPathParse("mmcblk0", nullptr), -1, ERR_BAD_PARAMETER);
 }
 
 struct PARSE_CASE {

@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: MIT
 #include "nurocore/error.h"
 
+#include "hwcontrol/disk_name.h"
+#include "hwcontrol/disk_path.h"
 #include "last_error.h"
 #include "nurocore/szlist.h"
 
@@ -70,6 +72,10 @@ TEST(LastError, NamesTheBareFileAndTheLineOfTheFailure)
     EXPECT_FAILS(NLIBCSzListFind(nullptr, "sda"), -1, ERR_BAD_PARAMETER);
     EXPECT_STREQ(NLIBCErrGetFile(), "szlist_base.cpp");
     EXPECT_NE(NLIBCErrGetLine(), lineOfGet);
+    EXPECT_FAILS(DiskIsExist(nullptr), -1, ERR_BAD_PARAMETER);
+    EXPECT_STREQ(NLIBCErrGetFile(), "disk_name.cpp");
+    EXPECT_FAILS(DiskPathParse(nullptr, nullptr), -1, ERR_BAD_PARAMETER);
+    EXPECT_STREQ(NLIBCErrGetFile(), "disk_path.cpp");
 }
 
 TEST(LastError, EveryCodeHasItsNumber)

@@ -129,26 +129,6 @@ TEST(Fgets, CutsAtTheBuffer)
     (void)fclose(pStream);
 }
 
-TEST(Fgets, RefusesBadArguments)
-{
-    SCRIPT script = {.failures = {}, .text = "line\n"};
-    FILE *const pStream = ScriptOpen(script);
-    ASSERT_NE(pStream, nullptr);
-    char szLine[8];
-    const auto read = [](char *szBuf, int cbBuf, FILE *pFrom) {
-        errno = ERRNO_AT_ENTRY;
-        char *const pszRead = NLIBCFgets(szBuf, cbBuf, pFrom);
-        EXPECT_EQ(errno, ERRNO_AT_ENTRY);
-        return pszRead;
-    };
-    EXPECT_FAILS(read(nullptr, 8, pStream), nullptr, ERR_BAD_PARAMETER);
-    EXPECT_FAILS(read(szLine, 0, pStream), nullptr, ERR_BAD_PARAMETER);
-    EXPECT_FAILS(read(szLine, -1, pStream), nullptr, ERR_BAD_PARAMETER);
-    EXPECT_FAILS(read(szLine, 8, nullptr), nullptr, ERR_BAD_PARAMETER);
-    EXPECT_EQ(script.nRead, 0);
-    (void)fclose(pStream);
-}
-
 struct PIPE_PAIR {
     int fd[2] = {-1, -1};
 
@@ -196,15 +176,6 @@ TEST(Read, ReportsAFailureWithoutACode)
     for (const int errnoAtEntry : {ERRNO_AT_ENTRY, EINTR, 0}) {
         EXPECT_QUIET(ReadAt(errnoAtEntry, pipe.fd[1], szBuf, 8), -1); // the end that is written
     }
-}
-
-TEST(Read, RefusesBadArguments)
-{
-    const PIPE_PAIR pipe;
-    char szBuf[8];
-    EXPECT_FAILS(ReadAt(ERRNO_AT_ENTRY, -1, szBuf, 8), -1, ERR_BAD_PARAMETER);
-    EXPECT_FAILS(ReadAt(ERRNO_AT_ENTRY, pipe.fd[0], nullptr, 8), -1, ERR_BAD_PARAMETER);
-    EXPECT_FAILS(ReadAt(ERRNO_AT_ENTRY, pipe.fd[0], szBuf, 0), -1, ERR_BAD_PARAMETER);
 }
 
 // The pipe that the signal handlers below feed, and after how many signals.

@@ -67,12 +67,6 @@ TEST(FileLineKeyMatch, LeavesTheLine)
     EXPECT_EQ(line, "  maxdisks  =  \"4\"  \n");
 }
 
-TEST(FileLineKeyMatch, RefusesNull)
-{
-    EXPECT_FAILS(NLIBCFileLineKeyMatch(nullptr, "k"), 0, ERR_BAD_PARAMETER);
-    EXPECT_FAILS(NLIBCFileLineKeyMatch("k=v", nullptr), 0, ERR_BAD_PARAMETER);
-}
-
 struct VALUE_CASE {
     const char *szText;
     const char *szValue; // NULL: no line gives the key "k" a value
@@ -238,20 +232,6 @@ TEST(FileGetKeyValue, ReadsLinesOfAnyLength)
     EXPECT_EQ(copy.c_str(), value);
 }
 
-TEST(FileGetKeyValue, RefusesBadArguments)
-{
-    const TEST_FOLDER folder;
-    const std::string path = folder.Write("conf", "k=v\n");
-    const char *const sz = path.c_str();
-    char szValue[8];
-    EXPECT_FAILS(NLIBCFileGetKeyValue(nullptr, "k", szValue, 8, 0), -1, ERR_BAD_PARAMETER);
-    EXPECT_FAILS(NLIBCFileGetKeyValue(sz, nullptr, szValue, 8, 0), -1, ERR_BAD_PARAMETER);
-    EXPECT_FAILS(NLIBCFileGetKeyValue(sz, "k", szValue, 8, -1), -1, ERR_BAD_PARAMETER);
-    EXPECT_FAILS(NLIBCFileGetKeyValue(sz, "k", szValue, 8, INT_MIN), -1, ERR_BAD_PARAMETER);
-    EXPECT_FAILS(NLIBCFileGetKeyValue(sz, "k", nullptr, 8, 0), -1, ERR_BAD_PARAMETER);
-    EXPECT_FAILS(NLIBCFileGetKeyValue(sz, "k", nullptr, -8, 0), -1, ERR_BAD_PARAMETER);
-}
-
 TEST(FileGetKeyValue, FailsWhenTheFileDoesNotOpen)
 {
     const TEST_FOLDER folder;
@@ -298,15 +278,6 @@ TEST(FileCheckKeyValue, AFailedLookupGives0)
     path = folder.Write("conf", "k=" + fits + "v\n");
     EXPECT_FAILS(NLIBCFileCheckKeyValue(path.c_str(), "k", (fits + "v").c_str(), 1), 0,
                  ERR_BUF_TOO_SMALL);
-}
-
-TEST(FileCheckKeyValue, RefusesNull)
-{
-    const TEST_FOLDER folder;
-    const std::string path = folder.Write("conf", "k=v\n");
-    EXPECT_FAILS(NLIBCFileCheckKeyValue(nullptr, "k", "v", 1), 0, ERR_BAD_PARAMETER);
-    EXPECT_FAILS(NLIBCFileCheckKeyValue(path.c_str(), nullptr, "v", 1), 0, ERR_BAD_PARAMETER);
-    EXPECT_FAILS(NLIBCFileCheckKeyValue(path.c_str(), "k", nullptr, 1), 0, ERR_BAD_PARAMETER);
 }
 
 } // namespace

@@ -150,17 +150,6 @@ TEST(Popen, RefusesModesThatMeanNothing)
     EXPECT_EQ(DescriptorCount(), nDescriptor);
 }
 
-TEST(Popen, RefusesNull)
-{
-    char szName[] = "true";
-    char *argv[] = {szName, nullptr};
-    EXPECT_FAILS(NLIBCPopen(nullptr, "r", nullptr), nullptr, ERR_BAD_PARAMETER);
-    EXPECT_FAILS(NLIBCPopen("/bin/true", nullptr, nullptr), nullptr, ERR_BAD_PARAMETER);
-    EXPECT_FAILS(NLIBCPopenV(nullptr, "r", argv), nullptr, ERR_BAD_PARAMETER);
-    EXPECT_FAILS(NLIBCPopenV("/bin/true", nullptr, argv), nullptr, ERR_BAD_PARAMETER);
-    EXPECT_FAILS(NLIBCPopenV("/bin/true", "r", nullptr), nullptr, ERR_BAD_PARAMETER);
-}
-
 // --- failures
 
 TEST(Popen, WithoutDescriptorsThereIsNoPipe)
@@ -356,11 +345,6 @@ TEST(Pclose, LeavesAForeignStreamOpen)
     EXPECT_EQ(TextOf(pForeign), "text");
     EXPECT_EQ(fclose(pForeign), 0);
     EXPECT_EQ(ReadAndClose(pOwn), "own\n[0]");
-}
-
-TEST(Pclose, RefusesNull)
-{
-    EXPECT_FAILS(NLIBCPclose(nullptr), -1, ERR_BAD_PARAMETER);
 }
 
 TEST(Pclose, AProgramReapedElsewhereGives0)

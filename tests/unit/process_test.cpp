@@ -334,11 +334,6 @@ TEST(Execl, AKilledProgramIsAFailure)
     EXPECT_FAILS(RunShell("kill -15 $$"), -1, ERR_CHILD_FAILED);
 }
 
-TEST(Execl, RefusesNull)
-{
-    EXPECT_FAILS(NLIBCExecl(nullptr, "a", nullptr), -1, ERR_BAD_PARAMETER);
-}
-
 TEST(Execl, AFailedForkIsAChildThatFailed)
 {
     EXPECT_EQ(InChild([] {

@@ -94,14 +94,6 @@ TEST(StrTrimSpace, WritesNothingBehindTheSizeOfTheSource)
     EXPECT_STREQ(szOther, "ab");
 }
 
-TEST(StrTrimSpace, RefusesNull)
-{
-    char szOther[4] = "abc";
-    EXPECT_FAILS(NLIBCStrTrimSpace(nullptr, nullptr), -1, ERR_BAD_PARAMETER);
-    EXPECT_FAILS(NLIBCStrTrimSpace(nullptr, szOther), -1, ERR_BAD_PARAMETER);
-    EXPECT_STREQ(szOther, "abc");
-}
-
 TEST(StrTrimSpace, RefusesADestinationInsideTheSource)
 {
     char szText[8] = " ab ";
@@ -155,17 +147,6 @@ TEST(StrSepNonEmpty, EndsTheFieldAndMovesTheCursorBehindIt)
     EXPECT_EQ(pszCursor, nullptr);
 }
 
-TEST(StrSepNonEmpty, HasNothingForNullAndSetsNoError)
-{
-    char szText[] = "a";
-    char *pszCursor = szText;
-    char *pszNone = nullptr;
-    EXPECT_QUIET(NLIBCStrSepNonEmpty(nullptr, ","), nullptr);
-    EXPECT_QUIET(NLIBCStrSepNonEmpty(&pszNone, ","), nullptr);
-    EXPECT_QUIET(NLIBCStrSepNonEmpty(&pszCursor, nullptr), nullptr);
-    EXPECT_EQ(pszCursor, szText);
-}
-
 TEST(StrTok, PushesTheFieldsOfACopy)
 {
     TEST_LIST list({"before"}, SZLIST_UNSORTED);
@@ -203,17 +184,6 @@ TEST(StrTok, SplitsAStringOfTheListItself)
     TEST_LIST list({"a b"}, SZLIST_UNSORTED);
     EXPECT_QUIET(NLIBCStrTok(NLIBCSzListGet(list.p, 0), " ", &list.p), 2);
     EXPECT_EQ(ItemsOf(list.p), (ITEMS{"a b", "a", "b"}));
-}
-
-TEST(StrTok, RefusesNull)
-{
-    TEST_LIST list;
-    PNLIBSZLIST pNone = nullptr;
-    EXPECT_FAILS(NLIBCStrTok(nullptr, ",", &list.p), -1, ERR_BAD_PARAMETER);
-    EXPECT_FAILS(NLIBCStrTok("a", nullptr, &list.p), -1, ERR_BAD_PARAMETER);
-    EXPECT_FAILS(NLIBCStrTok("a", ",", nullptr), -1, ERR_BAD_PARAMETER);
-    EXPECT_FAILS(NLIBCStrTok("a", ",", &pNone), -1, ERR_BAD_PARAMETER);
-    EXPECT_EQ(list.p->nItem, 0);
 }
 
 // Eight bytes of memory before and after; cbText of them are the buffer, and what lies behind it
