@@ -7,9 +7,268 @@
 
 #include <climits>
 #include <cstdio>
+#include <functional>
 
 namespace
 {
+
+// ---- steps on a list, and what each of them leaves ----------------------------------------------
+
+using STEP = std::function<void(TEST_LIST &)>;
+
+STEP Of(const ITEMS &items, int fMode = SZLIST_UNSORTED)
+{
+    return [=](TEST_LIST &list) {
+        TEST_LIST fresh(items, fMode);
+        std::swap(list.p, fresh.p);
+    };
+}
+
+STEP Push(const std::string &item, int result)
+{
+    return [=](TEST_LIST &list) { EXPECT_QUIET(NLIBCSzListPush(&list.p, item.c_str()), result); };
+}
+
+STEP PushHead(const char *szItem, int result)
+{
+    return [=](TEST_LIST &list) { EXPECT_QUIET(NLIBCSzListPushHead(&list.p, szItem), result); };
+}
+
+STEP Insert(int index, const char *szItem, int result)
+{
+    return
+        [=](TEST_LIST &list) { EXPECT_QUIET(NLIBCSzListInsert(&list.p, index, szItem), result); };
+}
+
+STEP Set(int index, const char *szItem, int result, u32 code = OLD_CODE)
+{
+    return [=](TEST_LIST &list) {
+        EXPECT_FAILS(NLIBCSzListSet(&list.p, index, szItem), result, code);
+    };
+}
+
+STEP Find(const char *szItem, int result)
+{
+    return [=](TEST_LIST &list) { EXPECT_QUIET(NLIBCSzListFind(list.p, szItem), result); };
+}
+
+STEP CaseFind(const char *szItem, int result)
+{
+    return [=](TEST_LIST &list) { EXPECT_QUIET(NLIBCSzListCaseFind(list.p, szItem), result); };
+}
+
+// The bytes of what is removed stay in the block.
+STEP Remove(int index, const std::string &item)
+{
+    return [=](TEST_LIST &list) { EXPECT_QUIET(NLIBCSzListRemove(list.p, index), item); };
+}
+
+STEP Sort(int fMode)
+{
+    return [=](TEST_LIST &list) {
+        EXPECT_QUIET((NLIBCSzListSort(list.p, fMode), list.p->fMode), fMode);
+    };
+}
+
+STEP Mode(int fMode)
+{
+    return [=](TEST_LIST &list) { EXPECT_EQ(list.p->fMode, fMode); };
+}
+
+STEP Items(const ITEMS &items)
+{
+    return [=](TEST_LIST &list) { EXPECT_EQ(ItemsOf(list.p), items); };
+}
+
+// The block's size, its free bytes and where its strings begin.
+STEP Block(i32 nSize, i32 nFree, i32 endOfFree)
+{
+    return [=](TEST_LIST &list) {
+        EXPECT_EQ(list.p->nSize, nSize);
+        EXPECT_EQ(list.p->nFree, nFree);
+        EXPECT_EQ(list.p->EndofFree, endOfFree);
+    };
+}
+
+STEP Slot(int index, i32 offset)
+{
+    return [=](TEST_LIST &list) { EXPECT_EQ(SlotOf(list.p, index), offset); };
+}
+
+// An empty slot is told as an empty text.
+STEP Empty(const std::vector<int> &slots)
+{
+    return [=](TEST_LIST &list) {
+        std::vector<int> found;
+        for (int i = 0; i < list.p->nItem; i++) {
+            if (IsEmptySlot(list.p, i)) {
+                EXPECT_QUIET(NLIBCSzListGet(list.p, i), std::string());
+                found.push_back(i);
+            }
+        }
+        EXPECT_EQ(found, slots);
+    };
+}
+
+const STEP COMPACT = [](TEST_LIST &list) { NLIBCSzListCompact(list.p); };
+const STEP CLEAR = [](TEST_LIST &list) { NLIBCSzListClear(list.p); };
+const STEP EXPAND = [](TEST_LIST &list) { list.p = NLIBCSzListExpand(list.p); };
+
+constexpr int NO_ORDER = 2;
+constexpr int BYTES = SZLIST_SORTED;
+constexpr int NOCASE = SZLIST_CASE_SORTED;
+
+struct LIST_CASE {
+    const char *szName;
+    std::vector<STEP> steps; // on a block of 512 bytes, 488 of them free
+};
+
+const LIST_CASE LIST_CASES[] = {
+    // 3000 characters need 3005 bytes; 488, 1000 and 2024 do not hold them, 4072 do.
+    {"PushDoublesUntilALongStringFits",
+     {Of({"first"}), Push(std::string(3000, 'x'), 1),
+      Block(4096, 4072 - 10 - 3005, 4096 - 6 - 3001), Items({"first", std::string(3000, 'x')})}},
+    {"PushHeadInsertsBeforeTheFirst", {PushHead("b", 0), PushHead("a", 0), Items({"a", "b"})}},
+    // One character, its end and one slot.
+    {"InsertMovesWhatFollowsUp",
+     {Of({"a", "c", "d"}), Block(512, 470, 506), Insert(1, "b", 1), Block(512, 464, 504),
+      Items({"a", "b", "c", "d"})}},
+    {"InsertLeavesEmptySlotsBeforeAnIndexBeyondTheEnd",
+     {Insert(5, "six", 5), Block(512, 488 - 6 * 4 - 4, 508), Empty({0, 1, 2, 3, 4}), Find("", -1),
+      CaseFind("", -1), Find("six", 5), Items({"", "", "", "", "", "six"})}},
+    {"InsertedEmptySlotsSurviveGrowth",
+     {Insert(2, "third", 2), Push(std::string(600, 'z'), 3), Block(1024, 377, 417), Empty({0, 1}),
+      Items({"", "", "third", std::string(600, 'z')})}},
+    {"AnEmptyStringIsAnItem", {Of({"a", ""}), Find("", 1), COMPACT, Items({"a", ""})}},
+    // Its only byte is the block's last one, and that is how an empty slot is told.
+    {"AnEmptyStringThatIsStoredFirstIsAnEmptySlot",
+     {Of({"", "a"}), Empty({0}), Find("", -1), COMPACT, Items({"a"})}},
+    {"ASortedListChoosesThePlace",
+     {Of({}, BYTES), Insert(99, "m", 0), Insert(0, "z", 1), Push("a", 0), PushHead("p", 2),
+      Push("Z", 0), Items({"Z", "a", "m", "p", "z"})}},
+    {"ADuplicateGoesWhereTheSearchHitsItsEqual",
+     {Of({"a", "b", "c"}, BYTES), Push("c", 2), Push("b", 1), Items({"a", "b", "b", "c", "c"})}},
+    // And puts an item before its equal.
+    {"ACaseSortedListOrdersWithoutCase",
+     {Of({}, NOCASE), Push("m", 0), Push("Z", 1), Push("A", 0), Push("a", 0),
+      Items({"a", "A", "m", "Z"})}},
+    {"AModeThatIsNoOrderTakesTheIndex",
+     {Of({"c", "a"}, NO_ORDER), Insert(1, "b", 1), Items({"c", "b", "a"})}},
+    {"FindTellsTheFirstEqualItemOfAnUnsortedList",
+     {Of({"sdb", "sda", "SDA", "sda"}), Find("sda", 1), Find("SDA", 2), Find("sd", -1),
+      Find("", -1), CaseFind("SDa", 1), CaseFind("sdc", -1)}},
+    {"FindSearchesASortedListByHalves",
+     {Of({"a", "c", "e", "g", "i"}, BYTES), Find("a", 0), Find("c", 1), Find("e", 2), Find("g", 3),
+      Find("i", 4), Find("", -1), Find("A", -1), Find("b", -1), Find("d", -1), Find("f", -1),
+      Find("h", -1), Find("j", -1), Find("aa", -1)}},
+    {"FindInASortedListWithoutItems", {Of({}, BYTES), Find("a", -1)}},
+    {"FindInACaseSortedListWithoutItems", {Of({}, NOCASE), CaseFind("a", -1)}},
+    // Halving would look for "a" before "b" and for "c" behind it.
+    {"FindSearchesAModeThatIsNoOrderFromTheStart",
+     {Of({"c", "b", "a"}, NO_ORDER), Find("a", 2), Find("b", 1), Find("c", 0), Find("d", -1),
+      CaseFind("a", 2), CaseFind("b", 1), CaseFind("c", 0), CaseFind("d", -1)}},
+    // The middle of 0..3 is 1, the middle of 0..2 is 1, the middle of 0..4 is 2.
+    {"FindHitsTheMiddleOf4", {Of({"a", "b", "b", "b"}, BYTES), Find("b", 1)}},
+    {"FindHitsTheMiddleOf3", {Of({"b", "b", "b"}, BYTES), Find("b", 1)}},
+    {"FindHitsTheMiddleOf5", {Of({"b", "b", "b", "b", "b"}, BYTES), Find("b", 2)}},
+    {"CaseFindHitsTheMiddleOf3", {Of({"b", "B", "b"}, NOCASE), CaseFind("B", 1)}},
+    // 'a' is two before 'c', the middle of five: the search gives up there although item 0 is
+    // equal.
+    {"CaseFindGivesUpAtALetterTwoPlacesFurther",
+     {Of({"a", "b", "c", "d", "e"}, NOCASE), CaseFind("a", -1), CaseFind("A", -1), CaseFind("b", 1),
+      CaseFind("e", 4)}},
+    {"FindDoesNotGiveUp", {Of({"a", "b", "c", "d", "e"}, BYTES), Find("a", 0)}},
+    // Lower-cased bytes count: 'X' is two before 'z', and '_' is two before 'A'.
+    {"CaseFindDoesNotGiveUpAtTheItemItself", {Of({"x", "Z"}, NOCASE), CaseFind("X", 0)}},
+    {"CaseFindGivesUpAtALowerCasedLetter", {Of({"X", "z", "z"}, NOCASE), CaseFind("x", -1)}},
+    {"CaseFindGivesUpAtAnUnderscore", {Of({"_", "A", "b"}, NOCASE), CaseFind("_", -1)}},
+    // The middle of three is 'd', and 'b' is two before it: the low bound at that moment is 0.
+    {"AnInsertionThatGivesUpGoesToTheLowBound",
+     {Of({"a", "d", "e"}, NOCASE), Push("b", 0), Items({"b", "a", "d", "e"})}},
+    {"AnInsertionThatGivesUpGoesBeforeItsEqual",
+     {Of({"a", "b", "c", "d", "e"}, NOCASE), Push("A", 0), Items({"A", "a", "b", "c", "d", "e"})}},
+    // After 'c' in the middle the low bound is 3; there 'd' is two before 'f'.
+    {"AnInsertionThatGivesUpLaterGoesToTheLaterLowBound",
+     {Of({"a", "b", "c", "f", "g"}, NOCASE), Push("d", 3), Items({"a", "b", "c", "d", "f", "g"})}},
+    {"RemoveClosesTheGapAndGivesFourBytesBack",
+     {Of({"a", "b", "c"}), Block(512, 470, 506), Remove(1, "b"), Block(512, 474, 506),
+      Items({"a", "c"})}},
+    {"RemoveOfTheLastItemGivesTheSlotBackButNotTheBytes",
+     {Of({"abc"}), Remove(0, "abc"), Block(512, 484, 508), Items({}), Push("def", 0),
+      Block(512, 476, 504), Items({"def"})}},
+    // Packed downward in slot order.
+    {"ExpandDoublesTheBlockAndDropsDeadBytes",
+     {Of({"abcd", "efgh", "ijkl"}, BYTES), Remove(1, "efgh"), EXPAND,
+      Block(1024, 1000 - 2 * 9, 1024 - 2 * 5), Slot(0, 1024 - 5), Slot(1, 1024 - 10), Mode(BYTES),
+      Items({"abcd", "ijkl"})}},
+    // Growing stores the strings anew in slot order, and the first one ends in the block's last
+    // byte.
+    {"ExpandTurnsAnEmptyStringThatIsTheFirstOneIntoAnEmptySlot",
+     {Of({"a"}), PushHead("", 0), Push("", 2), Find("", 0), EXPAND, Empty({0}), Find("", 2),
+      Items({"", "a", ""})}},
+    // Slot 0 is skipped, so the empty string in slot 1 is the first one.
+    {"ExpandTurnsAnEmptyStringBehindSkippedSlotsIntoOneToo",
+     {Insert(1, "a", 1), Insert(1, "", 1), Find("", 1), EXPAND, Empty({0, 1}), Find("", -1),
+      Items({"", "", "a"})}},
+    {"SetCopiesAShorterStringOverTheOld",
+     {Of({"abc", "def"}), Slot(0, 508), Set(0, "xyz", 0), Set(0, "q", 0), Slot(0, 508),
+      Block(512, 472, 504), Items({"q", "def"})}},
+    {"SetTakesNewBytesForALongerString",
+     {Of({"abc", "def"}), Block(512, 472, 504), Set(1, "longer", 1), Block(512, 465, 497),
+      Slot(1, 497), Items({"abc", "longer"})}},
+    {"SetFillsAnEmptySlotAndKeepsTheBlocksLastByte",
+     {Insert(2, "last", 2), Set(0, "", 0), Empty({0, 1}), Set(1, "x", 1), Empty({0}),
+      Items({"", "x", "last"})}},
+    {"SetSortsASortedListAgainAndTellsTheNewPlace",
+     {Of({"b", "d", "f"}, BYTES), Set(0, "e", 1), Items({"d", "e", "f"}), Set(2, "another", 0),
+      Items({"another", "d", "e"})}},
+    {"SetOfACaseSortedListIsMadeAndReportedAsAFailure",
+     {Of({"b", "d", "f"}, NOCASE), Set(0, "E", -1, ERR_BAD_PARAMETER), Items({"d", "E", "f"})}},
+    {"SortByBytes",
+     {Of({"sdb", "SDC", "sda", "sd"}), Sort(BYTES), Items({"SDC", "sd", "sda", "sdb"})}},
+    {"SortTakesBytesAsUnsigned",
+     {Of({"\xE9t\xE9", "zoo"}), Sort(BYTES), Items({"zoo", "\xE9t\xE9"}), Sort(SZLIST_UNSORTED),
+      Sort(NOCASE), Items({"zoo", "\xE9t\xE9"})}},
+    {"SortWithoutCaseKeepsTheOrderOfEquals",
+     {Of({"b", "C", "B", "a", "c", "A"}), Sort(NOCASE), Items({"a", "A", "b", "B", "C", "c"})}},
+    // '_' lies between the upper and the lower letters: only lower-casing puts it before both.
+    {"SortWithoutCaseComparesLowerCase",
+     {Of({"B", "_", "a"}), Sort(NOCASE), Items({"_", "a", "B"})}},
+    {"SortGoesByTheLowBit", {Of({"a", "B"}), Sort(17), Items({"B", "a"})}},
+    {"SortToNoOrderOnlyCompacts",
+     {Insert(1, "b", 1), Push("a", 2), Sort(NO_ORDER), Block(512, 476, 508), Items({"b", "a"})}},
+    {"SortToUnsortedOnlyCompacts",
+     {Insert(1, "b", 1), Push("a", 2), Sort(SZLIST_UNSORTED), Block(512, 476, 508),
+      Items({"b", "a"})}},
+    {"SortFromOneOrderToAnotherOnlyStoresTheMode",
+     {Of({"a", "B"}, BYTES), Sort(NOCASE), Sort(BYTES), Sort(NOCASE), Sort(0), Items({"B", "a"})}},
+    {"CompactDropsTheEmptySlots",
+     {Insert(2, "a", 2), Insert(5, "b", 5), Block(512, 460, 508), COMPACT,
+      Block(512, 460 + 4 * 4, 508), Items({"a", "b"}), COMPACT, Items({"a", "b"})}},
+    {"ClearKeepsTheBlockAndTheMode",
+     {Of({"a", "b"}, NOCASE), Push(std::string(600, 'x'), 2), CLEAR, Block(1024, 1000, 1024),
+      Mode(NOCASE), Items({})}},
+};
+
+class SzList : public testing::TestWithParam<LIST_CASE>
+{
+};
+
+TEST_P(SzList, Steps)
+{
+    const std::vector<STEP> &steps = GetParam().steps;
+    TEST_LIST list;
+    for (size_t i = 0; i < steps.size(); i++) {
+        SCOPED_TRACE(testing::Message() << "step " << i);
+        steps[i](list);
+        EXPECT_EQ(Defect(list.p), "");
+    }
+}
+
+INSTANTIATE_TEST_SUITE_P(Table, SzList, testing::ValuesIn(LIST_CASES),
+                         [](const auto &row) { return row.param.szName; });
+
+// ---- what a table does not hold -----------------------------------------------------------------
 
 TEST(SzListAlloc, GivesAtLeast512Bytes)
 {
@@ -63,19 +322,6 @@ TEST(SzListPush, DoublesAFullBlockAndKeepsTheOrder)
     EXPECT_EQ(list.p->nFree, 2024 - 126 * 8);
 }
 
-// 3000 characters need 3005 bytes; 488, 1000 and 2024 do not hold them, 4072 do.
-TEST(SzListPush, DoublesUntilALongStringFits)
-{
-    TEST_LIST list(512);
-    ASSERT_EQ(NLIBCSzListPush(&list.p, "first"), 0);
-    const std::string text(3000, 'x');
-    ASSERT_EQ(NLIBCSzListPush(&list.p, text.c_str()), 1);
-    EXPECT_EQ(list.p->nSize, 4096);
-    EXPECT_EQ(list.p->nFree, 4072 - 10 - 3005);
-    EXPECT_EQ(ItemsOf(list.p), (ITEMS{"first", text}));
-    EXPECT_EQ(Defect(list.p), "");
-}
-
 TEST(SzListPush, KeepsACopy)
 {
     TEST_LIST list;
@@ -112,70 +358,6 @@ TEST(SzListPush, TakesAStringOfTheBlockThroughSeveralDoublings)
     EXPECT_EQ(Defect(list.p), "");
 }
 
-TEST(SzListPushHead, InsertsBeforeTheFirst)
-{
-    TEST_LIST list;
-    EXPECT_QUIET(NLIBCSzListPushHead(&list.p, "b"), 0);
-    EXPECT_QUIET(NLIBCSzListPushHead(&list.p, "a"), 0);
-    EXPECT_EQ(ItemsOf(list.p), (ITEMS{"a", "b"}));
-}
-
-TEST(SzListInsert, MovesWhatFollowsUp)
-{
-    TEST_LIST list({"a", "c", "d"}, SZLIST_UNSORTED);
-    const i32 nFree = list.p->nFree;
-    EXPECT_QUIET(NLIBCSzListInsert(&list.p, 1, "b"), 1);
-    EXPECT_EQ(ItemsOf(list.p), (ITEMS{"a", "b", "c", "d"}));
-    EXPECT_EQ(list.p->nFree, nFree - 6); // one character, its end, one slot
-    EXPECT_EQ(Defect(list.p), "");
-}
-
-TEST(SzListInsert, LeavesEmptySlotsBeforeAnIndexBeyondTheEnd)
-{
-    TEST_LIST list(512);
-    EXPECT_QUIET(NLIBCSzListInsert(&list.p, 5, "six"), 5);
-    EXPECT_EQ(list.p->nItem, 6);
-    EXPECT_EQ(list.p->nFree, 488 - 6 * 4 - 4);
-    for (int i = 0; i < 5; i++) {
-        EXPECT_TRUE(IsEmptySlot(list.p, i)) << i;
-        EXPECT_STREQ(NLIBCSzListGet(list.p, i), "") << i;
-    }
-    EXPECT_QUIET(NLIBCSzListFind(list.p, ""), -1);
-    EXPECT_QUIET(NLIBCSzListCaseFind(list.p, ""), -1);
-    EXPECT_QUIET(NLIBCSzListFind(list.p, "six"), 5);
-    EXPECT_EQ(Defect(list.p), "");
-}
-
-TEST(SzListInsert, EmptySlotsSurviveGrowth)
-{
-    TEST_LIST list(512);
-    ASSERT_EQ(NLIBCSzListInsert(&list.p, 2, "third"), 2);
-    ASSERT_EQ(NLIBCSzListPush(&list.p, std::string(600, 'z').c_str()), 3);
-    EXPECT_EQ(list.p->nSize, 1024);
-    EXPECT_TRUE(IsEmptySlot(list.p, 0));
-    EXPECT_TRUE(IsEmptySlot(list.p, 1));
-    EXPECT_STREQ(NLIBCSzListGet(list.p, 2), "third");
-    EXPECT_EQ(Defect(list.p), "");
-}
-
-TEST(SzListInsert, AnEmptyStringIsAnItem)
-{
-    TEST_LIST list({"a", ""}, SZLIST_UNSORTED);
-    EXPECT_QUIET(NLIBCSzListFind(list.p, ""), 1);
-    NLIBCSzListCompact(list.p);
-    EXPECT_EQ(ItemsOf(list.p), (ITEMS{"a", ""}));
-}
-
-// Its only byte is the block's last one, and that is how an empty slot is told.
-TEST(SzListInsert, AnEmptyStringThatIsStoredFirstIsAnEmptySlot)
-{
-    TEST_LIST list({"", "a"}, SZLIST_UNSORTED);
-    EXPECT_TRUE(IsEmptySlot(list.p, 0));
-    EXPECT_QUIET(NLIBCSzListFind(list.p, ""), -1);
-    NLIBCSzListCompact(list.p);
-    EXPECT_EQ(ItemsOf(list.p), (ITEMS{"a"}));
-}
-
 // No block has 2^31 bytes, so the slots before such an index never fit one.
 TEST(SzListInsert, FailsWhenNoBlockIsLargeEnoughAndKeepsTheItems)
 {
@@ -185,220 +367,6 @@ TEST(SzListInsert, FailsWhenNoBlockIsLargeEnoughAndKeepsTheItems)
         EXPECT_EQ(ItemsOf(list.p), (ITEMS{"a", "b"}));
         EXPECT_EQ(Defect(list.p), "");
     }
-}
-
-TEST(SzListInsert, ASortedListChoosesThePlace)
-{
-    TEST_LIST list(512);
-    NLIBCSzListSort(list.p, SZLIST_SORTED);
-    EXPECT_QUIET(NLIBCSzListInsert(&list.p, 99, "m"), 0);
-    EXPECT_QUIET(NLIBCSzListInsert(&list.p, 0, "z"), 1);
-    EXPECT_QUIET(NLIBCSzListPush(&list.p, "a"), 0);
-    EXPECT_QUIET(NLIBCSzListPushHead(&list.p, "p"), 2);
-    EXPECT_QUIET(NLIBCSzListPush(&list.p, "Z"), 0);
-    EXPECT_EQ(ItemsOf(list.p), (ITEMS{"Z", "a", "m", "p", "z"}));
-    EXPECT_EQ(Defect(list.p), "");
-}
-
-TEST(SzListInsert, ADuplicateGoesWhereTheSearchHitsItsEqual)
-{
-    TEST_LIST list({"a", "b", "c"}, SZLIST_SORTED);
-    EXPECT_QUIET(NLIBCSzListPush(&list.p, "c"), 2);
-    EXPECT_QUIET(NLIBCSzListPush(&list.p, "b"), 1);
-    EXPECT_EQ(ItemsOf(list.p), (ITEMS{"a", "b", "b", "c", "c"}));
-}
-
-TEST(SzListInsert, ACaseSortedListOrdersWithoutCase)
-{
-    TEST_LIST list(512);
-    NLIBCSzListSort(list.p, SZLIST_CASE_SORTED);
-    EXPECT_QUIET(NLIBCSzListPush(&list.p, "m"), 0);
-    EXPECT_QUIET(NLIBCSzListPush(&list.p, "Z"), 1);
-    EXPECT_QUIET(NLIBCSzListPush(&list.p, "A"), 0);
-    EXPECT_QUIET(NLIBCSzListPush(&list.p, "a"), 0); // before its equal
-    EXPECT_EQ(ItemsOf(list.p), (ITEMS{"a", "A", "m", "Z"}));
-}
-
-TEST(SzListInsert, AModeThatIsNoOrderTakesTheIndex)
-{
-    TEST_LIST list({"c", "a"}, 2);
-    EXPECT_QUIET(NLIBCSzListInsert(&list.p, 1, "b"), 1);
-    EXPECT_EQ(ItemsOf(list.p), (ITEMS{"c", "b", "a"}));
-}
-
-TEST(SzListFind, TellsTheFirstEqualItemOfAnUnsortedList)
-{
-    const TEST_LIST list({"sdb", "sda", "SDA", "sda"}, SZLIST_UNSORTED);
-    EXPECT_QUIET(NLIBCSzListFind(list.p, "sda"), 1);
-    EXPECT_QUIET(NLIBCSzListFind(list.p, "SDA"), 2);
-    EXPECT_QUIET(NLIBCSzListFind(list.p, "sd"), -1);
-    EXPECT_QUIET(NLIBCSzListFind(list.p, ""), -1);
-    EXPECT_QUIET(NLIBCSzListCaseFind(list.p, "SDa"), 1);
-    EXPECT_QUIET(NLIBCSzListCaseFind(list.p, "sdc"), -1);
-}
-
-TEST(SzListFind, SearchesASortedListByHalves)
-{
-    const TEST_LIST list({"a", "c", "e", "g", "i"}, SZLIST_SORTED);
-    for (int i = 0; i < 5; i++) {
-        EXPECT_QUIET(NLIBCSzListFind(list.p, NLIBCSzListGet(list.p, i)), i);
-    }
-    for (const char *szAbsent : {"", "A", "b", "d", "f", "h", "j", "aa"}) {
-        EXPECT_QUIET(NLIBCSzListFind(list.p, szAbsent), -1);
-    }
-    EXPECT_QUIET(NLIBCSzListFind(TEST_LIST({}, SZLIST_SORTED).p, "a"), -1);
-    EXPECT_QUIET(NLIBCSzListCaseFind(TEST_LIST({}, SZLIST_CASE_SORTED).p, "a"), -1);
-}
-
-// Halving would look for "a" before "b" and for "c" behind it.
-TEST(SzListFind, AModeThatIsNoOrderIsSearchedFromTheStart)
-{
-    constexpr int NO_ORDER = 2;
-    const TEST_LIST list({"c", "b", "a"}, NO_ORDER);
-    ASSERT_EQ(list.p->fMode, NO_ORDER);
-    for (const char *szItem : {"a", "b", "c"}) {
-        EXPECT_QUIET(NLIBCSzListFind(list.p, szItem), 'c' - szItem[0]);
-        EXPECT_QUIET(NLIBCSzListCaseFind(list.p, szItem), 'c' - szItem[0]);
-    }
-    EXPECT_QUIET(NLIBCSzListFind(list.p, "d"), -1);
-    EXPECT_QUIET(NLIBCSzListCaseFind(list.p, "d"), -1);
-}
-
-// The middle of 0..3 is 1, the middle of 0..2 is 1, the middle of 0..4 is 2.
-TEST(SzListFind, AmongDuplicatesAnswersWhatTheHalvingHits)
-{
-    EXPECT_EQ(NLIBCSzListFind(TEST_LIST({"a", "b", "b", "b"}, SZLIST_SORTED).p, "b"), 1);
-    EXPECT_EQ(NLIBCSzListFind(TEST_LIST({"b", "b", "b"}, SZLIST_SORTED).p, "b"), 1);
-    EXPECT_EQ(NLIBCSzListFind(TEST_LIST({"b", "b", "b", "b", "b"}, SZLIST_SORTED).p, "b"), 2);
-    EXPECT_EQ(NLIBCSzListCaseFind(TEST_LIST({"b", "B", "b"}, SZLIST_CASE_SORTED).p, "B"), 1);
-}
-
-// 'a' is two before 'c', the middle of five: the search gives up there although item 0 is equal.
-TEST(SzListCaseFind, GivesUpAtALetterTwoPlacesFurther)
-{
-    const TEST_LIST nocase({"a", "b", "c", "d", "e"}, SZLIST_CASE_SORTED);
-    EXPECT_QUIET(NLIBCSzListCaseFind(nocase.p, "a"), -1);
-    EXPECT_QUIET(NLIBCSzListCaseFind(nocase.p, "A"), -1);
-    EXPECT_QUIET(NLIBCSzListCaseFind(nocase.p, "b"), 1);
-    EXPECT_QUIET(NLIBCSzListCaseFind(nocase.p, "e"), 4);
-    // Lower-cased bytes count: 'X' is two before 'z', and '_' is two before 'A'.
-    EXPECT_QUIET(NLIBCSzListCaseFind(TEST_LIST({"x", "Z"}, SZLIST_CASE_SORTED).p, "X"), 0);
-    EXPECT_QUIET(NLIBCSzListCaseFind(TEST_LIST({"X", "z", "z"}, SZLIST_CASE_SORTED).p, "x"), -1);
-    EXPECT_QUIET(NLIBCSzListCaseFind(TEST_LIST({"_", "A", "b"}, SZLIST_CASE_SORTED).p, "_"), -1);
-    const TEST_LIST bytes({"a", "b", "c", "d", "e"}, SZLIST_SORTED);
-    EXPECT_QUIET(NLIBCSzListFind(bytes.p, "a"), 0);
-}
-
-// The middle of three is 'd', and 'b' is two before it: the low bound at that moment is 0.
-TEST(SzListCaseFind, AnInsertionThatGivesUpGoesToTheLowBound)
-{
-    TEST_LIST list({"a", "d", "e"}, SZLIST_CASE_SORTED);
-    EXPECT_QUIET(NLIBCSzListPush(&list.p, "b"), 0);
-    EXPECT_EQ(ItemsOf(list.p), (ITEMS{"b", "a", "d", "e"}));
-
-    TEST_LIST held({"a", "b", "c", "d", "e"}, SZLIST_CASE_SORTED);
-    EXPECT_QUIET(NLIBCSzListPush(&held.p, "A"), 0);
-    EXPECT_EQ(ItemsOf(held.p), (ITEMS{"A", "a", "b", "c", "d", "e"}));
-
-    // After 'c' in the middle the low bound is 3; there 'd' is two before 'f'.
-    TEST_LIST upper({"a", "b", "c", "f", "g"}, SZLIST_CASE_SORTED);
-    EXPECT_QUIET(NLIBCSzListPush(&upper.p, "d"), 3);
-    EXPECT_EQ(ItemsOf(upper.p), (ITEMS{"a", "b", "c", "d", "f", "g"}));
-}
-
-TEST(SzListRemove, ClosesTheGapAndGivesFourBytesBack)
-{
-    TEST_LIST list({"a", "b", "c"}, SZLIST_UNSORTED);
-    const i32 nFree = list.p->nFree;
-    const i32 endOfFree = list.p->EndofFree;
-    RecordReset();
-    EXPECT_STREQ(NLIBCSzListRemove(list.p, 1), "b") << "the bytes stay in the block";
-    EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
-    EXPECT_EQ(ItemsOf(list.p), (ITEMS{"a", "c"}));
-    EXPECT_EQ(list.p->nFree, nFree + 4);
-    EXPECT_EQ(list.p->EndofFree, endOfFree);
-    EXPECT_EQ(Defect(list.p), "");
-}
-
-TEST(SzListRemove, OfTheLastItemGivesTheSlotBackButNotTheBytes)
-{
-    TEST_LIST list(512);
-    ASSERT_EQ(NLIBCSzListPush(&list.p, "abc"), 0); // 488 - 8
-    EXPECT_STREQ(NLIBCSzListRemove(list.p, 0), "abc");
-    EXPECT_EQ(list.p->nFree, 484);
-    ASSERT_EQ(NLIBCSzListPush(&list.p, "def"), 0);
-    EXPECT_EQ(list.p->nFree, 476);
-    EXPECT_EQ(list.p->EndofFree, 512 - 8);
-    EXPECT_EQ(ItemsOf(list.p), (ITEMS{"def"}));
-}
-
-TEST(SzListExpand, DoublesTheBlockAndDropsDeadBytes)
-{
-    TEST_LIST list({"abcd", "efgh", "ijkl"}, SZLIST_SORTED);
-    ASSERT_NE(NLIBCSzListRemove(list.p, 1), nullptr);
-    const PNLIBSZLIST pNew = NLIBCSzListExpand(list.p);
-    ASSERT_NE(pNew, nullptr);
-    list.p = pNew;
-    EXPECT_EQ(list.p->nSize, 1024);
-    EXPECT_EQ(list.p->nFree, 1000 - 2 * 9);
-    EXPECT_EQ(list.p->fMode, SZLIST_SORTED);
-    EXPECT_EQ(list.p->EndofFree, 1024 - 2 * 5);
-    EXPECT_EQ(SlotOf(list.p, 0), 1024 - 5) << "packed downward in slot order";
-    EXPECT_EQ(SlotOf(list.p, 1), 1024 - 10);
-    EXPECT_EQ(ItemsOf(list.p), (ITEMS{"abcd", "ijkl"}));
-    EXPECT_EQ(Defect(list.p), "");
-}
-
-// Growing stores the strings anew in slot order, and the first one ends in the block's last byte.
-TEST(SzListExpand, AnEmptyStringThatIsTheFirstOneTurnsIntoAnEmptySlot)
-{
-    TEST_LIST list({"a"}, SZLIST_UNSORTED);
-    ASSERT_EQ(NLIBCSzListPushHead(&list.p, ""), 0);
-    ASSERT_EQ(NLIBCSzListPush(&list.p, ""), 2);
-    EXPECT_QUIET(NLIBCSzListFind(list.p, ""), 0);
-    list.p = NLIBCSzListExpand(list.p);
-    EXPECT_TRUE(IsEmptySlot(list.p, 0));
-    EXPECT_FALSE(IsEmptySlot(list.p, 2));
-    EXPECT_QUIET(NLIBCSzListFind(list.p, ""), 2);
-    EXPECT_EQ(ItemsOf(list.p), (ITEMS{"", "a", ""}));
-    EXPECT_EQ(Defect(list.p), "");
-}
-
-// Slot 0 is skipped, so the empty string in slot 1 is the first one.
-TEST(SzListExpand, AnEmptyStringBehindSkippedSlotsTurnsIntoOneToo)
-{
-    TEST_LIST list;
-    ASSERT_EQ(NLIBCSzListInsert(&list.p, 1, "a"), 1);
-    ASSERT_EQ(NLIBCSzListInsert(&list.p, 1, ""), 1);
-    EXPECT_QUIET(NLIBCSzListFind(list.p, ""), 1);
-    list.p = NLIBCSzListExpand(list.p);
-    EXPECT_TRUE(IsEmptySlot(list.p, 1));
-    EXPECT_QUIET(NLIBCSzListFind(list.p, ""), -1);
-}
-
-TEST(SzListSet, CopiesAShorterStringOverTheOld)
-{
-    TEST_LIST list({"abc", "def"}, SZLIST_UNSORTED);
-    const i32 nFree = list.p->nFree;
-    const i32 offset = SlotOf(list.p, 0);
-    EXPECT_QUIET(NLIBCSzListSet(&list.p, 0, "xyz"), 0);
-    EXPECT_QUIET(NLIBCSzListSet(&list.p, 0, "q"), 0);
-    EXPECT_EQ(ItemsOf(list.p), (ITEMS{"q", "def"}));
-    EXPECT_EQ(SlotOf(list.p, 0), offset);
-    EXPECT_EQ(list.p->nFree, nFree);
-}
-
-TEST(SzListSet, TakesNewBytesForALongerString)
-{
-    TEST_LIST list({"abc", "def"}, SZLIST_UNSORTED);
-    const i32 nFree = list.p->nFree;
-    const i32 endOfFree = list.p->EndofFree;
-    EXPECT_QUIET(NLIBCSzListSet(&list.p, 1, "longer"), 1);
-    EXPECT_EQ(ItemsOf(list.p), (ITEMS{"abc", "longer"}));
-    EXPECT_EQ(list.p->nFree, nFree - 7);
-    EXPECT_EQ(SlotOf(list.p, 1), endOfFree - 7);
-    EXPECT_EQ(list.p->nSize, 512);
-    EXPECT_EQ(Defect(list.p), "");
 }
 
 // 24 bytes of header, two slots, 10 bytes free, strings of 468 and 2: the 14 bytes of the new one
@@ -415,134 +383,11 @@ TEST(SzListSet, DoesNotLookWhetherALongerStringFits)
     EXPECT_EQ(list.p->nSize, 512);
 }
 
-TEST(SzListSet, FillsAnEmptySlotAndKeepsTheBlocksLastByte)
-{
-    TEST_LIST list(512);
-    ASSERT_EQ(NLIBCSzListInsert(&list.p, 2, "last"), 2);
-    EXPECT_QUIET(NLIBCSzListSet(&list.p, 0, ""), 0);
-    EXPECT_TRUE(IsEmptySlot(list.p, 0));
-    EXPECT_QUIET(NLIBCSzListSet(&list.p, 1, "x"), 1);
-    EXPECT_EQ(ItemsOf(list.p), (ITEMS{"", "x", "last"}));
-    EXPECT_EQ(Defect(list.p), "");
-}
-
 TEST(SzListSet, TakesAPartOfTheStringItReplaces)
 {
     TEST_LIST list({"/dev/sda"}, SZLIST_UNSORTED);
     EXPECT_QUIET(NLIBCSzListSet(&list.p, 0, NLIBCSzListGet(list.p, 0) + 5), 0);
     EXPECT_EQ(ItemsOf(list.p), (ITEMS{"sda"}));
-}
-
-TEST(SzListSet, SortsASortedListAgainAndTellsTheNewPlace)
-{
-    TEST_LIST list({"b", "d", "f"}, SZLIST_SORTED);
-    EXPECT_QUIET(NLIBCSzListSet(&list.p, 0, "e"), 1);
-    EXPECT_EQ(ItemsOf(list.p), (ITEMS{"d", "e", "f"}));
-    EXPECT_QUIET(NLIBCSzListSet(&list.p, 2, "another"), 0);
-    EXPECT_EQ(ItemsOf(list.p), (ITEMS{"another", "d", "e"}));
-    EXPECT_EQ(Defect(list.p), "");
-}
-
-TEST(SzListSet, OfACaseSortedListIsMadeAndReportedAsAFailure)
-{
-    TEST_LIST list({"b", "d", "f"}, SZLIST_CASE_SORTED);
-    EXPECT_FAILS(NLIBCSzListSet(&list.p, 0, "E"), -1, ERR_BAD_PARAMETER);
-    EXPECT_EQ(ItemsOf(list.p), (ITEMS{"d", "E", "f"}));
-}
-
-TEST(SzListSort, ByBytes)
-{
-    TEST_LIST list({"sdb", "SDC", "sda", "sd"}, SZLIST_UNSORTED);
-    NLIBCSzListSort(list.p, SZLIST_SORTED);
-    EXPECT_EQ(ItemsOf(list.p), (ITEMS{"SDC", "sd", "sda", "sdb"}));
-    EXPECT_EQ(list.p->fMode, 1);
-    EXPECT_EQ(Defect(list.p), "");
-}
-
-TEST(SzListSort, ByBytesTakesThemAsUnsigned)
-{
-    TEST_LIST list({"\xE9t\xE9", "zoo"}, SZLIST_UNSORTED);
-    NLIBCSzListSort(list.p, SZLIST_SORTED);
-    EXPECT_EQ(ItemsOf(list.p), (ITEMS{"zoo", "\xE9t\xE9"}));
-    NLIBCSzListSort(list.p, SZLIST_UNSORTED);
-    NLIBCSzListSort(list.p, SZLIST_CASE_SORTED);
-    EXPECT_EQ(ItemsOf(list.p), (ITEMS{"zoo", "\xE9t\xE9"}));
-}
-
-TEST(SzListSort, WithoutCaseKeepsTheOrderOfEquals)
-{
-    TEST_LIST list({"b", "C", "B", "a", "c", "A"}, SZLIST_UNSORTED);
-    NLIBCSzListSort(list.p, SZLIST_CASE_SORTED);
-    EXPECT_EQ(ItemsOf(list.p), (ITEMS{"a", "A", "b", "B", "C", "c"}));
-    EXPECT_EQ(list.p->fMode, 16);
-}
-
-// '_' lies between the upper and the lower letters: only lower-casing puts it before both.
-TEST(SzListSort, WithoutCaseComparesLowerCase)
-{
-    TEST_LIST list({"B", "_", "a"}, SZLIST_UNSORTED);
-    NLIBCSzListSort(list.p, SZLIST_CASE_SORTED);
-    EXPECT_EQ(ItemsOf(list.p), (ITEMS{"_", "a", "B"}));
-}
-
-TEST(SzListSort, TheLowBitWins)
-{
-    TEST_LIST list({"a", "B"}, SZLIST_UNSORTED);
-    NLIBCSzListSort(list.p, 17);
-    EXPECT_EQ(ItemsOf(list.p), (ITEMS{"B", "a"}));
-    EXPECT_EQ(list.p->fMode, 17);
-}
-
-TEST(SzListSort, ToNoOrderOnlyCompacts)
-{
-    for (const int fMode : {0, 2}) {
-        TEST_LIST list(512);
-        ASSERT_EQ(NLIBCSzListInsert(&list.p, 1, "b"), 1);
-        ASSERT_EQ(NLIBCSzListPush(&list.p, "a"), 2);
-        const i32 nFree = list.p->nFree;
-        NLIBCSzListSort(list.p, fMode);
-        EXPECT_EQ(ItemsOf(list.p), (ITEMS{"b", "a"}));
-        EXPECT_EQ(list.p->nFree, nFree + 4);
-        EXPECT_EQ(list.p->fMode, fMode);
-    }
-}
-
-TEST(SzListSort, FromOneOrderToAnotherOnlyStoresTheMode)
-{
-    TEST_LIST list({"a", "B"}, SZLIST_SORTED);
-    for (const int fMode : {SZLIST_CASE_SORTED, SZLIST_SORTED, SZLIST_CASE_SORTED, 0}) {
-        NLIBCSzListSort(list.p, fMode);
-        EXPECT_EQ(ItemsOf(list.p), (ITEMS{"B", "a"}));
-        EXPECT_EQ(list.p->fMode, fMode);
-    }
-}
-
-TEST(SzListCompact, DropsTheEmptySlots)
-{
-    TEST_LIST list(512);
-    ASSERT_EQ(NLIBCSzListInsert(&list.p, 2, "a"), 2);
-    ASSERT_EQ(NLIBCSzListInsert(&list.p, 5, "b"), 5);
-    const i32 nFree = list.p->nFree;
-    NLIBCSzListCompact(list.p);
-    EXPECT_EQ(ItemsOf(list.p), (ITEMS{"a", "b"}));
-    EXPECT_EQ(list.p->nFree, nFree + 4 * 4);
-    EXPECT_EQ(Defect(list.p), "");
-    NLIBCSzListCompact(list.p);
-    EXPECT_EQ(ItemsOf(list.p), (ITEMS{"a", "b"}));
-}
-
-TEST(SzListClear, KeepsTheBlockAndTheMode)
-{
-    TEST_LIST list({"a", "b"}, SZLIST_CASE_SORTED);
-    ASSERT_GE(NLIBCSzListPush(&list.p, std::string(600, 'x').c_str()), 0);
-    ASSERT_EQ(list.p->nSize, 1024);
-    NLIBCSzListClear(list.p);
-    EXPECT_EQ(list.p->nSize, 1024);
-    EXPECT_EQ(list.p->nItem, 0);
-    EXPECT_EQ(list.p->nFree, 1000);
-    EXPECT_EQ(list.p->EndofFree, 1024);
-    EXPECT_EQ(list.p->fMode, SZLIST_CASE_SORTED);
-    EXPECT_EQ(Defect(list.p), "");
 }
 
 TEST(SzListDump, PrintsAddressesAndCounts)
