@@ -11,3 +11,6 @@ if(NOT TARGET GTest::gtest_main)
         add_library(GTest::gtest_main ALIAS gtest_main)
     endif()
 endif()
+
+# What nearly every test includes, parsed once for a test program: half of what compiling them takes.
+set(TEST_HEADERS <gtest/gtest.h> <functional> <map> <string> <vector>)
