@@ -12,6 +12,7 @@ szDiskSize=6G
 szKeepDir=
 szBuildDir=$SOURCE_DIR/build/release
 nSilence=$((2 * SILENCE_SECONDS))
+szTool=${ARRAYCTL_TOOL:-}
 szConsoleCopy=
 szWorkDir=
 szBaseDir=
@@ -60,6 +61,7 @@ machine_options_check() {
     for szFile in "${files[@]}"; do
         [[ $szFile == ?*:/?* && -e ${szFile%%:*} ]] || die "--file takes SRC:/DEST, not $szFile"
     done
+    [ -z "$szTool" ] || [ -x "$szTool" ] || die "no program $szTool"
     [ "$szBuildDir" = none ] || [ -x "$szBuildDir/tool/arrayctl" ] ||
         die "no tool/arrayctl in $szBuildDir; build it (cmake --preset release &&" \
             "cmake --build --preset release), or say --build none"
@@ -89,6 +91,7 @@ machine_overlay() {
     overlay_build "$szRoot" tool/arrayctl /usr/sbin/arrayctl
     overlay_build "$szRoot" platform/mdrequests/mdrequests /usr/sbin/mdrequests
     overlay_build "$szRoot" platform/sfdisk/sfdisk /usr/sbin/sfdisk
+    [ -z "$szTool" ] || overlay_file "$szRoot" "$szTool" /usr/sbin/arrayctl
     for szFile in "${files[@]}"; do
         overlay_file "$szRoot" "${szFile%%:*}" "${szFile#*:}"
     done
