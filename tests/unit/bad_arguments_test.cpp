@@ -12,6 +12,7 @@
 #include "nurocore/text.h"
 
 #include "last_error.h"
+#include "table.h"
 #include "test_files.h"
 #include "test_hash.h"
 
@@ -78,14 +79,25 @@ void ExpectUnchanged(const GIVEN &given)
     EXPECT_EQ(given.info.diskIndex, 99);
 }
 
+// The call without what a test's name cannot hold.
+std::string NameOf(const char *szCall)
+{
+    std::string name;
+    for (const char *pch = szCall; *pch != '\0'; pch++) {
+        name += *pch == '-' ? "Minus" : isalnum(*pch) != 0 ? std::string(1, *pch) : "";
+    }
+    return name;
+}
+
 struct BAD_CALL {
-    const char *szText;
+    std::string szName;
     std::function<void(GIVEN &)> expect;
     u32 code;
 };
 
-// The call's text, and that it returns what stands beside it.
-#define CALL(call, result) #call, [](GIVEN & given) { EXPECT_EQ((void(given), call), result); }
+// The call's name, and that it returns what stands beside it.
+#define CALL(call, result)                                                                         \
+    NameOf(#call), [](GIVEN &given) { EXPECT_EQ((void(given), call), result); }
 
 const BAD_CALL BAD_CALLS[] = {
     // lists
@@ -220,11 +232,7 @@ const BAD_CALL BAD_CALLS[] = {
     {CALL(DiskPathParse("mmcblk0", nullptr), -1), BAD},
 };
 
-class BadArguments : public testing::TestWithParam<BAD_CALL>
-{
-};
-
-TEST_P(BadArguments, AreRefused)
+TEST_ROWS(BadArguments, BAD_CALLS)
 {
     constexpr int ERRNO_AT_ENTRY = ENOTTY; // no call here fails with it
     constexpr std::pair<int, int> LISTS_AND_FLAGS[] = {
@@ -240,17 +248,5 @@ TEST_P(BadArguments, AreRefused)
         ExpectUnchanged(given);
     }
 }
-
-// The call without what a test's name cannot hold.
-std::string NameOf(const testing::TestParamInfo<BAD_CALL> &info)
-{
-    std::string name;
-    for (const char ch : std::string(info.param.szText)) {
-        name += ch == '-' ? "Minus" : isalnum(ch) != 0 ? std::string(1, ch) : "";
-    }
-    return name;
-}
-
-INSTANTIATE_TEST_SUITE_P(Call, BadArguments, testing::ValuesIn(BAD_CALLS), NameOf);
 
 } // namespace

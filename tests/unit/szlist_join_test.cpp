@@ -4,14 +4,18 @@
 #include "nurocore/szlist.h"
 
 #include "last_error.h"
+#include "table.h"
 #include "test_szlist.h"
 
 #include <algorithm>
 #include <cstdlib>
 #include <cstring>
+#include <string_view>
 
 namespace
 {
+
+using std::literals::operator""sv;
 
 // A heap buffer that a join may enlarge.
 struct JOIN_BUFFER {
@@ -31,47 +35,44 @@ struct JOIN_BUFFER {
     }
 };
 
-// Two units of one item and one separator each, and the terminator: 5.
-TEST(SzListJoin, EnlargesABufferOfNoBytes)
+struct JOIN_CASE {
+    const char *szName;
+    ITEMS items;
+    const char *szSeparator;
+    int cb; // of the buffer, full of 'X'
+    int result;
+    int cbAfter;
+    std::string_view bytes; // the buffer begins with afterwards
+};
+
+const JOIN_CASE JOIN_CASES[] = {
+    // Two units of one item and one separator each, and the terminator: 5.
+    {"EnlargesABufferOfNoBytes", {"a", "b"}, ",", 0, 5, 5, "a,b\0"sv},
+    {"EnlargesABufferThatIsTooSmall", {"a", "b"}, ",", 4, 5, 5, "a,b\0"sv},
+    {"KeepsABufferOfTheVerySize", {"a", "b"}, ",", 5, 5, 5, "a,b\0"sv},
+    {"KeepsALargerBufferAndClearsTheRest", {"a", "b"}, ",", 9, 5, 9, "a,b\0\0\0\0\0\0"sv},
+    {"CountsALongSeparatorOncePerItem", // 3 * (4 + 6) + 1
+     {"sda1", "sdb1", "sdc1"},
+     " /dev/",
+     0,
+     31,
+     31,
+     "sda1 /dev/sdb1 /dev/sdc1\0"sv},
+    {"NeedsNoSeparator", {"sda1", "sdb1", "sdc1"}, "", 0, 13, 13, "sda1sdb1sdc1\0"sv},
+    {"LeavesTheBufferToAnEmptyList", {}, ",", 3, 0, 3, "XXX"sv},
+};
+
+TEST_ROWS(SzListJoin, JOIN_CASES)
 {
-    const TEST_LIST list({"a", "b"}, SZLIST_UNSORTED);
-    JOIN_BUFFER buffer(0);
-    EXPECT_QUIET(NLIBCSzListJoin(list.p, ",", &buffer.psz, &buffer.cb), 5);
-    EXPECT_STREQ(buffer.psz, "a,b");
-    EXPECT_EQ(buffer.cb, 5);
+    const JOIN_CASE &row = GetParam();
+    const TEST_LIST list(row.items, SZLIST_UNSORTED);
+    JOIN_BUFFER buffer(row.cb);
+    EXPECT_QUIET(NLIBCSzListJoin(list.p, row.szSeparator, &buffer.psz, &buffer.cb), row.result);
+    ASSERT_EQ(buffer.cb, row.cbAfter);
+    EXPECT_EQ(std::string_view(buffer.psz, row.bytes.size()), row.bytes);
 }
 
-TEST(SzListJoin, KeepsABufferThatIsLargeEnoughAndClearsTheRest)
-{
-    const TEST_LIST list({"a", "b"}, SZLIST_UNSORTED);
-    JOIN_BUFFER buffer(9);
-    EXPECT_QUIET(NLIBCSzListJoin(list.p, ",", &buffer.psz, &buffer.cb), 5);
-    EXPECT_EQ(buffer.cb, 9);
-    EXPECT_EQ(memcmp(buffer.psz, "a,b\0\0\0\0\0\0", 9), 0);
-
-    JOIN_BUFFER exact(5);
-    EXPECT_QUIET(NLIBCSzListJoin(list.p, ",", &exact.psz, &exact.cb), 5);
-    EXPECT_EQ(exact.cb, 5);
-
-    JOIN_BUFFER tooSmall(4);
-    EXPECT_QUIET(NLIBCSzListJoin(list.p, ",", &tooSmall.psz, &tooSmall.cb), 5);
-    EXPECT_EQ(tooSmall.cb, 5);
-    EXPECT_STREQ(tooSmall.psz, "a,b");
-}
-
-TEST(SzListJoin, CountsALongSeparatorOncePerItem)
-{
-    const TEST_LIST list({"sda1", "sdb1", "sdc1"}, SZLIST_UNSORTED);
-    JOIN_BUFFER buffer(0);
-    EXPECT_QUIET(NLIBCSzListJoin(list.p, " /dev/", &buffer.psz, &buffer.cb), 3 * (4 + 6) + 1);
-    EXPECT_STREQ(buffer.psz, "sda1 /dev/sdb1 /dev/sdc1");
-
-    JOIN_BUFFER bare(0);
-    EXPECT_QUIET(NLIBCSzListJoin(list.p, "", &bare.psz, &bare.cb), 13);
-    EXPECT_STREQ(bare.psz, "sda1sdb1sdc1");
-}
-
-TEST(SzListJoin, JoinsEmptySlotsAsEmptyTexts)
+TEST(SzListJoinEmptySlots, JoinsEmptySlotsAsEmptyTexts)
 {
     TEST_LIST list({"a"}, SZLIST_UNSORTED);
     ASSERT_EQ(NLIBCSzListInsert(&list.p, 2, "b"), 2);
@@ -80,186 +81,141 @@ TEST(SzListJoin, JoinsEmptySlotsAsEmptyTexts)
     EXPECT_STREQ(buffer.psz, "a,,b");
 }
 
-TEST(SzListJoin, LeavesTheBufferToAnEmptyList)
+// 16 bytes, all of them 'X' before.
+struct DUMP_CASE {
+    const char *szName;
+    ITEMS items;
+    const char *szSeparator;
+    int cbOut; // that the callee is told of
+    int result;
+    std::string_view bytes;
+};
+
+const DUMP_CASE DUMP_CASES[] = {
+    {"All", {"ab", "cd"}, ",", 16, 5, "ab,cd\0\0\0\0\0\0\0\0\0\0\0"sv},
+    {"WhatJustFits", {"ab", "cd"}, ",", 6, 5, "ab,cd\0XXXXXXXXXX"sv},
+    {"WithoutSeparator", {"ab", "cd"}, "", 5, 4, "abcd\0XXXXXXXXXXX"sv},
+    {"ALongSeparator", {"ab", "cd"}, " and ", 16, 9, "ab and cd\0\0\0\0\0\0\0"sv},
+    {"OneItem", {"ab"}, ",", 7, 2, "ab\0\0\0\0\0XXXXXXXXX"sv},
+    {"NoItem", {}, ",", 7, 0, "\0\0\0\0\0\0\0XXXXXXXXX"sv},
+    // up to the unit that does not fit
+    {"OneByteShort", {"ab", "cd"}, ",", 5, -1, "ab\0\0\0XXXXXXXXXXX"sv},
+    {"OneItemOfTwo", {"ab", "cd"}, ",", 3, -1, "ab\0XXXXXXXXXXXXX"sv},
+    {"NotEvenOneItem", {"ab", "cd"}, ",", 2, -1, "\0\0XXXXXXXXXXXXXX"sv},
+    {"NothingButTheEnd", {"ab", "cd"}, ",", 1, -1, "\0XXXXXXXXXXXXXXX"sv},
+    {"ALongItem", {"ab", "cdefg"}, ",", 7, -1, "ab\0\0\0\0\0XXXXXXXXX"sv},
+};
+
+TEST_ROWS(SzListDump2Str, DUMP_CASES)
 {
-    const TEST_LIST list;
-    JOIN_BUFFER buffer(3);
-    EXPECT_QUIET(NLIBCSzListJoin(list.p, ",", &buffer.psz, &buffer.cb), 0);
-    EXPECT_EQ(std::string(buffer.psz, 3), std::string(3, 'X'));
-    EXPECT_EQ(buffer.cb, 3);
-}
-
-TEST(SzListDump2Str, WritesWhatFits)
-{
-    const TEST_LIST list({"ab", "cd"}, SZLIST_UNSORTED);
-    char szOut[16];
-    EXPECT_QUIET(NLIBCSzListDump2Str(list.p, ",", szOut, 16), 5);
-    EXPECT_STREQ(szOut, "ab,cd");
-    EXPECT_QUIET(NLIBCSzListDump2Str(list.p, ",", szOut, 6), 5);
-    EXPECT_STREQ(szOut, "ab,cd");
-    EXPECT_QUIET(NLIBCSzListDump2Str(list.p, "", szOut, 5), 4);
-    EXPECT_STREQ(szOut, "abcd");
-    EXPECT_QUIET(NLIBCSzListDump2Str(list.p, " and ", szOut, 16), 9);
-    EXPECT_STREQ(szOut, "ab and cd");
-}
-
-TEST(SzListDump2Str, StopsBeforeTheUnitThatDoesNotFit)
-{
-    const TEST_LIST list({"ab", "cd"}, SZLIST_UNSORTED);
-    struct CASE {
-        int cbOut;
-        const char *szLeft;
-    };
-    for (const CASE &row : {CASE{5, "ab"}, CASE{3, "ab"}, CASE{2, ""}, CASE{1, ""}}) {
-        char szOut[8] = "XXXXXXX";
-        EXPECT_FAILS(NLIBCSzListDump2Str(list.p, ",", szOut, row.cbOut), -1, ERR_OUT_OF_SPACE);
-        EXPECT_STREQ(szOut, row.szLeft) << row.cbOut;
-        EXPECT_EQ(szOut[row.cbOut], 'X') << "nothing behind the caller's bytes";
-    }
-}
-
-TEST(SzListDump2Str, ClearsTheWholeText)
-{
-    char achOut[8] = {'X', 'X', 'X', 'X', 'X', 'X', 'X', 'X'};
-    EXPECT_QUIET(NLIBCSzListDump2Str(TEST_LIST().p, ",", achOut, 7), 0);
-    EXPECT_EQ(std::string(achOut, 8), std::string(7, '\0') + "X");
-
-    memset(achOut, 'X', 8);
-    EXPECT_QUIET(NLIBCSzListDump2Str(TEST_LIST({"ab"}, SZLIST_UNSORTED).p, ",", achOut, 7), 2);
-    EXPECT_EQ(std::string(achOut, 8), "ab" + std::string(5, '\0') + "X");
-
-    memset(achOut, 'X', 8);
-    const TEST_LIST list({"ab", "cdefg"}, SZLIST_UNSORTED);
-    EXPECT_FAILS(NLIBCSzListDump2Str(list.p, ",", achOut, 7), -1, ERR_OUT_OF_SPACE);
-    EXPECT_EQ(std::string(achOut, 8), "ab" + std::string(5, '\0') + "X");
+    const DUMP_CASE &row = GetParam();
+    const TEST_LIST list(row.items, SZLIST_UNSORTED);
+    std::string out(16, 'X');
+    EXPECT_FAILS(NLIBCSzListDump2Str(list.p, row.szSeparator, out.data(), row.cbOut), row.result,
+                 row.result == -1 ? ERR_OUT_OF_SPACE : OLD_CODE);
+    EXPECT_EQ(out, row.bytes);
 }
 
 constexpr int IN_PLACE = 0;
 constexpr int IN_PLACE_KEEP = 1; // neither 0 nor the flag of a new list
 
+struct ORDERED {
+    ITEMS items;
+    int fMode;
+};
+
+ORDERED Unsorted(const ITEMS &items)
+{
+    return {items, SZLIST_UNSORTED};
+}
+
+ORDERED Bytes(const ITEMS &items)
+{
+    return {items, SZLIST_SORTED};
+}
+
+ORDERED NoCase(const ITEMS &items)
+{
+    return {items, SZLIST_CASE_SORTED};
+}
+
 struct OR_CASE {
-    const char *szWhat;
-    ITEMS a;
-    int fModeA;
-    ITEMS b;
-    int fModeB;
+    const char *szName;
+    ORDERED a;
+    ORDERED b;
     int flags;
-    ITEMS expected;
-    int fModeExpected;
+    ORDERED expected;
 };
 
 const OR_CASE OR_CASES[] = {
     // unsorted with sorted: B's items, and what only A holds
-    {"in place, A's copies removed",
-     {"c", "x", "b"},
-     0,
-     {"b", "c"},
-     1,
-     IN_PLACE,
-     {"x", "b", "c"},
-     0},
-    {"in place, A's copies kept",
-     {"c", "x", "b"},
-     0,
-     {"b", "c"},
-     1,
-     IN_PLACE_KEEP,
-     {"c", "x", "b", "b", "c"},
-     0},
-    {"new", {"c", "x", "b"}, 0, {"b", "c"}, 1, SZLIST_OR_NEW, {"b", "c", "x"}, 0},
-    {"every copy of A's removed", {"b", "b", "x"}, 0, {"b"}, 1, IN_PLACE, {"x", "b"}, 0},
-    {"by bytes, case tells apart", {"B", "x"}, 0, {"b"}, 1, IN_PLACE, {"B", "x", "b"}, 0},
-    {"without case, in place", {"B", "x"}, 0, {"b"}, 16, IN_PLACE, {"x", "b"}, 0},
-    {"without case, new", {"B", "x"}, 0, {"b"}, 16, SZLIST_OR_NEW, {"b", "x"}, 0},
-    {"A without items", {}, 0, {"b", "c"}, 1, IN_PLACE, {"b", "c"}, 0},
-    {"B without items", {"a"}, 0, {}, 1, IN_PLACE, {"a"}, 0},
-    {"B without items, new", {"b", "a"}, 0, {}, 1, SZLIST_OR_NEW, {"b", "a"}, 0},
+    {"InPlaceCopiesOfARemoved", Unsorted({"c", "x", "b"}), Bytes({"b", "c"}), IN_PLACE,
+     Unsorted({"x", "b", "c"})},
+    {"InPlaceCopiesOfAKept", Unsorted({"c", "x", "b"}), Bytes({"b", "c"}), IN_PLACE_KEEP,
+     Unsorted({"c", "x", "b", "b", "c"})},
+    {"New", Unsorted({"c", "x", "b"}), Bytes({"b", "c"}), SZLIST_OR_NEW, Unsorted({"b", "c", "x"})},
+    {"EveryCopyOfARemoved", Unsorted({"b", "b", "x"}), Bytes({"b"}), IN_PLACE,
+     Unsorted({"x", "b"})},
+    {"ByBytesCaseTellsApart", Unsorted({"B", "x"}), Bytes({"b"}), IN_PLACE,
+     Unsorted({"B", "x", "b"})},
+    {"WithoutCaseInPlace", Unsorted({"B", "x"}), NoCase({"b"}), IN_PLACE, Unsorted({"x", "b"})},
+    {"WithoutCaseNew", Unsorted({"B", "x"}), NoCase({"b"}), SZLIST_OR_NEW, Unsorted({"b", "x"})},
+    {"AWithoutItems", Unsorted({}), Bytes({"b", "c"}), IN_PLACE, Unsorted({"b", "c"})},
+    {"BWithoutItems", Unsorted({"a"}), Bytes({}), IN_PLACE, Unsorted({"a"})},
+    {"BWithoutItemsNew", Unsorted({"b", "a"}), Bytes({}), SZLIST_OR_NEW, Unsorted({"b", "a"})},
     // both unsorted
-    {"unsorted, in place", {"b", "a"}, 0, {"c", "a"}, 0, IN_PLACE, {"b", "a", "c"}, 0},
-    {"unsorted, in place by bytes", {"a"}, 0, {"A"}, 0, IN_PLACE, {"a", "A"}, 0},
-    {"unsorted, new takes all",
-     {"b", "a"},
-     0,
-     {"c", "a"},
-     0,
-     SZLIST_OR_NEW,
-     {"b", "a", "c", "a"},
-     0},
+    {"UnsortedInPlace", Unsorted({"b", "a"}), Unsorted({"c", "a"}), IN_PLACE,
+     Unsorted({"b", "a", "c"})},
+    {"UnsortedInPlaceByBytes", Unsorted({"a"}), Unsorted({"A"}), IN_PLACE, Unsorted({"a", "A"})},
+    {"UnsortedNewTakesAll", Unsorted({"b", "a"}), Unsorted({"c", "a"}), SZLIST_OR_NEW,
+     Unsorted({"b", "a", "c", "a"})},
     // both in one order
-    {"sorted, in place",
-     {"a", "c", "e"},
-     1,
-     {"b", "c", "f", "g"},
-     1,
-     IN_PLACE,
-     {"a", "b", "c", "e", "f", "g"},
-     1},
-    {"sorted, in place, an end in common",
-     {"b", "z"},
-     1,
-     {"a", "z"},
-     1,
-     IN_PLACE,
-     {"a", "b", "z"},
-     1},
-    {"sorted, new",
-     {"a", "c", "e"},
-     1,
-     {"b", "c", "f", "g"},
-     1,
-     SZLIST_OR_NEW,
-     {"a", "b", "c", "e", "f", "g"},
-     1},
-    {"sorted, A is longer",
-     {"a", "c", "e", "g"},
-     1,
-     {"b"},
-     1,
-     SZLIST_OR_NEW,
-     {"a", "b", "c", "e", "g"},
-     1},
-    {"sorted, A's own duplicates stay", {"a", "a"}, 1, {"a"}, 1, IN_PLACE, {"a", "a"}, 1},
-    {"sorted by bytes, two apart is nothing special", {"a"}, 1, {"c"}, 1, IN_PLACE, {"a", "c"}, 1},
-    {"without case, A's copy is kept",
-     {"A", "f"},
-     16,
-     {"a", "k"},
-     16,
-     IN_PLACE,
-     {"A", "f", "k"},
-     16},
-    {"without case, new", {"A", "f"}, 16, {"a", "k"}, 16, SZLIST_OR_NEW, {"A", "f", "k"}, 16},
-    {"sorted, A without items", {}, 1, {"b", "c"}, 1, SZLIST_OR_NEW, {"b", "c"}, 1},
-    {"sorted, B without items", {"a", "b"}, 1, {}, 1, SZLIST_OR_NEW, {"a", "b"}, 1},
+    {"SortedInPlace", Bytes({"a", "c", "e"}), Bytes({"b", "c", "f", "g"}), IN_PLACE,
+     Bytes({"a", "b", "c", "e", "f", "g"})},
+    {"SortedInPlaceAnEndInCommon", Bytes({"b", "z"}), Bytes({"a", "z"}), IN_PLACE,
+     Bytes({"a", "b", "z"})},
+    {"SortedNew", Bytes({"a", "c", "e"}), Bytes({"b", "c", "f", "g"}), SZLIST_OR_NEW,
+     Bytes({"a", "b", "c", "e", "f", "g"})},
+    {"SortedAIsLonger", Bytes({"a", "c", "e", "g"}), Bytes({"b"}), SZLIST_OR_NEW,
+     Bytes({"a", "b", "c", "e", "g"})},
+    {"SortedDuplicatesOfAStay", Bytes({"a", "a"}), Bytes({"a"}), IN_PLACE, Bytes({"a", "a"})},
+    {"SortedByBytesTwoApartIsNothingSpecial", Bytes({"a"}), Bytes({"c"}), IN_PLACE,
+     Bytes({"a", "c"})},
+    {"CaseSortedCopyOfAIsKept", NoCase({"A", "f"}), NoCase({"a", "k"}), IN_PLACE,
+     NoCase({"A", "f", "k"})},
+    {"CaseSortedNew", NoCase({"A", "f"}), NoCase({"a", "k"}), SZLIST_OR_NEW,
+     NoCase({"A", "f", "k"})},
+    {"SortedAWithoutItems", Bytes({}), Bytes({"b", "c"}), SZLIST_OR_NEW, Bytes({"b", "c"})},
+    {"SortedBWithoutItems", Bytes({"a", "b"}), Bytes({}), SZLIST_OR_NEW, Bytes({"a", "b"})},
     // sorted with unsorted: A's order, duplicates once
-    {"A's order, in place", {"b", "d"}, 1, {"c", "b", "a"}, 0, IN_PLACE, {"a", "b", "c", "d"}, 1},
-    {"A's order, new", {"b", "d"}, 1, {"c", "b", "a"}, 0, SZLIST_OR_NEW, {"a", "b", "c", "d"}, 1},
-    {"A's order without case", {"b", "h"}, 16, {"B", "m"}, 0, IN_PLACE, {"b", "h", "m"}, 16},
+    {"OrderOfAInPlace", Bytes({"b", "d"}), Unsorted({"c", "b", "a"}), IN_PLACE,
+     Bytes({"a", "b", "c", "d"})},
+    {"OrderOfANew", Bytes({"b", "d"}), Unsorted({"c", "b", "a"}), SZLIST_OR_NEW,
+     Bytes({"a", "b", "c", "d"})},
+    {"OrderOfAWithoutCase", NoCase({"b", "h"}), Unsorted({"B", "m"}), IN_PLACE,
+     NoCase({"b", "h", "m"})},
 };
 
-TEST(SzListOr, FollowsTheOrdersOfBoth)
+TEST_ROWS(SzListMerge, OR_CASES)
 {
-    for (const OR_CASE &row : OR_CASES) {
-        SCOPED_TRACE(row.szWhat);
-        TEST_LIST a(row.a, row.fModeA);
-        const TEST_LIST b(row.b, row.fModeB);
-        const bool fNew = row.flags == SZLIST_OR_NEW;
-        RecordReset();
-        const PNLIBSZLIST pResult = NLIBCSzListOr(&a.p, b.p, row.flags);
-        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
-        ASSERT_NE(pResult, nullptr);
-        EXPECT_EQ(ItemsOf(pResult), row.expected);
-        EXPECT_EQ(pResult->fMode, row.fModeExpected);
-        EXPECT_EQ(Defect(pResult), "");
-        EXPECT_EQ(ItemsOf(b.p), row.b) << "the other list is only read";
-        if (fNew) {
-            EXPECT_NE(pResult, a.p);
-            EXPECT_EQ(ItemsOf(a.p), row.a);
-            EXPECT_EQ(a.p->fMode, row.fModeA);
-            NLIBCSzListFree(pResult);
-        } else {
-            EXPECT_EQ(pResult, a.p);
-        }
+    const OR_CASE &row = GetParam();
+    TEST_LIST a(row.a.items, row.a.fMode);
+    const TEST_LIST b(row.b.items, row.b.fMode);
+    RecordReset();
+    const PNLIBSZLIST pResult = NLIBCSzListOr(&a.p, b.p, row.flags);
+    EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
+    ASSERT_NE(pResult, nullptr);
+    EXPECT_EQ(ItemsOf(pResult), row.expected.items);
+    EXPECT_EQ(pResult->fMode, row.expected.fMode);
+    EXPECT_EQ(Defect(pResult), "");
+    EXPECT_EQ(ItemsOf(b.p), row.b.items) << "the other list is only read";
+    if (row.flags == SZLIST_OR_NEW) {
+        EXPECT_NE(pResult, a.p);
+        EXPECT_EQ(ItemsOf(a.p), row.a.items);
+        EXPECT_EQ(a.p->fMode, row.a.fMode);
+        NLIBCSzListFree(pResult);
+    } else {
+        EXPECT_EQ(pResult, a.p);
     }
 }
 

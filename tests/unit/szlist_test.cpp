@@ -2,6 +2,7 @@
 #include "nurocore/szlist.h"
 
 #include "last_error.h"
+#include "table.h"
 #include "test_files.h"
 #include "test_szlist.h"
 
@@ -250,11 +251,7 @@ const LIST_CASE LIST_CASES[] = {
       Mode(NOCASE), Items({})}},
 };
 
-class SzList : public testing::TestWithParam<LIST_CASE>
-{
-};
-
-TEST_P(SzList, Steps)
+TEST_ROWS(SzList, LIST_CASES)
 {
     const std::vector<STEP> &steps = GetParam().steps;
     TEST_LIST list;
@@ -264,9 +261,6 @@ TEST_P(SzList, Steps)
         EXPECT_EQ(Defect(list.p), "");
     }
 }
-
-INSTANTIATE_TEST_SUITE_P(Table, SzList, testing::ValuesIn(LIST_CASES),
-                         [](const auto &row) { return row.param.szName; });
 
 // ---- what a table does not hold -----------------------------------------------------------------
 
