@@ -12,6 +12,7 @@ PACKAGES=(
     cppcheck shellcheck codespell
     googletest libgtest-dev      # unit, sandbox and fault suites
     pkg-config libfdisk-dev      # the stand-in partitioner
+    libblkid-dev                 # the rehearsal
     fdisk util-linux             # reading back what the partitioner wrote
     python3                      # include-direction check, small reports
     binutils strace              # readelf and system-call counts

@@ -85,6 +85,7 @@ machine_overlay() {
     mkdir -p "$szRoot/usr/bin" "$szRoot/appliance"
     install -D "$APPLIANCE_DIR/guest/init" "$szRoot/init"
     install -D "$APPLIANCE_DIR/guest/arrayctl" "$szRoot/usr/bin/arrayctl"
+    install -D "$APPLIANCE_DIR/guest/arrayctl-rehearse" "$szRoot/usr/bin/arrayctl-rehearse"
     install -D -m 644 "$APPLIANCE_DIR/guest/nuroinfo.conf" "$szRoot/etc.defaults/nuroinfo.conf"
     install -D -m 644 "$APPLIANCE_DIR/guest/lvm.conf" "$szRoot/etc/lvm/lvm.conf"
     install -D -m 644 "$APPLIANCE_DIR/guest/welcome" "$szRoot/appliance/welcome"
@@ -92,6 +93,7 @@ machine_overlay() {
     overlay_build "$szRoot" platform/mdrequests/mdrequests /usr/sbin/mdrequests
     overlay_build "$szRoot" platform/sfdisk/sfdisk /usr/sbin/sfdisk
     [ -z "$szTool" ] || overlay_file "$szRoot" "$szTool" /usr/sbin/arrayctl
+    overlay_build "$szRoot" rehearse/arrayctl-rehearse /usr/sbin/arrayctl-rehearse
     for szFile in "${files[@]}"; do
         overlay_file "$szRoot" "${szFile%%:*}" "${szFile#*:}"
     done

@@ -11,7 +11,7 @@ SRC_URI = "file://${BP}.tar.gz"
 
 inherit cmake bash-completion
 
-EXTRA_OECMAKE = "-DARRAYCTL_BUILD_TESTS=OFF -DARRAYCTL_BUILD_PLATFORM=OFF"
+EXTRA_OECMAKE = "-DARRAYCTL_BUILD_TESTS=OFF -DARRAYCTL_BUILD_PLATFORM=OFF -DARRAYCTL_BUILD_REHEARSAL=OFF"
 
 # Linked with a copy of the C library, for the small root of an installer.
 PACKAGECONFIG ??= ""

@@ -211,14 +211,14 @@ opt/tool/lib/installer/arrayctl" "$(files_of "$SCRATCH/told")"
 
 # What the recipes hand to cmake is what the PowerPC build above was made with.
 recipes_fit_the_tree() {
-    local szOptions='-DARRAYCTL_BUILD_TESTS=OFF -DARRAYCTL_BUILD_PLATFORM=OFF' szOption
+    local szOptions='-DARRAYCTL_BUILD_TESTS=OFF -DARRAYCTL_BUILD_PLATFORM=OFF -DARRAYCTL_BUILD_REHEARSAL=OFF' szOption
     same "$szOptions" "$(sed -n 's/^ARRAYCTL_CONF_OPTS = //p' packaging/buildroot/arrayctl/arrayctl.mk)" || return 1
     same "$szOptions" "$(sed -n 's/^EXTRA_OECMAKE = "\(.*\)"/\1/p' "packaging/yocto/arrayctl_$VERSION.bb")" || return 1
     same '-DARRAYCTL_STATIC=ON' "$(sed -n 's/^ARRAYCTL_CONF_OPTS += //p' packaging/buildroot/arrayctl/arrayctl.mk)" || return 1
     same '-DARRAYCTL_STATIC=ON,-DARRAYCTL_STATIC=OFF' \
         "$(sed -n 's/^PACKAGECONFIG\[static\] = "\(.*\)"/\1/p' "packaging/yocto/arrayctl_$VERSION.bb")" || return 1
     grep -q '^option(ARRAYCTL_STATIC ' CMakeLists.txt || complain "no option ARRAYCTL_STATIC" || return 1
-    for szOption in ARRAYCTL_BUILD_TESTS ARRAYCTL_BUILD_PLATFORM; do
+    for szOption in ARRAYCTL_BUILD_TESTS ARRAYCTL_BUILD_PLATFORM ARRAYCTL_BUILD_REHEARSAL; do
         grep -q "^option($szOption " CMakeLists.txt || complain "no option $szOption" || return 1
         grep -q "^$szOption:BOOL=OFF" "$DEBS/powerpc/CMakeCache.txt" || complain "$szOption was on" || return 1
     done

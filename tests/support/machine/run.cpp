@@ -2,6 +2,7 @@
 #include "sandbox.h"
 
 #include "interpose.h"
+#include "other_program.h"
 #include "private_root.h"
 #include "transcript.h"
 #include "verdict.h"
@@ -159,6 +160,20 @@ std::vector<std::string> EnvironmentOf(const MACHINE &machine)
 [[noreturn]] void ProgramBecome(const MACHINE &machine, const std::vector<std::string> &arguments)
 {
     RunnerBecome(WIRE_PROGRAM, "arrayctl", arguments, EnvironmentOf(machine), machine.prepare);
+}
+
+// Another program of the machine, without the interposing library.
+[[noreturn]] void OtherBecome(const MACHINE &machine, const std::vector<std::string> &arguments)
+{
+    std::vector<std::string> argv = arguments;
+    std::vector<std::string> environment;
+    for (const auto &[szName, szValue] : machine.environment) {
+        environment.push_back(szName + "=" + szValue);
+    }
+    const std::vector<char *> words = Pointers(argv);
+    const std::vector<char *> variables = Pointers(environment);
+    (void)execve(words[0], words.data(), variables.data());
+    _exit(STATUS_NOT_STARTED);
 }
 
 // ---- its supervisor ----------------------------------------------------------------------------
@@ -480,6 +495,15 @@ void BodyReceive(const BODY_ORDER &order, const MACHINE &machine, const std::fun
 RUN_RESULT MachineTry(const MACHINE &machine, const std::vector<std::string> &arguments)
 {
     return ProgramWatch(machine, arguments, PrivateRootLayOut);
+}
+
+RUN_RESULT MachineTryOther(const MACHINE &machine, const std::vector<std::string> &arguments)
+{
+    PrivateRootEnter();
+    PrivateRootLayOut(machine);
+    std::string szFailures;
+    return Watch(
+        machine, [&](const RUN_STREAMS &) { OtherBecome(machine, arguments); }, szFailures);
 }
 
 RUN_RESULT MachineTryAgain(const MACHINE &machine, const std::vector<std::string> &arguments)

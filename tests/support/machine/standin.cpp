@@ -81,16 +81,19 @@ bool IsThere(std::string_view path)
     return szPath[0] == '\0' || access(szPath, F_OK) == 0;
 }
 
-// Finds the row of this call; `row` then stands at the answer.
+// Finds the row of this call; `row` then stands at the answer. Where nothing can be written, nobody
+// counts, and every call is the first.
 bool RowFind(int nArgument, char *const argv[], std::string_view &row)
 {
-    const int fd = open(WIRE_USED, O_RDWR | O_CLOEXEC);
+    int fd = open(WIRE_USED, O_RDWR | O_CLOEXEC);
+    const int sharing = fd < 0 ? MAP_PRIVATE : MAP_SHARED;
+    fd = fd < 0 ? open(WIRE_USED, O_RDONLY | O_CLOEXEC) : fd;
     struct stat info = {};
     if (fd < 0 || fstat(fd, &info) != 0 || info.st_size == 0) {
         return false;
     }
     void *const p =
-        mmap(nullptr, static_cast<size_t>(info.st_size), PROT_READ | PROT_WRITE, MAP_SHARED, fd, 0);
+        mmap(nullptr, static_cast<size_t>(info.st_size), PROT_READ | PROT_WRITE, sharing, fd, 0);
     close(fd);
     if (p == MAP_FAILED) {
         return false;

@@ -1,0 +1,118 @@
+// SPDX-License-Identifier: MIT
+#include "host.h"
+
+#include "owner.h"
+
+#include <algorithm>
+#include <climits>
+#include <cstdlib>
+#include <sys/stat.h>
+#include <sys/sysmacros.h>
+
+namespace
+{
+
+// Fields of /proc/self/mountinfo.
+constexpr size_t MOUNT_DEVICE = 2;
+constexpr size_t MOUNT_PATH = 4;
+
+// "\040" and the like.
+std::string Unescaped(const std::string &szText)
+{
+    constexpr size_t DIGITS = 3;
+    std::string szPlain;
+    for (size_t i = 0; i < szText.size(); i++) {
+        if (szText[i] == '\\' && i + DIGITS < szText.size()) {
+            szPlain += static_cast<char>(strtol(szText.substr(i + 1, DIGITS).c_str(), nullptr, 8));
+            i += DIGITS;
+        } else {
+            szPlain += szText[i];
+        }
+    }
+    return szPlain;
+}
+
+std::vector<MOUNT> MountsRead()
+{
+    std::vector<MOUNT> mounts;
+    for (const std::string &szLine : Split(FileRead("/proc/self/mountinfo").value_or(""), '\n')) {
+        const WORDS fields = Split(szLine, ' ');
+        if (fields.size() <= MOUNT_PATH) {
+            continue;
+        }
+        const WORDS numbers = Split(fields[MOUNT_DEVICE], ':');
+        if (numbers.size() == 2) {
+            mounts.push_back({.device = makedev(static_cast<unsigned>(NumberOf(numbers[0])),
+                                                static_cast<unsigned>(NumberOf(numbers[1]))),
+                              .szPath = Unescaped(fields[MOUNT_PATH])});
+        }
+    }
+    return mounts;
+}
+
+std::vector<dev_t> SwapsRead()
+{
+    std::vector<dev_t> swaps;
+    for (const std::string &szLine : Split(FileRead("/proc/swaps").value_or(""), '\n')) {
+        struct stat info = {};
+        const std::string szPath = Unescaped(szLine.substr(0, szLine.find_first_of(" \t")));
+        if (!szPath.empty() && stat(szPath.c_str(), &info) == 0 && S_ISBLK(info.st_mode)) {
+            swaps.push_back(info.st_rdev);
+        }
+    }
+    return swaps;
+}
+
+std::string RealPath(const std::string &szPath)
+{
+    const HEAP_OWNER szReal(realpath(szPath.c_str(), nullptr));
+    return szReal == nullptr ? "" : szReal.get();
+}
+
+std::vector<pid_t> RunsFind(const std::string &szTool)
+{
+    std::vector<pid_t> runs;
+    const std::string szReal = RealPath(szTool);
+    const std::string szName = szTool.substr(szTool.rfind('/') + 1);
+    for (const std::string &szEntry : FolderList("/proc")) {
+        if (szEntry.find_first_not_of("0123456789") != std::string::npos) {
+            continue;
+        }
+        const std::string szProcess = "/proc/" + szEntry;
+        if ((!szReal.empty() && RealPath(szProcess + "/exe") == szReal) ||
+            AttributeRead(szProcess + "/comm") == szName) {
+            runs.push_back(static_cast<pid_t>(NumberOf(szEntry)));
+        }
+    }
+    return runs;
+}
+
+constexpr const char *MARKERS[] = {
+    "/.force_clean_all_disk",
+    "/tmp/.dualhead",
+    "/tmp/.not.dualhead",
+    "/tmp/raid.0",
+    "/tmp/raid.1",
+    "/tmp/raid.5",
+};
+
+WORDS MarkersFind()
+{
+    WORDS markers;
+    for (const char *const szMarker : MARKERS) {
+        if (access(szMarker, F_OK) == 0) {
+            markers.emplace_back(szMarker);
+        }
+    }
+    return markers;
+}
+
+} // namespace
+
+HOST HostRead(const OPTIONS &options)
+{
+    return {.mounts = MountsRead(),
+            .swaps = SwapsRead(),
+            .otherRuns = RunsFind(options.szToolPath),
+            .markers = MarkersFind()};
+}

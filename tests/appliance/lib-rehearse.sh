@@ -1,0 +1,116 @@
+# SPDX-License-Identifier: MIT
+# shellcheck shell=sh
+# shellcheck disable=SC2046,SC2086,SC2154  # lists of words; lib-setup.sh sets what is read here
+#
+# What the cases share that rehearse. It brings lib-setup.sh along.
+# shellcheck source-path=SCRIPTDIR source-path=SCRIPTDIR/.. source=lib-setup.sh
+. /appliance/lib-setup.sh
+
+REAL=/real
+CALLS=/tmp/calls
+REHEARSED=/tmp/rehearsed
+TOLD=/tmp/told
+
+# --- what the real tool runs ----------------------------------------------------------------------
+
+# Under the names of all programs lies a script that writes down how it is called, as a person would
+# type it, and passes that on.
+record_calls() {
+    mkdir -p "$REAL"
+    mv /usr/sbin/mdadm /usr/sbin/sfdisk /usr/sbin/lvm /usr/bin/umount "$REAL"
+    for name in pvs lvremove vgremove pvremove pvcreate vgcreate lvcreate vgs vgchange vgextend; do
+        ln -s lvm "$REAL/$name"
+    done
+    cat >/tmp/recorder <<'SCRIPT'
+#!/bin/sh
+line=$0
+for word in "$@"; do
+    [ -n "$word" ] || word="''"
+    line="$line $word"
+done
+echo "$line" >>/tmp/calls
+exec "/real/${0##*/}" "$@"
+SCRIPT
+    chmod +x /tmp/recorder
+    for program in /usr/sbin/mdadm /usr/sbin/sfdisk /usr/sbin/lvm /usr/bin/umount; do
+        cp /tmp/recorder "$program"
+    done
+}
+
+# The commands among the calls: what is no question.
+calls_that_change() {
+    grep -v -e '^/sbin/mdadm -E ' -e '^/sbin/sfdisk -l ' -e '^/sbin/pvs -o ' "$CALLS"
+}
+
+# Children work side by side, so the commands of each disk are compared in their order; those of the
+# whole machine name no disk, or several.
+in_order() {
+    for disk in sda sdb sdc sdd; do
+        echo "# $disk"
+        grep -E "/dev/${disk}[0-9]*\$" "$1"
+    done
+    echo '# all'
+    grep -v -E '^[^ ]* [^ ]* [^ ]*/dev/sd[a-d][0-9]*$|^/sbin/sfdisk ' "$1"
+}
+
+# --- that nothing has changed ---------------------------------------------------------------------
+
+state() {
+    writes
+    cat /proc/mdstat /proc/mounts
+    "$REAL/lvm" vgs --noheadings -o vg_name,lv_count 2>/dev/null
+    find /tmp /run /var/log /etc /dev ! -path "$SYSLOG" ! -path '/tmp/*' 2>/dev/null | sort
+    find /tmp -name '.*' | sort
+    log_is_whole
+    grep -v ' mark: ' "$SYSLOG"
+    for process in /proc/[0-9]*; do
+        [ ! -e "$process/exe" ] || readlink "$process/exe"
+    done | sort | uniq -c | grep -v busybox
+}
+
+# keeps_everything COMMAND...: before and behind it, all of this is the same.
+keeps_everything() {
+    state >/tmp/state
+    "$@"
+    kept=$?
+    state >/tmp/state.now
+    diff /tmp/state /tmp/state.now || return 125
+    return "$kept"
+}
+
+# --- the rehearsal --------------------------------------------------------------------------------
+
+# rehearses STATUS COMMAND...: it ends with this status, and has left everything as it was.
+rehearses() {
+    expected=$1
+    shift
+    keeps_everything arrayctl-rehearse "$@" >"$TOLD" 2>/tmp/told.errors
+    told=$?
+    [ "$told" = "$expected" ] && return
+    echo "expected status $expected, seen $told"
+    cat "$TOLD" /tmp/told.errors
+    return 1
+}
+
+# lists STATUS COMMAND...: the same, with the commands alone.
+lists() {
+    expected=$1
+    shift
+    rehearses "$expected" --commands "$@" && cp "$TOLD" "$REHEARSED"
+}
+
+# comes_true COMMAND...: the real run has just ended; these were the commands.
+comes_true() {
+    calls_that_change >/tmp/changes
+    in_order "$REHEARSED" >/tmp/rehearsed.order
+    in_order /tmp/changes >/tmp/changes.order
+    [ "$(wc -l <"$REHEARSED")" = "$(wc -l </tmp/changes)" ] &&
+        diff /tmp/rehearsed.order /tmp/changes.order
+}
+
+# tells LINE: a whole line of the last rehearsal, without the blanks before it.
+tells() {
+    sed 's/^ *//' "$TOLD" | grep -qxF -- "$1" && return
+    cat "$TOLD"
+    return 1
+}
