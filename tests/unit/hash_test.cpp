@@ -3,6 +3,7 @@
 
 #include "hash_walk.h"
 #include "last_error.h"
+#include "table.h"
 
 #include <algorithm>
 #include <climits>
@@ -237,87 +238,56 @@ TEST(HashSet, The25thKeyOf31SlotsFinds119)
     EXPECT_EQ(Defect(hash.p), "");
 }
 
-// 4 slots with 3 keys: 1 / 4 is a quarter. With 4: none is free. 4 * 4 - 5 is 11.
-TEST(HashSet, AQuarterOfTheSlotsFreeIsEnough)
-{
-    TEST_HASH hash(NLIBCHashAllocator(4, 512));
-    FillWithPairsOfSixBytes(hash, 4);
-    EXPECT_EQ(hash.p->nSlot, 4);
-    EXPECT_GE(NLIBCHashSet(&hash.p, "k00", "longer"), 0);
-    EXPECT_EQ(hash.p->nSlot, 11);
-    EXPECT_EQ(Defect(hash.p), "");
-}
+// A table of nSlot slots and cbPool bytes with nPair pairs of 6 bytes, and one more value to set.
+struct GROWTH_CASE {
+    const char *szName;
+    int nSlot;
+    int cbPool;
+    int nPair;
+    const char *szKey;
+    size_t cchValue;
+    int nSlotAfter;
+    i32 cbPoolAfter;
+    i32 cbFreeAfter;
+    int nEntryAfter;
+};
 
-TEST(HashSet, ALongerValueInACrowdedTableFinds119SlotsToo)
-{
-    TEST_HASH hash;
-    FillWithPairsOfSixBytes(hash, 24);
-    EXPECT_GE(NLIBCHashSet(&hash.p, "k07", "w"), 0);
-    EXPECT_EQ(hash.p->nSlot, 31);
-    EXPECT_GE(NLIBCHashSet(&hash.p, "k07", "ww"), 0);
-    EXPECT_EQ(hash.p->nSlot, 119);
-    EXPECT_EQ(hash.p->nEntry, 24);
-    EXPECT_EQ(hash.p->cbFree, 512 - 24 * 6 - 3);
-    EXPECT_EQ(ValueOf(hash.p, "k07"), "ww");
-}
+constexpr GROWTH_CASE GROWTH_CASES[] = {
+    // 4 slots with 3 keys: 1 / 4 is a quarter. With 4: none is free. 4 * 4 - 5 is 11.
+    {"AQuarterOfTheSlotsFreeIsEnough", 4, 512, 3, "k03", 1, 4, 512, 512 - 24, 4},
+    {"NoSlotFreeIsNot", 4, 512, 4, "k00", 6, 11, 512, 512 - 24 - 7, 4},
+    {"AValueAsLongInACrowdedTableStays", 31, 512, 24, "k07", 1, 31, 512, 512 - 24 * 6, 24},
+    {"ALongerOneFinds119SlotsToo", 31, 512, 24, "k07", 2, 119, 512, 512 - 24 * 6 - 3, 24},
+    // 119 slots: 29.75 free ones are a quarter, so 90 keys (29 free) are too many and 89 (30) are
+    // not.
+    {"The90thKeyOf119SlotsStays", 31, 4096, 89, "k89", 1, 119, 4096, 4096 - 90 * 6, 90},
+    {"The91stKeyOf119SlotsFinds471", 31, 4096, 90, "k90", 1, 471, 4096, 4096 - 91 * 6, 91},
+    // n = 2 + 1 + 508 + 1 = 512 is not less than the 512 bytes that are free. The table is empty,
+    // so
+    // every one of the 31 unused slots counts for n: 512 + 512 * 31 + 512.
+    {"AFullPoolGrowsByTheFirstPair", 31, 512, 0, "ab", 508, 31, 16896, 16896 - 512, 1},
+    {"OneByteLessStays", 31, 512, 0, "ab", 507, 31, 512, 1, 1},
+    // Three pairs leave 512 - 18 = 494. n = 4 + 490 = 494 does not fit; 512 / 3 = 170.67 counts as
+    // 170 for each of 31 - 3 = 28 slots: 512 + 4760 + 494.
+    {"APoolGrowsByTheMeanPair", 31, 512, 3, "big", 489, 31, 5766, 5766 - 18 - 494, 4},
+    // 24 pairs leave 512 - 144 = 368. n = 4 + 400 = 404 does not fit, and 7 of 31 slots are too
+    // few.
+    // The pool counts with the old table's numbers: 512 / 24 = 21.33, so 512 + 21 * 7 + 404.
+    {"SlotsAndPoolGrowTogether", 31, 512, 24, "big", 399, 119, 1063, 1063 - 144 - 404, 25},
+};
 
-// 119 slots: 29.75 free ones are a quarter, so 90 keys (29 free) are too many and 89 (30) are not.
-TEST(HashSet, The91stKeyOf119SlotsFinds471)
+TEST_ROWS(HashGrowth, GROWTH_CASES)
 {
-    TEST_HASH hash(NLIBCHashAlloc(4096));
-    FillWithPairsOfSixBytes(hash, 90);
-    EXPECT_EQ(hash.p->nSlot, 119);
-    ASSERT_GE(NLIBCHashSet(&hash.p, NumberedKey(90).c_str(), "v"), 0);
-    EXPECT_EQ(hash.p->nSlot, 119 * 4 - 5);
-    EXPECT_EQ(hash.p->cbPool, 4096);
-    EXPECT_EQ(Defect(hash.p), "");
-}
-
-// n = 2 + 1 + 508 + 1 = 512 is not less than the 512 bytes that are free. The table is empty, so
-// every one of the 31 unused slots counts for n: 512 + 512 * 31 + 512.
-TEST(HashSet, APoolThatIsJustFullGrowsByWhatTheFirstPairNeeds)
-{
-    TEST_HASH hash;
-    const std::string value(508, 'v');
-    ASSERT_GE(NLIBCHashSet(&hash.p, "ab", value.c_str()), 0);
-    EXPECT_EQ(hash.p->nSlot, 31);
-    EXPECT_EQ(hash.p->cbPool, 16896);
-    EXPECT_EQ(hash.p->cbFree, 16896 - 512);
-    EXPECT_EQ(ValueOf(hash.p, "ab"), value);
-}
-
-TEST(HashSet, OneByteLessStays)
-{
-    TEST_HASH hash;
-    ASSERT_GE(NLIBCHashSet(&hash.p, "ab", std::string(507, 'v').c_str()), 0);
-    EXPECT_EQ(hash.p->cbPool, 512);
-    EXPECT_EQ(hash.p->cbFree, 1);
-}
-
-// Three pairs leave 512 - 18 = 494. n = 4 + 490 = 494 does not fit; 512 / 3 = 170.67 counts as 170
-// for each of 31 - 3 = 28 slots: 512 + 4760 + 494.
-TEST(HashSet, APoolGrowsByTheMeanPairForEveryUnusedSlot)
-{
-    TEST_HASH hash;
-    FillWithPairsOfSixBytes(hash, 3);
-    ASSERT_GE(NLIBCHashSet(&hash.p, "big", std::string(489, 'v').c_str()), 0);
-    EXPECT_EQ(hash.p->nSlot, 31);
-    EXPECT_EQ(hash.p->cbPool, 5766);
-    EXPECT_EQ(hash.p->cbFree, 5766 - 18 - 494);
-    EXPECT_EQ(hash.p->nEntry, 4);
-    EXPECT_EQ(Defect(hash.p), "");
-}
-
-// 24 pairs leave 512 - 144 = 368. n = 4 + 400 = 404 does not fit, and 7 of 31 slots are too few.
-// The pool counts with the old table's numbers: 512 / 24 = 21.33, so 512 + 21 * 7 + 404.
-TEST(HashSet, SlotsAndPoolGrowTogether)
-{
-    TEST_HASH hash;
-    FillWithPairsOfSixBytes(hash, 24);
-    ASSERT_GE(NLIBCHashSet(&hash.p, "big", std::string(399, 'v').c_str()), 0);
-    EXPECT_EQ(hash.p->nSlot, 119);
-    EXPECT_EQ(hash.p->cbPool, 1063);
-    EXPECT_EQ(hash.p->cbFree, 1063 - 144 - 404);
+    const GROWTH_CASE &row = GetParam();
+    TEST_HASH hash(NLIBCHashAllocator(row.nSlot, row.cbPool));
+    FillWithPairsOfSixBytes(hash, row.nPair);
+    const std::string value(row.cchValue, 'w');
+    ASSERT_GE(NLIBCHashSet(&hash.p, row.szKey, value.c_str()), 0);
+    EXPECT_EQ(hash.p->nSlot, row.nSlotAfter);
+    EXPECT_EQ(hash.p->cbPool, row.cbPoolAfter);
+    EXPECT_EQ(hash.p->cbFree, row.cbFreeAfter);
+    EXPECT_EQ(hash.p->nEntry, row.nEntryAfter);
+    EXPECT_EQ(ValueOf(hash.p, row.szKey), value);
     EXPECT_EQ(Defect(hash.p), "");
 }
 

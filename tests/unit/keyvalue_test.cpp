@@ -2,10 +2,13 @@
 #include "nurocore/keyvalue.h"
 
 #include "last_error.h"
+#include "table.h"
 #include "test_files.h"
 
+#include <algorithm>
 #include <climits>
 #include <cstring>
+#include <vector>
 
 namespace
 {
@@ -138,85 +141,78 @@ TEST(FileGetKeyValue, AKeyMayHoldAnythingButItsSeparator)
     EXPECT_STREQ(szValue, "v");
 }
 
-TEST(FileGetKeyValue, TheLastMatchWinsOnDemand)
+constexpr char THREE_MATCHES[] = "k=first\nx=y\nk=second\nk=3\n#k=4\n";
+constexpr int MEASURE = -100; // there is no buffer
+constexpr char UNTOUCHED[] = "XXXXXXXXXXXXXXX";
+
+struct LOOKUP_CASE {
+    const char *szName;
+    const char *szText;
+    std::vector<int> sizes; // of the buffer, one after the other
+    int flags;
+    int result;
+    u32 code;
+    const char *szValue;
+};
+
+const LOOKUP_CASE LOOKUP_CASES[] = {
+    {"TheLastMatchWinsOnDemand", THREE_MATCHES, {15}, 1, 2, OLD_CODE, "3"},
+    {"TheLastMatchIsAskedForByTheLowBit", THREE_MATCHES, {15}, 3, 2, OLD_CODE, "3"},
+    {"TheLastMatchIsMeasured", THREE_MATCHES, {MEASURE}, 1, 2, OLD_CODE, UNTOUCHED},
+    {"TheFirstMatchWinsElse", THREE_MATCHES, {15}, 0, 6, OLD_CODE, "first"},
+    {"TheFirstMatchWinsWithAnotherBit", THREE_MATCHES, {15}, 2, 6, OLD_CODE, "first"},
+    {"TheFirstMatchWinsWithAllOthers", THREE_MATCHES, {15}, INT_MAX - 1, 6, OLD_CODE, "first"},
+    {"TheLastMatchAloneMustFit", "k=too long for it\nk=v\n", {2}, 1, 2, OLD_CODE, "v"},
+    {"TheLastMatchMustFit", "k=v\nk=too long for it\n", {2}, 1, -1, ERR_BUF_TOO_SMALL, "v"},
+    // Measured, not copied, and the fit is not looked at.
+    {"ALineWithoutValueMakesTheLastMatchForgetTheBuffer",
+     "k=\nk=value\n",
+     {8, 2},
+     1,
+     6,
+     OLD_CODE,
+     UNTOUCHED},
+    {"ALineWithoutValueKeepsWhatIsCopied", "k=value\nk\n", {8}, 1, 6, OLD_CODE, "value"},
+    {"LinesWithoutValueGiveNone", "k=\nk\n", {8}, 1, 0, ERR_KEY_NOT_FOUND, UNTOUCHED},
+    {"ABufferOfTheVerySizeHoldsTheValue", "k=value\n", {6}, 0, 6, OLD_CODE, "value"},
+    {"ASmallerBufferStaysAsItWas",
+     "k=value\n",
+     {5, 1, 0, -1, INT_MIN},
+     0,
+     -1,
+     ERR_BUF_TOO_SMALL,
+     UNTOUCHED},
+    {"AMissingKeyIsMissingWhateverTheSize",
+     "x=value\n",
+     {8, 1, 0, -1, INT_MIN},
+     0,
+     0,
+     ERR_KEY_NOT_FOUND,
+     UNTOUCHED},
+    {"AMissingValueIsMissingWhateverTheSize",
+     "k=\n",
+     {8, 1, 0, -1, INT_MIN},
+     0,
+     0,
+     ERR_KEY_NOT_FOUND,
+     UNTOUCHED},
+};
+
+TEST_ROWS(FileLookup, LOOKUP_CASES)
 {
+    const LOOKUP_CASE &row = GetParam();
     const TEST_FOLDER folder;
-    const std::string path = folder.Write("conf", "k=first\nx=y\nk=second\nk=3\n#k=4\n");
-    char szValue[16] = "";
-    EXPECT_QUIET(NLIBCFileGetKeyValue(path.c_str(), "k", szValue, 16, 1), 2);
-    EXPECT_STREQ(szValue, "3");
-    EXPECT_QUIET(NLIBCFileGetKeyValue(path.c_str(), "k", szValue, 16, 3), 2);
-    EXPECT_STREQ(szValue, "3");
-    EXPECT_QUIET(NLIBCFileGetKeyValue(path.c_str(), "k", nullptr, 0, 1), 2);
-    for (const int flags : {0, 2, INT_MAX - 1}) {
-        EXPECT_QUIET(NLIBCFileGetKeyValue(path.c_str(), "k", szValue, 16, flags), 6);
-        EXPECT_STREQ(szValue, "first");
-    }
-}
-
-TEST(FileGetKeyValue, TheLastMatchAloneMustFit)
-{
-    const TEST_FOLDER folder;
-    char szValue[8] = "";
-    std::string path = folder.Write("conf", "k=too long for it\nk=v\n");
-    EXPECT_QUIET(NLIBCFileGetKeyValue(path.c_str(), "k", szValue, 2, 1), 2);
-    EXPECT_STREQ(szValue, "v");
-    path = folder.Write("conf", "k=v\nk=too long for it\n");
-    EXPECT_FAILS(NLIBCFileGetKeyValue(path.c_str(), "k", szValue, 2, 1), -1, ERR_BUF_TOO_SMALL);
-}
-
-TEST(FileGetKeyValue, ALineWithoutValueMakesTheLastMatchForgetTheBuffer)
-{
-    const TEST_FOLDER folder;
-    char szValue[8] = "before";
-    std::string path = folder.Write("conf", "k=\nk=value\n");
-    EXPECT_QUIET(NLIBCFileGetKeyValue(path.c_str(), "k", szValue, 8, 1), 6);
-    EXPECT_STREQ(szValue, "before") << "measured, not copied";
-    EXPECT_QUIET(NLIBCFileGetKeyValue(path.c_str(), "k", szValue, 2, 1), 6);
-    EXPECT_STREQ(szValue, "before") << "and the fit is not looked at";
-
-    path = folder.Write("conf", "k=value\nk\n");
-    EXPECT_QUIET(NLIBCFileGetKeyValue(path.c_str(), "k", szValue, 8, 1), 6);
-    EXPECT_STREQ(szValue, "value");
-
-    path = folder.Write("conf", "k=\nk\n");
-    EXPECT_FAILS(NLIBCFileGetKeyValue(path.c_str(), "k", szValue, 8, 1), 0, ERR_KEY_NOT_FOUND);
-}
-
-TEST(FileGetKeyValue, ABufferOfTheVerySizeHoldsTheValue)
-{
-    const TEST_FOLDER folder;
-    const std::string path = folder.Write("conf", "k=value\n");
-    char szValue[8] = "XXXXXXX";
-    EXPECT_QUIET(NLIBCFileGetKeyValue(path.c_str(), "k", szValue, 6, 0), 6);
-    EXPECT_STREQ(szValue, "value");
-    EXPECT_EQ(szValue[6], 'X');
-}
-
-TEST(FileGetKeyValue, ASmallerBufferStaysAsItWas)
-{
-    const TEST_FOLDER folder;
-    const std::string path = folder.Write("conf", "k=value\n");
-    for (const int cbValue : {5, 1, 0, -1, INT_MIN}) {
-        char szValue[8] = "XXXXXXX";
-        EXPECT_FAILS(NLIBCFileGetKeyValue(path.c_str(), "k", szValue, cbValue, 0), -1,
-                     ERR_BUF_TOO_SMALL);
-        EXPECT_STREQ(szValue, "XXXXXXX");
-    }
-}
-
-TEST(FileGetKeyValue, AMissingKeyIsMissingWhateverTheSizeOfTheBuffer)
-{
-    const TEST_FOLDER folder;
-    const std::string path = folder.Write("conf", "k=value\nempty=\n");
-    for (const int cbValue : {8, 1, 0, -1, INT_MIN}) {
+    const std::string path = folder.Write("conf", row.szText);
+    for (const int cbValue : row.sizes) {
         SCOPED_TRACE(cbValue);
-        for (const char *szKey : {"other", "empty"}) {
-            char szValue[] = "before!";
-            EXPECT_FAILS(NLIBCFileGetKeyValue(path.c_str(), szKey, szValue, cbValue, 0), 0,
-                         ERR_KEY_NOT_FOUND);
-            EXPECT_STREQ(szValue, "before!");
-        }
+        char szValue[] = "XXXXXXXXXXXXXXX";
+        const bool fMeasure = cbValue == MEASURE;
+        EXPECT_FAILS(NLIBCFileGetKeyValue(path.c_str(), "k", fMeasure ? nullptr : szValue,
+                                          fMeasure ? 0 : cbValue, row.flags),
+                     row.result, row.code);
+        EXPECT_STREQ(szValue, row.szValue);
+        const int cbTold = std::clamp(cbValue, 0, 15);
+        EXPECT_STREQ(szValue + cbTold, UNTOUCHED + cbTold) << "nothing behind the buffer";
     }
 }
 

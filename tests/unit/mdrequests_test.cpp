@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: MIT
 #include "md_answer.h"
 #include "md_health.h"
+#include "table.h"
 
 #include <array>
 #include <cstdio>
@@ -8,6 +9,7 @@
 #include <filesystem>
 #include <fstream>
 #include <gtest/gtest.h>
+#include <map>
 #include <string>
 #include <sys/stat.h>
 #include <sys/sysmacros.h>
@@ -17,15 +19,21 @@
 namespace
 {
 
+template <std::size_t N>
+void Put(char (&szField)[N], const std::string &text)
+{
+    std::snprintf(szField, N, "%s", text.c_str());
+}
+
 // An array of the given level with members that are in sync where the text has a 'U', as in the
 // driver's own summary "[UU_]".
 MD_ATTRIBUTES ArrayMake(const char *szLevel, const std::string &slots, const char *szLayout = "0")
 {
     MD_ATTRIBUTES attributes = {};
-    std::snprintf(attributes.szArrayState, sizeof(attributes.szArrayState), "clean");
-    std::snprintf(attributes.szLevel, sizeof(attributes.szLevel), "%s", szLevel);
-    std::snprintf(attributes.szLayout, sizeof(attributes.szLayout), "%s", szLayout);
-    std::snprintf(attributes.szRaidDisks, sizeof(attributes.szRaidDisks), "%zu", slots.size());
+    Put(attributes.szArrayState, "clean");
+    Put(attributes.szLevel, szLevel);
+    Put(attributes.szLayout, szLayout);
+    Put(attributes.szRaidDisks, std::to_string(slots.size()));
     std::size_t nLost = 0;
     for (std::size_t slot = 0; slot < slots.size(); slot++) {
         attributes.fInSync[slot] = slots[slot] == 'U';
@@ -33,22 +41,12 @@ MD_ATTRIBUTES ArrayMake(const char *szLevel, const std::string &slots, const cha
     }
     const std::string level = szLevel;
     if (level != "raid0" && level != "linear") {
-        std::snprintf(attributes.szDegraded, sizeof(attributes.szDegraded), "%zu", nLost);
-        std::snprintf(attributes.szSyncAction, sizeof(attributes.szSyncAction), "idle");
-        std::snprintf(attributes.szSyncCompleted, sizeof(attributes.szSyncCompleted), "none");
+        Put(attributes.szDegraded, std::to_string(nLost));
+        Put(attributes.szSyncAction, "idle");
+        Put(attributes.szSyncCompleted, "none");
     }
-    std::snprintf(attributes.szResyncStart, sizeof(attributes.szResyncStart), "none");
+    Put(attributes.szResyncStart, "none");
     return attributes;
-}
-
-MD_SYNC_STATUS SyncOf(const char *szAction, const char *szCompleted, const char *szStart = "none")
-{
-    MD_ATTRIBUTES attributes = ArrayMake("raid1", "UU");
-    std::snprintf(attributes.szSyncAction, sizeof(attributes.szSyncAction), "%s", szAction);
-    std::snprintf(attributes.szSyncCompleted, sizeof(attributes.szSyncCompleted), "%s",
-                  szCompleted);
-    std::snprintf(attributes.szResyncStart, sizeof(attributes.szResyncStart), "%s", szStart);
-    return MdSyncStatusGet(&attributes);
 }
 
 struct HEALTH_CASE {
@@ -95,7 +93,7 @@ TEST(MdHealthState, AnArrayMarkedBrokenIsCrashedWhateverItsMembersSay)
 {
     for (const char *szLevel : {"raid0", "linear", "raid1", "raid5", "raid6", "raid10"}) {
         MD_ATTRIBUTES attributes = ArrayMake(szLevel, "UUUU", "258");
-        std::snprintf(attributes.szArrayState, sizeof(attributes.szArrayState), "broken");
+        Put(attributes.szArrayState, "broken");
         EXPECT_EQ(MdHealthGet(&attributes), MD_HEALTH_CRASHED) << szLevel;
     }
 }
@@ -103,8 +101,8 @@ TEST(MdHealthState, AnArrayMarkedBrokenIsCrashedWhateverItsMembersSay)
 TEST(MdHealthState, ReshapingCountsTheNewNumberOfDisks)
 {
     MD_ATTRIBUTES attributes = ArrayMake("raid1", "UUU");
-    std::snprintf(attributes.szRaidDisks, sizeof(attributes.szRaidDisks), "3 (2)");
-    std::snprintf(attributes.szDegraded, sizeof(attributes.szDegraded), "2");
+    Put(attributes.szRaidDisks, "3 (2)");
+    Put(attributes.szDegraded, "2");
     EXPECT_EQ(MdHealthGet(&attributes), MD_HEALTH_DEGRADED);
 }
 
@@ -112,13 +110,13 @@ TEST(MdIsRunning, KnowsTheStatesWithoutData)
 {
     for (const char *szState : {"", "clear", "inactive"}) {
         MD_ATTRIBUTES attributes = {};
-        std::snprintf(attributes.szArrayState, sizeof(attributes.szArrayState), "%s", szState);
+        Put(attributes.szArrayState, szState);
         EXPECT_FALSE(MdIsRunning(&attributes)) << szState;
     }
     for (const char *szState : {"clean", "active", "active-idle", "write-pending", "read-auto",
                                 "readonly", "suspended", "broken"}) {
         MD_ATTRIBUTES attributes = {};
-        std::snprintf(attributes.szArrayState, sizeof(attributes.szArrayState), "%s", szState);
+        Put(attributes.szArrayState, szState);
         EXPECT_TRUE(MdIsRunning(&attributes)) << szState;
     }
 }
@@ -136,61 +134,50 @@ TEST(MdMemberIsInSync, ReadsWholeWords)
     EXPECT_FALSE(MdMemberIsInSync("not_in_sync"));
 }
 
-TEST(MdSyncStatusGet, NothingRuns)
-{
-    for (const char *szAction : {"idle", "frozen", ""}) {
-        const MD_SYNC_STATUS status = SyncOf(szAction, "none");
-        EXPECT_EQ(status.activity, 0U) << szAction;
-        EXPECT_EQ(status.done, 0U) << szAction;
-        EXPECT_EQ(status.total, 0U) << szAction;
-    }
-}
+struct SYNC_CASE {
+    const char *szName;
+    const char *szAction;
+    const char *szCompleted;
+    const char *szStart;
+    std::uint32_t activity;
+    std::uint64_t done;
+    std::uint64_t total;
+};
 
-TEST(MdSyncStatusGet, EveryActionCountsAsActivity)
-{
-    for (const char *szAction : {"resync", "recover", "check", "repair", "reshape"}) {
-        const MD_SYNC_STATUS status = SyncOf(szAction, "4096 / 130944");
-        EXPECT_EQ(status.activity, 1U) << szAction;
-        EXPECT_EQ(status.done, 4096U) << szAction;
-        EXPECT_EQ(status.total, 130944U) << szAction;
-    }
-}
+constexpr SYNC_CASE SYNC_CASES[] = {
+    {"IdleDoesNothing", "idle", "none", "none", 0, 0, 0},
+    {"FrozenDoesNothing", "frozen", "none", "none", 0, 0, 0},
+    {"NoActionDoesNothing", "", "none", "none", 0, 0, 0},
+    {"ResyncIsActivity", "resync", "4096 / 130944", "none", 1, 4096, 130944},
+    {"RecoverIsActivity", "recover", "4096 / 130944", "none", 1, 4096, 130944},
+    {"CheckIsActivity", "check", "4096 / 130944", "none", 1, 4096, 130944},
+    {"RepairIsActivity", "repair", "4096 / 130944", "none", 1, 4096, 130944},
+    {"ReshapeIsActivity", "reshape", "4096 / 130944", "none", 1, 4096, 130944},
+    {"DelayedWaitsWithoutNumbers", "resync", "delayed", "none", 1, 0, 0},
+    {"NoneWaitsWithoutNumbers", "resync", "none", "none", 1, 0, 0},
+    {"NothingWaitsWithoutNumbers", "resync", "", "none", 1, 0, 0},
+    {"ARunningResyncHasDoneSomething", "resync", "0 / 130944", "none", 1, 1, 130944},
+    {"MoreThan32Bits", "recover", "8589934592 / 17179869184", "none", 1, 8589934592, 17179869184},
+    {"AResyncThatIsDueIsPending", "idle", "none", "0", 1, 0, 0},
+};
 
-TEST(MdSyncStatusGet, WaitsWithoutNumbers)
+TEST_ROWS(MdSyncStatus, SYNC_CASES)
 {
-    for (const char *szCompleted : {"delayed", "none", ""}) {
-        const MD_SYNC_STATUS status = SyncOf("resync", szCompleted);
-        EXPECT_EQ(status.activity, 1U) << szCompleted;
-        EXPECT_EQ(status.done, 0U) << szCompleted;
-    }
-}
-
-TEST(MdSyncStatusGet, ARunningResyncHasDoneSomething)
-{
-    const MD_SYNC_STATUS status = SyncOf("resync", "0 / 130944");
-    EXPECT_EQ(status.activity, 1U);
-    EXPECT_EQ(status.done, 1U);
-    EXPECT_EQ(status.total, 130944U);
-}
-
-TEST(MdSyncStatusGet, HoldsMoreThan32Bits)
-{
-    const MD_SYNC_STATUS status = SyncOf("recover", "8589934592 / 17179869184");
-    EXPECT_EQ(status.done, 8589934592U);
-    EXPECT_EQ(status.total, 17179869184U);
-}
-
-TEST(MdSyncStatusGet, AResyncThatIsDueIsPending)
-{
-    const MD_SYNC_STATUS status = SyncOf("idle", "none", "0");
-    EXPECT_EQ(status.activity, 1U);
-    EXPECT_EQ(status.done, 0U);
+    const SYNC_CASE &row = GetParam();
+    MD_ATTRIBUTES attributes = ArrayMake("raid1", "UU");
+    Put(attributes.szSyncAction, row.szAction);
+    Put(attributes.szSyncCompleted, row.szCompleted);
+    Put(attributes.szResyncStart, row.szStart);
+    const MD_SYNC_STATUS status = MdSyncStatusGet(&attributes);
+    EXPECT_EQ(status.activity, row.activity);
+    EXPECT_EQ(status.done, row.done);
+    EXPECT_EQ(status.total, row.total);
 }
 
 TEST(MdSyncStatusGet, ALevelWithoutRedundancyHasNothingPending)
 {
     MD_ATTRIBUTES attributes = ArrayMake("raid0", "UU");
-    std::snprintf(attributes.szResyncStart, sizeof(attributes.szResyncStart), "0");
+    Put(attributes.szResyncStart, "0");
     EXPECT_EQ(MdSyncStatusGet(&attributes).activity, 0U);
 }
 
@@ -206,10 +193,13 @@ struct MdFolder : testing::Test {
     {
         std::filesystem::remove_all(root);
     }
-    void Write(const std::string &name, const std::string &text) const
+    // Each with its line end.
+    void Write(const std::map<std::string, std::string> &files) const
     {
-        std::filesystem::create_directories((root / name).parent_path());
-        std::ofstream(root / name) << text;
+        for (const auto &[name, text] : files) {
+            std::filesystem::create_directories((root / name).parent_path());
+            std::ofstream(root / name) << text << "\n";
+        }
     }
     std::filesystem::path root;
 };
@@ -217,7 +207,7 @@ struct MdFolder : testing::Test {
 TEST_F(MdFolder, WithoutAStateThereIsNoArray)
 {
     MD_ATTRIBUTES attributes;
-    Write("level", "raid1\n");
+    Write({{"level", "raid1"}});
     EXPECT_EQ(MdAttributesRead(root.c_str(), &attributes), -1);
     EXPECT_EQ(MdAttributesRead((root / "absent").c_str(), &attributes), -1);
 }
@@ -225,16 +215,16 @@ TEST_F(MdFolder, WithoutAStateThereIsNoArray)
 TEST_F(MdFolder, ARebuildingMirror)
 {
     MD_ATTRIBUTES attributes;
-    Write("array_state", "active\n");
-    Write("level", "raid1\n");
-    Write("raid_disks", "2\n");
-    Write("layout", "0\n");
-    Write("degraded", "1\n");
-    Write("sync_action", "recover\n");
-    Write("sync_completed", "65536 / 130944\n");
-    Write("resync_start", "none\n");
-    Write("rd0/state", "in_sync\n");
-    Write("rd1/state", "spare\n");
+    Write({{"array_state", "active"},
+           {"level", "raid1"},
+           {"raid_disks", "2"},
+           {"layout", "0"},
+           {"degraded", "1"},
+           {"sync_action", "recover"},
+           {"sync_completed", "65536 / 130944"},
+           {"resync_start", "none"},
+           {"rd0/state", "in_sync"},
+           {"rd1/state", "spare"}});
     ASSERT_EQ(MdAttributesRead(root.c_str(), &attributes), 0);
     EXPECT_TRUE(MdIsRunning(&attributes));
     EXPECT_TRUE(attributes.fInSync[0]);
@@ -249,15 +239,15 @@ TEST_F(MdFolder, ARebuildingMirror)
 TEST_F(MdFolder, AStripeHasNoRedundancyFiles)
 {
     MD_ATTRIBUTES attributes;
-    Write("array_state", "clean\n");
-    Write("level", "raid0\n");
-    Write("raid_disks", "2\n");
-    Write("resync_start", "none\n");
-    Write("rd0/state", "in_sync\n");
-    Write("rd1/state", "in_sync\n");
+    Write({{"array_state", "clean"},
+           {"level", "raid0"},
+           {"raid_disks", "2"},
+           {"resync_start", "none"},
+           {"rd0/state", "in_sync"},
+           {"rd1/state", "in_sync"}});
     ASSERT_EQ(MdAttributesRead(root.c_str(), &attributes), 0);
     EXPECT_EQ(MdHealthGet(&attributes), MD_HEALTH_NORMAL);
-    Write("rd1/state", "faulty\n");
+    Write({{"rd1/state", "faulty"}});
     ASSERT_EQ(MdAttributesRead(root.c_str(), &attributes), 0);
     EXPECT_EQ(MdHealthGet(&attributes), MD_HEALTH_CRASHED);
     EXPECT_EQ(MdSyncStatusGet(&attributes).activity, 0U);
@@ -266,10 +256,10 @@ TEST_F(MdFolder, AStripeHasNoRedundancyFiles)
 TEST_F(MdFolder, MoreSlotsThanAnyFormatAllowsAreNotRead)
 {
     MD_ATTRIBUTES attributes;
-    Write("array_state", "clean\n");
-    Write("level", "raid10\n");
-    Write("layout", "258\n");
-    Write("raid_disks", "99999999999999999999\n");
+    Write({{"array_state", "clean"},
+           {"level", "raid10"},
+           {"layout", "258"},
+           {"raid_disks", "99999999999999999999"}});
     ASSERT_EQ(MdAttributesRead(root.c_str(), &attributes), 0);
     EXPECT_FALSE(attributes.fInSync[0]);
     EXPECT_FALSE(attributes.fInSync[MD_MAX_SLOTS - 1]);
@@ -281,10 +271,10 @@ struct MdFolderThatChanges : MdFolder {
     void SetUp() override
     {
         MdFolder::SetUp();
-        Write("array_state", "clean\n");
-        Write("raid_disks", "2\n");
-        Write("rd0/state", "in_sync\n");
-        Write("rd1/state", "in_sync\n");
+        Write({{"array_state", "clean"},
+               {"raid_disks", "2"},
+               {"rd0/state", "in_sync"},
+               {"rd1/state", "in_sync"}});
         ASSERT_EQ(mkfifo((root / "level").c_str(), 0600), 0);
     }
     template <typename CHANGE>
@@ -312,7 +302,7 @@ TEST_F(MdFolderThatChanges, AnArrayThatVanishesBetweenTwoReadsDoesNotRun)
 TEST_F(MdFolderThatChanges, AnArrayThatStopsBetweenTwoReadsDoesNotRun)
 {
     MD_ATTRIBUTES attributes;
-    ASSERT_EQ(ReadWhile(&attributes, [this] { Write("array_state", "clear\n"); }), 0);
+    ASSERT_EQ(ReadWhile(&attributes, [this] { Write({{"array_state", "clear"}}); }), 0);
     EXPECT_FALSE(MdIsRunning(&attributes));
 }
 

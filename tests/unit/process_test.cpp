@@ -44,21 +44,39 @@ TEST(Fork, WithoutFlagsGivesPidAndZero)
     EXPECT_EQ(WEXITSTATUS(status), 17);
 }
 
-TEST(Fork, FlushesWhatIsBufferedFirst)
+// A file after a child that pFork makes and its parent have both closed it with a word in its
+// buffer.
+std::string ClosedByBoth(int (*pFork)())
 {
     const TEST_FOLDER folder;
     const std::string path = folder.Path("buffered");
     FILE *const pFile = fopen(path.c_str(), "we");
-    ASSERT_NE(pFile, nullptr);
-    ASSERT_GE(fputs("once", pFile), 0);
-    const int pid = NLIBCFork(0);
+    EXPECT_NE(pFile, nullptr);
+    EXPECT_GE(fputs("word.", pFile), 0);
+    const int pid = pFork();
     if (pid == 0) {
         (void)fclose(pFile);
         ChildEnd(0);
     }
     (void)WaitFor(pid);
     (void)fclose(pFile);
-    EXPECT_EQ(FileText(path), "once");
+    return FileText(path);
+}
+
+// What a call returns and the code that it leaves when nothing can be forked.
+std::string WithoutForks(int (*pCall)())
+{
+    return InChild([&] {
+        ForkForbid();
+        RecordReset();
+        const int result = pCall();
+        return std::to_string(result) + " " + std::to_string(NLIBCErrGet());
+    });
+}
+
+TEST(Fork, FlushesWhatIsBufferedFirst)
+{
+    EXPECT_EQ(ClosedByBoth([] { return NLIBCFork(0); }), "word.");
 }
 
 TEST(Fork, TheEnvironmentIsResetToPath)
@@ -206,13 +224,7 @@ TEST(Fork, ASessionAndTheRootFolderOnDemand)
 
 TEST(Fork, FailureSetsItsCode)
 {
-    EXPECT_EQ(InChild([] {
-                  ForkForbid();
-                  RecordReset();
-                  const int result = NLIBCFork(0xBB);
-                  return std::to_string(result) + " " + std::to_string(NLIBCErrGet());
-              }),
-              "-1 " + std::to_string(0x9700));
+    EXPECT_EQ(WithoutForks([] { return NLIBCFork(0xBB); }), "-1 " + std::to_string(0x9700));
 }
 
 // --- daemonising
@@ -336,12 +348,7 @@ TEST(Execl, AKilledProgramIsAFailure)
 
 TEST(Execl, AFailedForkIsAChildThatFailed)
 {
-    EXPECT_EQ(InChild([] {
-                  ForkForbid();
-                  const int result = RunShell("exit 0");
-                  return std::to_string(result) + " " + std::to_string(NLIBCErrGet());
-              }),
-              "-1 " + std::to_string(0x2A00));
+    EXPECT_EQ(WithoutForks([] { return RunShell("exit 0"); }), "-1 " + std::to_string(0x2A00));
 }
 
 // The program writes what it sees of itself into a file, its own output being /dev/null.
@@ -462,30 +469,12 @@ TEST(ForkCloseIo, PointsTheStandardStreamsAtDevNull)
 
 TEST(ForkCloseIo, DoesNotFlush)
 {
-    const TEST_FOLDER folder;
-    const std::string path = folder.Path("buffered");
-    FILE *const pFile = fopen(path.c_str(), "we");
-    ASSERT_NE(pFile, nullptr);
-    ASSERT_GE(fputs("each.", pFile), 0);
-    const int pid = NLIBCForkCloseIo();
-    if (pid == 0) {
-        (void)fclose(pFile);
-        ChildEnd(0);
-    }
-    (void)WaitFor(pid);
-    (void)fclose(pFile);
-    EXPECT_EQ(FileText(path), "each.each.");
+    EXPECT_EQ(ClosedByBoth(NLIBCForkCloseIo), "word.word.");
 }
 
 TEST(ForkCloseIo, FailureSetsNoCode)
 {
-    EXPECT_EQ(InChild([] {
-                  ForkForbid();
-                  RecordReset();
-                  const int result = NLIBCForkCloseIo();
-                  return std::to_string(result) + " " + std::to_string(NLIBCErrGet());
-              }),
-              "-1 " + std::to_string(OLD_CODE));
+    EXPECT_EQ(WithoutForks(NLIBCForkCloseIo), "-1 " + std::to_string(OLD_CODE));
 }
 
 } // namespace
