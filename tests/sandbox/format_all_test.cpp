@@ -298,7 +298,7 @@ TEST(FormatAllStatus, IsTheCountModulo256)
 TEST(FormatAllFails, WhenTheDisksCannotBeEnumerated)
 {
     struct {
-        const char *szConf;
+        std::string szConf;
         const char *szDevices;
     } const cases[] = {{CONF_RAID, "INTERNAL_DEVICE"}, {CONF_DUAL_HEAD, "EUNIT_DEVICE"}};
     for (const auto &row : cases) {

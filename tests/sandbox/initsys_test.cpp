@@ -4,7 +4,6 @@
 #include <cerrno>
 #include <csignal>
 #include <gtest/gtest.h>
-#include <sstream>
 #include <string>
 #include <vector>
 
@@ -13,588 +12,456 @@ namespace
 
 const std::vector<std::string> ABCD = {"sda", "sdb", "sdc", "sdd"};
 
-constexpr char NO_DISK[] =
-    "<11>arrayctl.cpp:# No disk to create system and swap partition, initsys fail!\n";
-constexpr char NO_TYPE[] = "<11>arrayctl.cpp:# Failed to get format type\n";
+const STEPS NO_DISK = {
+    {"<11>arrayctl.cpp:# No disk to create system and swap partition, initsys fail!"}};
+const STEPS NO_MAXDISKS = {
+    {"<11>conf.cpp:# Failed to NLIBCFileGetKeyValue(/etc.defaults/nuroinfo.conf,maxdisks)"}};
+const STEPS NO_FORK = {{"<11>process.cpp:# fork error, errno=Resource temporarily unavailable"},
+                       {"<11>arrayctl.cpp:# Failed to fork."}};
+constexpr char FORCE_MARKER[] = "/.force_clean_all_disk";
 
-// What is done to a disk, @, line by line: all of its partitions go, or the first two.
-constexpr char WIPED[] = "/sbin/sfdisk --fast-delete -1 /dev/@\n"
-                         "/sbin/sfdisk -M1 /dev/@\n";
-constexpr char KEPT[] = "/sbin/sfdisk --fast-delete 1:2 /dev/@\n"
-                        "/sbin/sfdisk -M1 /dev/@\n";
+const STEPS LISTED = Listed(BLANK);
+const STEPS WIPED = Cleaned(RANGE_ALL);
+const STEPS KEPT = Cleaned(RANGE_SYSTEM);
+const STEPS ZEROED = {{"/sbin/mdadm --zero-superblock /dev/@1"},
+                      {"/sbin/mdadm --zero-superblock /dev/@2"}};
+// A blank disk that becomes one of the newest layout.
+const STEPS BLANK_8 = LISTED + WIPED + MADE_8;
 
-// And how partitions 1 and 2 are made then.
-constexpr char MADE_8[] = "/sbin/sfdisk -M1 /dev/@\n"
-                          "/sbin/sfdisk -N1 -uS -q -f -j2048 -z4980480 -tfd -F /dev/@\n"
-                          "/sbin/sfdisk -N2 -uS -q -f -j0 -z4194304 -tfd -F /dev/@\n";
-constexpr char MADE_7[] = "/sbin/sfdisk -M1 /dev/@\n"
-                          "/sbin/sfdisk -N1 -uS -q -f -j256 -z4980480 -tfd -F /dev/@\n"
-                          "/sbin/sfdisk -N2 -uS -q -f -j0 -z4194304 -tfd -F /dev/@\n";
-constexpr char MADE_6[] = "/sbin/sfdisk -M1 /dev/@\n"
-                          "/sbin/sfdisk -N1 -uS -q -f -j63 -z4980087 -tfd -F /dev/@\n"
-                          "/sbin/sfdisk -N2 -uS -q -f -j0 -z4192965 -tfd -F /dev/@\n";
-constexpr char MADE_1[] = "/sbin/sfdisk -M1 /dev/@\n"
-                          "/sbin/sfdisk -N1 -uS -q -f -j63 -z1574307 -tfd -F /dev/@\n"
-                          "/sbin/sfdisk -N2 -uS -q -f -j0 -z787185 -tfd -F /dev/@\n";
-constexpr char MADE_3_NO_RAID[] = "/sbin/sfdisk -M1 /dev/@\n"
-                                  "/sbin/sfdisk -N1 -uS -q -f -j63 -z530082 -t83 -F /dev/@\n"
-                                  "/sbin/sfdisk -N2 -uS -q -f -j0 -z787185 -t82 -F /dev/@\n";
-constexpr char MADE_8_NO_RAID[] = "/sbin/sfdisk -M1 /dev/@\n"
-                                  "/sbin/sfdisk -N1 -uS -q -f -j2048 -z4980480 -t83 -F /dev/@\n"
-                                  "/sbin/sfdisk -N2 -uS -q -f -j0 -z4194304 -t82 -F /dev/@\n";
-constexpr char MADE_BUILDIN[] = "/sbin/sfdisk -M1 /dev/@\n"
-                                "/sbin/sfdisk -N1 -uS -q -f -j256 -z2097152 -t83 -F /dev/@\n"
-                                "/sbin/sfdisk -N2 -uS -q -f -j0 -z5105569 -t82 -F /dev/@\n";
-constexpr char ZEROED[] = "/sbin/mdadm --zero-superblock /dev/@1\n"
-                          "/sbin/mdadm --zero-superblock /dev/@2\n";
-// What is asked to decide.
-constexpr char LISTED[] = "/sbin/sfdisk -l -uS -N1 /dev/@\n"
-                          "/sbin/sfdisk -l -uS -N2 /dev/@\n";
-constexpr char EXAMINED[] = "/sbin/mdadm -E /dev/@3\n"
-                            "/sbin/mdadm -E /dev/@5\n";
-
-// The two arrays of these disks; each of them is waited for before it is made.
-constexpr char ARRAYS_A[] =
-    "sleep 3\n"
-    "/sbin/mdadm -C /dev/md0 -e 0.9 -amd -R -l1 -f -n4 /dev/sda1 missing missing missing\n"
-    "sleep 3\n"
-    "/sbin/mdadm -C /dev/md1 -e 0.9 -amd -R -l1 -f -n4 /dev/sda2 missing missing missing\n";
-constexpr char ARRAYS_B[] =
-    "sleep 3\n"
-    "/sbin/mdadm -C /dev/md0 -e 0.9 -amd -R -l1 -f -n4 /dev/sdb1 missing missing missing\n"
-    "sleep 3\n"
-    "/sbin/mdadm -C /dev/md1 -e 0.9 -amd -R -l1 -f -n4 /dev/sdb2 missing missing missing\n";
-constexpr char ARRAYS_C[] =
-    "sleep 3\n"
-    "/sbin/mdadm -C /dev/md0 -e 0.9 -amd -R -l1 -f -n4 /dev/sdc1 missing missing missing\n"
-    "sleep 3\n"
-    "/sbin/mdadm -C /dev/md1 -e 0.9 -amd -R -l1 -f -n4 /dev/sdc2 missing missing missing\n";
-constexpr char ARRAYS_AB[] =
-    "sleep 3\n"
-    "/sbin/mdadm -C /dev/md0 -e 0.9 -amd -R -l1 -n4 /dev/sda1 /dev/sdb1 missing missing\n"
-    "sleep 3\n"
-    "/sbin/mdadm -C /dev/md1 -e 0.9 -amd -R -l1 -n4 /dev/sda2 /dev/sdb2 missing missing\n";
-constexpr char ARRAYS_AC[] =
-    "sleep 3\n"
-    "/sbin/mdadm -C /dev/md0 -e 0.9 -amd -R -l1 -n4 /dev/sda1 /dev/sdc1 missing missing\n"
-    "sleep 3\n"
-    "/sbin/mdadm -C /dev/md1 -e 0.9 -amd -R -l1 -n4 /dev/sda2 /dev/sdc2 missing missing\n";
-constexpr char ARRAYS_BC[] =
-    "sleep 3\n"
-    "/sbin/mdadm -C /dev/md0 -e 0.9 -amd -R -l1 -n4 /dev/sdb1 /dev/sdc1 missing missing\n"
-    "sleep 3\n"
-    "/sbin/mdadm -C /dev/md1 -e 0.9 -amd -R -l1 -n4 /dev/sdb2 /dev/sdc2 missing missing\n";
-constexpr char ARRAYS_ABC[] =
-    "sleep 3\n"
-    "/sbin/mdadm -C /dev/md0 -e 0.9 -amd -R -l1 -n4 /dev/sda1 /dev/sdb1 /dev/sdc1 missing\n"
-    "sleep 3\n"
-    "/sbin/mdadm -C /dev/md1 -e 0.9 -amd -R -l1 -n4 /dev/sda2 /dev/sdb2 /dev/sdc2 missing\n";
-constexpr char ARRAYS_ABCD[] =
-    "sleep 3\n"
-    "/sbin/mdadm -C /dev/md0 -e 0.9 -amd -R -l1 -n4 /dev/sda1 /dev/sdb1 /dev/sdc1 /dev/sdd1\n"
-    "sleep 3\n"
-    "/sbin/mdadm -C /dev/md1 -e 0.9 -amd -R -l1 -n4 /dev/sda2 /dev/sdb2 /dev/sdc2 /dev/sdd2\n";
-
-// The lines of a disk, in its name.
-std::string Of(const std::string &szDisk, const std::string &szLines)
+// The two arrays; each of them is waited for before it is made.
+STEPS ArraysOf(const std::string &szSystem, const std::string &szSwap,
+               const TOOL_ANSWER &answer = {})
 {
-    std::string szText = szLines;
-    for (size_t i = szText.find('@'); i != std::string::npos; i = szText.find('@', i)) {
-        szText.replace(i, 1, szDisk);
-    }
-    return szText;
+    return {{"sleep 3"},
+            {"/sbin/mdadm -C /dev/md0 -e 0.9 -amd -R -l1 " + szSystem, answer},
+            {"sleep 3"},
+            {"/sbin/mdadm -C /dev/md1 -e 0.9 -amd -R -l1 " + szSwap, answer}};
 }
 
-// Each of these commands is run once and succeeds.
-void CommandsExpect(MACHINE &machine, const std::string &szLines)
+const STEPS ARRAYS_A = ArraysOf("-f -n4 /dev/sda1 missing missing missing",
+                                "-f -n4 /dev/sda2 missing missing missing");
+const STEPS ARRAYS_B = ArraysOf("-f -n4 /dev/sdb1 missing missing missing",
+                                "-f -n4 /dev/sdb2 missing missing missing");
+const STEPS ARRAYS_C = ArraysOf("-f -n4 /dev/sdc1 missing missing missing",
+                                "-f -n4 /dev/sdc2 missing missing missing");
+const STEPS ARRAYS_AB =
+    ArraysOf("-n4 /dev/sda1 /dev/sdb1 missing missing", "-n4 /dev/sda2 /dev/sdb2 missing missing");
+const STEPS ARRAYS_AC =
+    ArraysOf("-n4 /dev/sda1 /dev/sdc1 missing missing", "-n4 /dev/sda2 /dev/sdc2 missing missing");
+const STEPS ARRAYS_BC =
+    ArraysOf("-n4 /dev/sdb1 /dev/sdc1 missing missing", "-n4 /dev/sdb2 /dev/sdc2 missing missing");
+const STEPS ARRAYS_ABC = ArraysOf("-n4 /dev/sda1 /dev/sdb1 /dev/sdc1 missing",
+                                  "-n4 /dev/sda2 /dev/sdb2 /dev/sdc2 missing");
+const STEPS ARRAYS_ABCD = ArraysOf("-n4 /dev/sda1 /dev/sdb1 /dev/sdc1 /dev/sdd1",
+                                   "-n4 /dev/sda2 /dev/sdb2 /dev/sdc2 /dev/sdd2");
+const STEPS ARRAYS_OF_ONE_SLOT = ArraysOf("-f -n1 /dev/sda1", "-f -n1 /dev/sda2");
+
+STEPS Inited(const std::string &szSystem, const std::string &szSwap)
 {
-    std::istringstream lines(szLines);
-    for (std::string szLine; std::getline(lines, szLine);) {
-        if (szLine.starts_with('/')) {
-            MachineTool(machine, szLine);
-        }
-    }
+    return {{"<11>arrayctl.cpp:# system inited on [" + szSystem + "], [" + szSwap + "]"}};
 }
 
-void DiskExpect(MACHINE &machine, const std::string &szDisk, const std::string &szLines)
-{
-    CommandsExpect(machine, Of(szDisk, szLines));
-}
+const STEPS INITED_A = Inited("/dev/sda1 ", "/dev/sda2 ");
+const STEPS INITED_B = Inited("/dev/sdb1 ", "/dev/sdb2 ");
+const STEPS INITED_C = Inited("/dev/sdc1 ", "/dev/sdc2 ");
+const STEPS INITED_AB = Inited("/dev/sda1 /dev/sdb1 ", "/dev/sda2 /dev/sdb2 ");
+const STEPS INITED_AC = Inited("/dev/sda1 /dev/sdc1 ", "/dev/sda2 /dev/sdc2 ");
+const STEPS INITED_BC = Inited("/dev/sdb1 /dev/sdc1 ", "/dev/sdb2 /dev/sdc2 ");
+const STEPS INITED_ABC = Inited("/dev/sda1 /dev/sdb1 /dev/sdc1 ", "/dev/sda2 /dev/sdb2 /dev/sdc2 ");
+const STEPS INITED_ABCD =
+    Inited("/dev/sda1 /dev/sdb1 /dev/sdc1 /dev/sdd1 ", "/dev/sda2 /dev/sdb2 /dev/sdc2 /dev/sdd2 ");
 
-// A disk with its partitions renewed: what is decided for it and what is done.
-void BlankDiskWipe(MACHINE &machine, const std::string &szDisk, const std::string &szMade = MADE_8)
+STEPS Biggest(int version)
 {
-    BlankDiskAdd(machine, szDisk);
-    DiskExpect(machine, szDisk, WIPED + szMade);
-}
-
-void KnownDiskRenew(MACHINE &machine, const std::string &szDisk, const DISK_PLACES &places,
-                    const std::string &szLines)
-{
-    DecidedDiskAdd(machine, szDisk, places);
-    DiskExpect(machine, szDisk, szLines);
-}
-
-std::string Inited(const std::string &szSystem, const std::string &szSwap)
-{
-    return "<11>arrayctl.cpp:# system inited on [" + szSystem + "], [" + szSwap + "]\n";
-}
-
-// These disks, blank, and these arrays of them.
-MACHINE MachineOf(const std::vector<std::string> &disks, const std::string &szArrays,
-                  const std::string &szConf = CONF_RAID)
-{
-    MACHINE machine = MachineWithConf(szConf);
-    for (const std::string &szDisk : disks) {
-        BlankDiskWipe(machine, szDisk);
-    }
-    CommandsExpect(machine, szArrays);
-    return machine;
-}
-
-// ---- blank disks -------------------------------------------------------------------------------
-
-TEST(Initsys, MakesFourBlankDisksTheSystem)
-{
-    MACHINE machine = MachineOf(ABCD, ARRAYS_ABCD);
-    ShellWatch(machine);
-    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0, "");
-    for (const std::string &szDisk : ABCD) {
-        EXPECT_EQ(CommandsOn(result, szDisk), Of(szDisk, std::string(LISTED) + WIPED + MADE_8));
-    }
-    EXPECT_EQ(CommandsBeside(result, ABCD), ARRAYS_ABCD);
-    EXPECT_EQ(ShellText(),
-              "/sbin/mdadm -C /dev/md0 -e 0.9 -amd -R -l1  -n4 /dev/sda1 /dev/sdb1 /dev/sdc1 "
-              "/dev/sdd1  > /dev/null 2>&1\n"
-              "/sbin/mdadm -C /dev/md1 -e 0.9 -amd -R -l1  -n4 /dev/sda2 /dev/sdb2 /dev/sdc2 "
-              "/dev/sdd2  > /dev/null 2>&1\n");
-    EXPECT_EQ(LogErrors(result), Inited("/dev/sda1 /dev/sdb1 /dev/sdc1 /dev/sdd1 ",
-                                        "/dev/sda2 /dev/sdb2 /dev/sdc2 /dev/sdd2 "));
-}
-
-TEST(Initsys, FillsTheSlotsWithMissing)
-{
-    MACHINE machine = MachineOf({"sda", "sdb"}, ARRAYS_AB);
-    ShellWatch(machine);
-    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0);
-    EXPECT_EQ(ShellText(), "/sbin/mdadm -C /dev/md0 -e 0.9 -amd -R -l1  -n4 /dev/sda1 /dev/sdb1   "
-                           "missing missing> /dev/null 2>&1\n"
-                           "/sbin/mdadm -C /dev/md1 -e 0.9 -amd -R -l1  -n4 /dev/sda2 /dev/sdb2   "
-                           "missing missing> /dev/null 2>&1\n");
-    EXPECT_EQ(LogErrors(result), Inited("/dev/sda1 /dev/sdb1 ", "/dev/sda2 /dev/sdb2 "));
-}
-
-TEST(Initsys, ForcesArraysOfOneDisk)
-{
-    MACHINE machine = MachineOf({"sdc"}, ARRAYS_C);
-    ShellWatch(machine);
-    RunEnds(machine, {"initsys"}, 0);
-    EXPECT_EQ(ShellText(), "/sbin/mdadm -C /dev/md0 -e 0.9 -amd -R -l1 -f -n4 /dev/sdc1   "
-                           "missing missing missing> /dev/null 2>&1\n"
-                           "/sbin/mdadm -C /dev/md1 -e 0.9 -amd -R -l1 -f -n4 /dev/sdc2   "
-                           "missing missing missing> /dev/null 2>&1\n");
-}
-
-TEST(Initsys, LeavesOtherPortsAndFurtherArgumentsAlone)
-{
-    MACHINE machine = MachineOf({"sda"}, ARRAYS_A);
-    for (const char *const szOther : {"sde", "sdg", "sdh", "mmcblk0", "nuroboot"}) {
-        MachineDiskAdd(machine, szOther); // USB, eSATA, none, card, boot
-    }
-    RunEnds(machine, {"initsys", "anything", "else"}, 0, "");
-}
-
-TEST(Initsys, FailsWithoutADisk)
-{
-    const RUN_RESULT result = RunEnds(MachineWithConf(CONF_RAID), {"initsys"}, 1, "");
-    EXPECT_EQ(OrderText(result), NO_DISK);
+    return {{"<11>partition_version.cpp:# Choose biggest partition layout version " +
+             std::to_string(version) + "."}};
 }
 
 // ---- slots -------------------------------------------------------------------------------------
 
-std::string ConfWithSlots(const std::string &szSlots)
+MACHINE MachineWithSlots(const std::string &szSlots)
 {
-    return std::string(CONF_RAID) + "max_sys_raid_disks=" + szSlots + "\n";
+    return MachineWithConf(CONF_RAID + "max_sys_raid_disks=" + szSlots + "\n");
 }
 
-TEST(InitsysSlots, AreWonByTheFirstDisks)
-{
-    constexpr char ARRAYS[] =
-        "sleep 3\n"
-        "/sbin/mdadm -C /dev/md0 -e 0.9 -amd -R -l1 -n2 /dev/sda1 /dev/sdb1\n"
-        "sleep 3\n"
-        "/sbin/mdadm -C /dev/md1 -e 0.9 -amd -R -l1 -n2 /dev/sda2 /dev/sdb2\n";
-    MACHINE machine = MachineOf({"sda", "sdb", "sdc"}, ARRAYS, ConfWithSlots("2"));
-    DiskExpect(machine, "sdc", ZEROED);
-    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0);
-    EXPECT_EQ(CommandsOn(result, "sdc"), Of("sdc", std::string(LISTED) + WIPED + MADE_8 + ZEROED));
-    EXPECT_EQ(CommandsBeside(result, ABCD), ARRAYS);
-    EXPECT_EQ(LogErrors(result), Inited("/dev/sda1 /dev/sdb1 ", "/dev/sda2 /dev/sdb2 "));
-}
-
-constexpr char ARRAYS_OF_ONE[] = "/sbin/mdadm -C /dev/md0 -e 0.9 -amd -R -l1 -f -n1 /dev/sda1\n"
-                                 "/sbin/mdadm -C /dev/md1 -e 0.9 -amd -R -l1 -f -n1 /dev/sda2\n";
-
-TEST(InitsysSlots, AreOneForOneForcedDisk)
-{
-    MACHINE machine = MachineOf({"sda", "sdb"}, ARRAYS_OF_ONE, ConfWithSlots("1"));
-    // Whether the wipe works is no matter.
-    MachineTool(machine, "/sbin/mdadm --zero-superblock /dev/sdb1", {.status = 1});
-    MachineTool(machine, "/sbin/mdadm --zero-superblock /dev/sdb2", {.status = 1});
-    RunEnds(machine, {"initsys"}, 0);
-}
-
-TEST(InitsysSlots, OfNoneTakeNoDisk)
-{
-    constexpr char NO_MAXDISKS[] =
-        "<11>conf.cpp:# Failed to NLIBCFileGetKeyValue(/etc.defaults/nuroinfo.conf,maxdisks)\n";
-    const std::string szWithoutKey = "usbportcfg=0x30\ninternalportcfg=0xf\nsupportraid=yes\n";
-    for (const std::string &szConf : {ConfWithSlots("0"), ConfWithSlots("-1"), szWithoutKey}) {
-        SCOPED_TRACE(szConf);
-        MACHINE machine = MachineOf({"sda"}, "", szConf);
-        DiskExpect(machine, "sda", ZEROED);
-        const RUN_RESULT result = RunEnds(machine, {"initsys"}, 1);
-        EXPECT_EQ(CommandsOn(result, "sda"),
-                  Of("sda", std::string(LISTED) + WIPED + MADE_8 + ZEROED));
-        EXPECT_EQ(CommandsBeside(result, ABCD), "");
-        EXPECT_EQ(LogErrors(result),
-                  (szConf == szWithoutKey ? NO_MAXDISKS : "") + std::string(NO_DISK));
-    }
-}
-
-TEST(InitsysSlots, PreferTheirOwnKey)
-{
-    const MACHINE machine =
-        MachineOf({"sda", "sdb"},
-                  "/sbin/mdadm -C /dev/md0 -e 0.9 -amd -R -l1 -n3 /dev/sda1 /dev/sdb1 missing\n"
-                  "/sbin/mdadm -C /dev/md1 -e 0.9 -amd -R -l1 -n3 /dev/sda2 /dev/sdb2 missing\n",
-                  ConfWithSlots("\"3\""));
-    RunEnds(machine, {"initsys"}, 0);
-}
+constexpr char CONF_NO_SLOTS[] = "usbportcfg=0x30\ninternalportcfg=0xf\nsupportraid=yes\n";
 
 // 31 words of eight characters and seven of the next: 255.
-TEST(InitsysSlots, AreCutWhereTheTextOfMissingEnds)
+std::string MissingCut()
 {
-    MACHINE machine = MachineOf({"sda"}, "", ConfWithSlots("40"));
     std::string szMissing;
     for (int i = 0; i < 31; i++) {
         szMissing += " missing";
     }
-    szMissing += " missin";
-    ASSERT_EQ(szMissing.size(), 255U);
-    MachineTool(machine, "/sbin/mdadm -C ...", {.nTimes = 2});
-    ShellWatch(machine);
-    RunEnds(machine, {"initsys"}, 0);
-    EXPECT_EQ(ShellText(), "/sbin/mdadm -C /dev/md0 -e 0.9 -amd -R -l1 -f -n40 /dev/sda1  " +
-                               szMissing + "> /dev/null 2>&1\n" +
-                               "/sbin/mdadm -C /dev/md1 -e 0.9 -amd -R -l1 -f -n40 /dev/sda2  " +
-                               szMissing + "> /dev/null 2>&1\n");
+    return szMissing + " missin";
 }
 
-// The number is looked up before the wanted layout: so the log has it.
-TEST(InitsysSlots, AreCountedBeforeTheLayoutIsChosen)
+struct Initsys : testing::TestWithParam<DISKS_CASE> {
+};
+
+TEST_P(Initsys, Does)
 {
-    MACHINE machine = MachineWithConf("usbportcfg=0x30\ninternalportcfg=0xf\nsupportraid=no\n");
-    MachineFile(machine, "/.force_clean_all_disk", "");
-    PartitionedDiskAdd(machine, "sda", PLACES_8);
-    DiskExpect(machine, "sda", std::string(WIPED) + MADE_8_NO_RAID + ZEROED);
-    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 1);
-    EXPECT_EQ(
-        LogErrors(result),
-        "<11>conf.cpp:# Failed to NLIBCFileGetKeyValue(/etc.defaults/nuroinfo.conf,maxdisks)\n"
-        "<11>partition_version.cpp:# Choose biggest partition layout version 8.\n" +
-            std::string(NO_DISK));
+    ExpectDisks(GetParam());
 }
+
+const DISKS_CASE DISK_CASES[] = {
+    {.szName = "MakesFourBlankDisksTheSystem",
+     .disks = OnEach(ABCD, BLANK_8),
+     .beside = ARRAYS_ABCD,
+     .errors = INITED_ABCD,
+     .szShell = "/sbin/mdadm -C /dev/md0 -e 0.9 -amd -R -l1  -n4 /dev/sda1 /dev/sdb1 /dev/sdc1 "
+                "/dev/sdd1  > /dev/null 2>&1\n"
+                "/sbin/mdadm -C /dev/md1 -e 0.9 -amd -R -l1  -n4 /dev/sda2 /dev/sdb2 /dev/sdc2 "
+                "/dev/sdd2  > /dev/null 2>&1\n"},
+    {.szName = "FillsTheSlotsWithMissing",
+     .disks = OnEach({"sda", "sdb"}, BLANK_8),
+     .beside = ARRAYS_AB,
+     .errors = INITED_AB,
+     .szShell = "/sbin/mdadm -C /dev/md0 -e 0.9 -amd -R -l1  -n4 /dev/sda1 /dev/sdb1   "
+                "missing missing> /dev/null 2>&1\n"
+                "/sbin/mdadm -C /dev/md1 -e 0.9 -amd -R -l1  -n4 /dev/sda2 /dev/sdb2   "
+                "missing missing> /dev/null 2>&1\n"},
+    {.szName = "ForcesArraysOfOneDisk",
+     .disks = {{"sdc", BLANK_8}},
+     .beside = ARRAYS_C,
+     .errors = INITED_C,
+     .szShell = "/sbin/mdadm -C /dev/md0 -e 0.9 -amd -R -l1 -f -n4 /dev/sdc1   "
+                "missing missing missing> /dev/null 2>&1\n"
+                "/sbin/mdadm -C /dev/md1 -e 0.9 -amd -R -l1 -f -n4 /dev/sdc2   "
+                "missing missing missing> /dev/null 2>&1\n"},
+    // USB, eSATA, none, card, boot
+    {.szName = "LeavesOtherPortsAndFurtherArgumentsAlone",
+     .disks = {{"sda", BLANK_8}},
+     .beside = ARRAYS_A,
+     .errors = INITED_A,
+     .machine = MachineOfDisks(
+         {{"sde", BLANK}, {"sdg", BLANK}, {"sdh", BLANK}, {"mmcblk0", BLANK}, {"nuroboot", BLANK}}),
+     .arguments = {"initsys", "anything", "else"}},
+    {.szName = "SlotsAreWonByTheFirstDisks",
+     .disks = {{"sda", BLANK_8}, {"sdb", BLANK_8}, {"sdc", BLANK_8 + ZEROED}},
+     .beside = ArraysOf("-n2 /dev/sda1 /dev/sdb1", "-n2 /dev/sda2 /dev/sdb2"),
+     .errors = INITED_AB,
+     .machine = MachineWithSlots("2")},
+    // Whether the wipe works is no matter.
+    {.szName = "OneSlotIsOneForcedDisks",
+     .disks = {{"sda", BLANK_8},
+               {"sdb", BLANK_8 + STEPS{{ZEROED[0].szText, {.status = 1}},
+                                       {ZEROED[1].szText, {.status = 1}}}}},
+     .beside = ARRAYS_OF_ONE_SLOT,
+     .errors = INITED_A,
+     .machine = MachineWithSlots("1")},
+    {.szName = "NoSlotsTakeNoDisk",
+     .disks = {{"sda", BLANK_8 + ZEROED}},
+     .errors = NO_DISK,
+     .machine = MachineWithSlots("0"),
+     .status = 1},
+    {.szName = "LessThanNoSlotsTakeNoDisk",
+     .disks = {{"sda", BLANK_8 + ZEROED}},
+     .errors = NO_DISK,
+     .machine = MachineWithSlots("-1"),
+     .status = 1},
+    {.szName = "SlotsThatNobodyTellsTakeNoDisk",
+     .disks = {{"sda", BLANK_8 + ZEROED}},
+     .errors = NO_MAXDISKS + NO_DISK,
+     .machine = MachineWithConf(CONF_NO_SLOTS),
+     .status = 1},
+    {.szName = "SlotsPreferTheirOwnKey",
+     .disks = OnEach({"sda", "sdb"}, BLANK_8),
+     .beside = ArraysOf("-n3 /dev/sda1 /dev/sdb1 missing", "-n3 /dev/sda2 /dev/sdb2 missing"),
+     .errors = INITED_AB,
+     .machine = MachineWithSlots("\"3\"")},
+    {.szName = "SlotsAreCutWhereTheTextOfMissingEnds",
+     .disks = {{"sda", BLANK_8}},
+     .beside = ArraysOf("-f -n40 /dev/sda1" + MissingCut(), "-f -n40 /dev/sda2" + MissingCut()),
+     .errors = INITED_A,
+     .machine = MachineWithSlots("40"),
+     .szShell = "/sbin/mdadm -C /dev/md0 -e 0.9 -amd -R -l1 -f -n40 /dev/sda1  " + MissingCut() +
+                "> /dev/null 2>&1\n/sbin/mdadm -C /dev/md1 -e 0.9 -amd -R -l1 -f -n40 /dev/sda2  " +
+                MissingCut() + "> /dev/null 2>&1\n"},
+    // So the log has it.
+    {.szName = "SlotsAreCountedBeforeTheLayoutIsChosen",
+     .disks = {{"sda", WIPED + MADE_8_NO_RAID + ZEROED}},
+     .errors = NO_MAXDISKS + Biggest(8) + NO_DISK,
+     .machine = WithFile(MachineOfDisks({{"sda", PLACES_8}}, "usbportcfg=0x30\nsupportraid=no\n"
+                                                             "internalportcfg=0xf\n"),
+                         FORCE_MARKER, ""),
+     .status = 1},
+};
+
+INSTANTIATE_TEST_SUITE_P(Slots, Initsys, testing::ValuesIn(DISK_CASES), ROW_NAME());
 
 // ---- what is decided for a disk ----------------------------------------------------------------
 
-constexpr char BIGGEST_8[] =
-    "<11>partition_version.cpp:# Choose biggest partition layout version 8.\n";
+const STEPS NO_TYPE = {{"<11>arrayctl.cpp:# Failed to get format type"}};
 
-// One disk among them: where its partitions lie, what its superblocks say, what is done to it.
-struct DECIDED_DISK {
-    std::string szDisk;
-    const DISK_PLACES *pPlaces;  // none: blank
-    std::string szLines;         // after both questions of the partitioner
-    std::string szExamined = ""; // before them
-    const char *szReport = "";   // of partition 3; partition 5 has none
+// What partition 3 says; partition 5 has no superblock.
+STEPS ExaminedOf(const std::string &szReport)
+{
+    return {{"/sbin/mdadm -E /dev/@3", {.szOut = szReport}}};
+}
+
+const STEPS EXAMINED_MD2 = ExaminedOf(Examination(2));
+const STEPS EXAMINED = ExaminedOf("") + STEPS{{"/sbin/mdadm -E /dev/@5"}};
+const STEPS EXAMINED_NO_ARRAY = ExaminedOf("Version : 1.2\n") + STEPS{{"/sbin/mdadm -E /dev/@5"}};
+
+const DISKS_CASE DECISION_CASES[] = {
+    // And the disk itself is not asked.
+    {.szName = "TheWantedLayoutKeepsItsData",
+     .disks = {{"sda", EXAMINED_MD2 + Listed(PLACES_8) + KEPT + MADE_8}},
+     .beside = ARRAYS_A,
+     .errors = Biggest(8) + INITED_A,
+     .machine = MachineOfDisks({{"sda", PLACES_8}})},
+    {.szName = "SevenBecomesEightWithItsData",
+     .disks = {{"sda", EXAMINED + Listed(PLACES_7) + KEPT + MADE_8}},
+     .beside = ARRAYS_A,
+     .errors = INITED_A,
+     .machine = MachineOfDisks({{"sda", PLACES_7}})},
+    // An old layout that holds data is the wanted one, on new disks too.
+    {.szName = "SevenStays",
+     .disks = {{"sda", EXAMINED_MD2 + Listed(PLACES_7) + KEPT + MADE_7},
+               {"sdb", LISTED + WIPED + MADE_7}},
+     .beside = ARRAYS_AB,
+     .errors = Biggest(7) + INITED_AB,
+     .machine = MachineOfDisks({{"sda", PLACES_7}})},
+    {.szName = "SixStays",
+     .disks = {{"sda", EXAMINED_MD2 + Listed(PLACES_6) + KEPT + MADE_6},
+               {"sdb", LISTED + WIPED + MADE_6}},
+     .beside = ARRAYS_AB,
+     .errors = Biggest(6) + INITED_AB,
+     .machine = MachineOfDisks({{"sda", PLACES_6}})},
+    // Examined for the wanted layout, and to decide.
+    {.szName = "AnOlderLayoutWithoutArrayGoes",
+     .disks = {{"sda", EXAMINED + Listed(PLACES_6) + EXAMINED + WIPED + MADE_8}},
+     .beside = ARRAYS_A,
+     .errors = INITED_A,
+     .machine = MachineOfDisks({{"sda", PLACES_6}})},
+    {.szName = "AnOlderLayoutWhoseSuperblockNamesNoArrayGoes",
+     .disks = {{"sda", EXAMINED_NO_ARRAY + Listed(PLACES_6) + EXAMINED_NO_ARRAY + WIPED + MADE_8}},
+     .beside = ARRAYS_A,
+     .errors = 2 * STEPS{{"<11>raid_membership.cpp:# Failed to sscanf [], errno=No such file or "
+                          "directory"}} +
+               INITED_A,
+     .machine = MachineOfDisks({{"sda", PLACES_6}})},
+    {.szName = "AnOlderLayoutWithArrayIsLeftAlone",
+     .disks = {{"sda", EXAMINED_MD2 + Listed(PLACES_8) + KEPT + MADE_8},
+               {"sdb", EXAMINED_MD2 + Listed(PLACES_6) + EXAMINED_MD2}},
+     .beside = ARRAYS_A,
+     .errors = Biggest(8) + NO_TYPE + INITED_A,
+     .machine = MachineOfDisks({{"sda", PLACES_8}, {"sdb", PLACES_6}})},
+    // A newer layout than the wanted one is another layout like any.
+    {.szName = "EightGoesWhereSevenIsWanted",
+     .disks = {{"sda", Listed(PLACES_7) + KEPT + MADE_7},
+               {"sdb", Listed(PLACES_8) + EXAMINED + WIPED + MADE_7}},
+     .beside = ARRAYS_AB,
+     .errors = INITED_AB,
+     .machine = With(MachineOfDisks({{"sda", PLACES_7}, {"sdb", PLACES_8}}),
+                     [](MACHINE &machine) { SystemArrayAdd(machine, {{"sda1"}}); })},
+    {.szName = "LayoutOneGoesEvenWhereItIsWanted",
+     .disks = {{"sda", Listed(PLACES_1) + WIPED + MADE_1}},
+     .beside = ARRAYS_A,
+     .errors = INITED_A,
+     .machine = With(MachineOfDisks({{"sda", PLACES_1}}),
+                     [](MACHINE &machine) { SystemArrayAdd(machine, {{"sda1"}}); })},
+    {.szName = "AnUnrecognisedTableIsLeftAloneBesideAKnownOne",
+     .disks = {{"sda", Listed(PLACES_FOREIGN)},
+               {"sdb", EXAMINED + Listed(PLACES_8) + KEPT + MADE_8},
+               {"sdc", BLANK_8}},
+     .beside = ARRAYS_BC,
+     .errors = INITED_BC,
+     .machine = MachineOfDisks({{"sda", PLACES_FOREIGN}, {"sdb", PLACES_8}})},
+    {.szName = "PartitionsArePlainWithoutRaid",
+     .disks = {{"sda", Listed(PLACES_8) + KEPT + MADE_8_NO_RAID},
+               {"sdb", LISTED + WIPED + MADE_8_NO_RAID}},
+     .beside = ARRAYS_AB,
+     .errors = Biggest(8) + INITED_AB,
+     .machine = MachineOfDisks({{"sda", PLACES_8}}, CONF_NO_RAID)},
+    // What a disk is decided to be is always looked up among the layouts of RAID machines.
+    {.szName = "ItsOwnOldLayoutIsNotRecognisedWithoutRaid",
+     .disks = {{"sda", Listed(PLACES_3_NO_RAID) + KEPT + MADE_3_NO_RAID}},
+     .beside = ARRAYS_A,
+     .errors = Biggest(3) + INITED_A,
+     .machine = MachineOfDisks({{"sda", PLACES_3_NO_RAID}}, CONF_NO_RAID)},
+    {.szName = "ABuiltInStorageHasItsOwnGeometry",
+     .disks = {{"sda", Listed(PLACES_BUILDIN) + KEPT + MADE_BUILDIN},
+               {"sdb", LISTED + WIPED + MADE_BUILDIN}},
+     .beside = ARRAYS_AB,
+     .errors = Biggest(7) + INITED_AB,
+     .machine = MachineOfDisks({{"sda", PLACES_BUILDIN}}, CONF_BUILDIN)},
+    // One partition alone is no blank disk either.
+    {.szName = "UnrecognisedTablesAreRenewedWhenThereIsNoKnownOne",
+     .disks = {{"sda", Listed(PLACES_FOREIGN) + KEPT + MADE_8},
+               {"sdb", Listed({.start = 2048, .size = 4980480}) + KEPT + MADE_8},
+               {"sdc", Listed({.swapStart = 2048, .swapSize = 4980480}) + KEPT + MADE_8},
+               {"sdd", BLANK_8}},
+     .beside = ARRAYS_ABCD,
+     .errors = INITED_ABCD,
+     .machine = MachineOfDisks({{"sda", PLACES_FOREIGN},
+                                {"sdb", {.start = 2048, .size = 4980480}},
+                                {"sdc", {.swapStart = 2048, .swapSize = 4980480}}})},
 };
 
-struct DECISION_CASE {
-    const char *szName;
-    std::vector<DECIDED_DISK> disks;
-    const char *szArrays;
-    std::string szConf = CONF_RAID;
-    bool fSystemArray = false; // of the first disk
-    std::string szLog = "";    // before the line that it is done
-};
+INSTANTIATE_TEST_SUITE_P(Decided, Initsys, testing::ValuesIn(DECISION_CASES), ROW_NAME());
 
-constexpr char OF_MD2[] = "Version : 0.90.00\nUUID : 1:2:3:4\nPreferred Minor : 2\n";
-constexpr char OF_NO_ARRAY[] = "Version : 1.2\n";
-constexpr char EXAMINED_3[] = "/sbin/mdadm -E /dev/@3\n";
-
-void DecidedDiskExpect(MACHINE &machine, const DECIDED_DISK &disk)
-{
-    if (disk.pPlaces == nullptr) {
-        BlankDiskAdd(machine, disk.szDisk);
-    } else {
-        DecidedDiskAdd(machine, disk.szDisk, *disk.pPlaces);
-    }
-    DiskExpect(machine, disk.szDisk, disk.szExamined + disk.szLines);
-    for (TOOL_ROW &row : machine.rows) {
-        if (row.argv[1] == "-E" && row.argv[2] == "/dev/" + disk.szDisk + "3") {
-            row.answer.szOut = disk.szReport;
-        }
-    }
-}
-
-// The last line where these arrays are made.
-std::string InitedOf(const std::string &szArrays)
-{
-    if (szArrays == ARRAYS_A) {
-        return Inited("/dev/sda1 ", "/dev/sda2 ");
-    }
-    return szArrays == ARRAYS_AB ? Inited("/dev/sda1 /dev/sdb1 ", "/dev/sda2 /dev/sdb2 ")
-                                 : Inited("/dev/sdb1 /dev/sdc1 ", "/dev/sdb2 /dev/sdc2 ");
-}
-
-void ExpectDecision(const DECISION_CASE &row)
-{
-    SCOPED_TRACE(row.szName);
-    MACHINE machine = MachineWithConf(row.szConf);
-    for (const DECIDED_DISK &disk : row.disks) {
-        DecidedDiskExpect(machine, disk);
-    }
-    if (row.fSystemArray) {
-        SystemArrayAdd(machine, {{row.disks[0].szDisk + "1"}});
-    }
-    CommandsExpect(machine, row.szArrays);
-    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0, "");
-    for (const DECIDED_DISK &disk : row.disks) {
-        EXPECT_EQ(CommandsOn(result, disk.szDisk),
-                  Of(disk.szDisk, disk.szExamined + LISTED + disk.szLines));
-    }
-    EXPECT_EQ(CommandsBeside(result, ABCD), row.szArrays);
-    EXPECT_EQ(LogErrors(result), row.szLog + InitedOf(row.szArrays));
-}
-
-const std::string KEEP_8 = std::string(KEPT) + MADE_8;
-const std::string WIPE_8 = std::string(WIPED) + MADE_8;
-const std::string KEEP_7 = std::string(KEPT) + MADE_7;
-const std::string WIPE_7 = std::string(WIPED) + MADE_7;
-
-TEST(InitsysDecides, WhatBecomesOfADisk)
-{
-    const DECISION_CASE cases[] = {
-        {"the wanted layout keeps its data, and the disk itself is not asked",
-         {{"sda", &PLACES_8, KEEP_8, EXAMINED_3, OF_MD2}},
-         ARRAYS_A,
-         CONF_RAID,
-         false,
-         BIGGEST_8},
-        {"seven becomes eight with its data", {{"sda", &PLACES_7, KEEP_8, EXAMINED}}, ARRAYS_A},
-        // An old layout that holds data is the wanted one, on new disks too.
-        {"seven stays",
-         {{"sda", &PLACES_7, KEEP_7, EXAMINED_3, OF_MD2}, {"sdb", nullptr, WIPE_7}},
-         ARRAYS_AB,
-         CONF_RAID,
-         false,
-         "<11>partition_version.cpp:# Choose biggest partition layout version 7.\n"},
-        {"six stays",
-         {{"sda", &PLACES_6, std::string(KEPT) + MADE_6, EXAMINED_3, OF_MD2},
-          {"sdb", nullptr, std::string(WIPED) + MADE_6}},
-         ARRAYS_AB,
-         CONF_RAID,
-         false,
-         "<11>partition_version.cpp:# Choose biggest partition layout version 6.\n"},
-        // For the wanted layout, and to decide.
-        {"an older layout without array goes",
-         {{"sda", &PLACES_6, EXAMINED + WIPE_8, EXAMINED}},
-         ARRAYS_A},
-        {"an older layout with array is left alone",
-         {{"sda", &PLACES_8, KEEP_8, EXAMINED_3, OF_MD2},
-          {"sdb", &PLACES_6, EXAMINED_3, EXAMINED_3, OF_MD2}},
-         ARRAYS_A,
-         CONF_RAID,
-         false,
-         std::string(BIGGEST_8) + NO_TYPE},
-        // A newer layout than the wanted one is another layout like any.
-        {"eight goes where seven is wanted",
-         {{"sda", &PLACES_7, KEEP_7}, {"sdb", &PLACES_8, EXAMINED + WIPE_7}},
-         ARRAYS_AB,
-         CONF_RAID,
-         true},
-        {"layout one goes even where it is wanted",
-         {{"sda", &PLACES_1, std::string(WIPED) + MADE_1}},
-         ARRAYS_A,
-         CONF_RAID,
-         true},
-        {"an unrecognised table is left alone beside a known one",
-         {{"sda", &PLACES_FOREIGN, ""},
-          {"sdb", &PLACES_8, KEEP_8, EXAMINED},
-          {"sdc", nullptr, WIPE_8}},
-         ARRAYS_BC},
-        {"without RAID, the types of plain partitions",
-         {{"sda", &PLACES_8, std::string(KEPT) + MADE_8_NO_RAID},
-          {"sdb", nullptr, std::string(WIPED) + MADE_8_NO_RAID}},
-         ARRAYS_AB,
-         CONF_NO_RAID,
-         false,
-         BIGGEST_8},
-        // What a disk is decided to be is always looked up among the layouts of RAID machines.
-        {"without RAID, its own old layout is not recognised",
-         {{"sda", &PLACES_3_NO_RAID, std::string(KEPT) + MADE_3_NO_RAID}},
-         ARRAYS_A,
-         CONF_NO_RAID,
-         false,
-         "<11>partition_version.cpp:# Choose biggest partition layout version 3.\n"},
-        {"built-in storage has its own geometry",
-         {{"sda", &PLACES_BUILDIN, std::string(KEPT) + MADE_BUILDIN},
-          {"sdb", nullptr, std::string(WIPED) + MADE_BUILDIN}},
-         ARRAYS_AB,
-         CONF_BUILDIN,
-         false,
-         "<11>partition_version.cpp:# Choose biggest partition layout version 7.\n"},
-    };
-    for (const DECISION_CASE &row : cases) {
-        ExpectDecision(row);
-    }
-}
-
-TEST(InitsysDecides, ToWipeAnOlderLayoutWhoseSuperblockNamesNoArray)
-{
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    DecidedDiskExpect(machine, {"sda", &PLACES_6, EXAMINED + WIPE_8, EXAMINED, OF_NO_ARRAY});
-    CommandsExpect(machine, ARRAYS_A);
-    RunEnds(machine, {"initsys"}, 0);
-}
-
-// One partition alone is no blank disk either.
-TEST(InitsysDecides, ToRenewUnrecognisedTablesWhenThereIsNoKnownOne)
-{
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    KnownDiskRenew(machine, "sda", PLACES_FOREIGN, KEEP_8);
-    for (const int nPartition : {1, 2}) {
-        const std::string szDisk = nPartition == 1 ? "sdb" : "sdc";
-        MachineDiskAdd(machine, szDisk);
-        MachinePartitionAdd(machine, szDisk, nPartition, 2048, 4980480);
-        MachineTool(machine, ListingCommand(szDisk, nPartition),
-                    {.szOut = Listing(szDisk, nPartition, 2048, 4980480)});
-        MachineTool(machine, ListingCommand(szDisk, 3 - nPartition));
-        DiskExpect(machine, szDisk, KEEP_8);
-    }
-    BlankDiskWipe(machine, "sdd");
-    CommandsExpect(machine, ARRAYS_ABCD);
-    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0);
-    for (const char *const szDisk : {"sda", "sdb", "sdc"}) {
-        EXPECT_EQ(CommandsOn(result, szDisk), Of(szDisk, LISTED + KEEP_8));
-    }
-}
-
+// The superblocks are examined for the wanted layout alone.
 TEST(InitsysDecides, ToWipeEveryDiskWhereTheMarkerStands)
 {
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    MachineFile(machine, "/.force_clean_all_disk", "", 0);
-    PartitionedDiskAdd(machine, "sda", PLACES_8);
-    SuperblockExpect(machine, "sda3", 2); // for the wanted layout alone
-    PartitionedDiskAdd(machine, "sdb", PLACES_6);
-    SuperblockExpect(machine, "sdb3", 2);
-    PartitionedDiskAdd(machine, "sdc", PLACES_FOREIGN);
-    for (const char *const szDisk : {"sda", "sdb", "sdc"}) {
-        DiskExpect(machine, szDisk, WIPE_8);
-    }
-    CommandsExpect(machine, ARRAYS_ABC);
-    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0);
-    EXPECT_EQ(CommandsOn(result, "sdc"), Of("sdc", WIPE_8));
-    EXPECT_EQ(MachineFileRead("/.force_clean_all_disk"), "");
+    MACHINE machine =
+        MachineOfDisks({{"sda", PLACES_8}, {"sdb", PLACES_6}, {"sdc", PLACES_FOREIGN}});
+    MachineFile(machine, FORCE_MARKER, "", 0);
+    ExpectDisks({.szName = "marker",
+                 .disks = {{"sda", EXAMINED_MD2 + WIPED + MADE_8},
+                           {"sdb", EXAMINED_MD2 + WIPED + MADE_8},
+                           {"sdc", WIPED + MADE_8}},
+                 .beside = ARRAYS_ABC,
+                 .errors = Biggest(8) + INITED_ABC,
+                 .machine = machine});
+    EXPECT_EQ(MachineFileRead(FORCE_MARKER), "");
 }
 
 // ---- other machines ----------------------------------------------------------------------------
 
-TEST(InitsysModel, WithBuiltInStorageAndRaidHasNoLayout)
-{
-    MACHINE machine = MachineWithConf("maxdisks=4\nsupportraid=yes\nsupport_buildin_storage=yes\n"
-                                      "usbportcfg=0x30\ninternalportcfg=0xf\n");
-    BlankDiskAdd(machine, "sda");
-    MachineTool(machine, "/sbin/sfdisk --fast-delete -1 /dev/sda");
-    MachineTool(machine, "/sbin/sfdisk -M1 /dev/sda");
-    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 1);
-    EXPECT_EQ(LogOf(result, "partition_edit.cpp"),
-              "<11>partition_edit.cpp:# Failed to get partition layout: version=8\n");
-    ASSERT_EQ(result.log.size(), 4U) << LogText(result);
-    EXPECT_EQ(result.log[2].szText.rfind("arrayctl.cpp:# Failed to create system partition of "
-                                         "/dev/sda, newlayout=8, errno=0x",
-                                         0),
-              0U)
-        << LogText(result);
-    EXPECT_EQ(LogText({.log = {result.log[3]}}), NO_DISK);
-}
-
-TEST(InitsysModel, WithoutFileKnowsNoDisk)
-{
-    MACHINE machine = MachineMake();
-    MachineDiskAdd(machine, "sda");
-    MachineDiskAdd(machine, "sdb");
-    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 1);
-    EXPECT_EQ(TranscriptText(result), "");
-    EXPECT_EQ(LogOf(result, "arrayctl.cpp"), NO_DISK);
-}
-
 TEST(InitsysModel, WithTwoHeadsTakesTheExpansionUnits)
 {
-    MACHINE machine = MachineWithConf(CONF_DUAL_HEAD);
-    MachineDiskAdd(machine, "sda"); // internal
-    BlankDiskWipe(machine, "sdga");
-    BlankDiskWipe(machine, "sdgb");
-    MachineDiskAdd(machine, "sdgc"); // no unit tells of it
-    ExpansionUnitAdd(machine, "host6", "/dev/sdga,/dev/sdgb");
-    constexpr char ARRAYS[] =
-        "sleep 3\n"
-        "/sbin/mdadm -C /dev/md0 -e 0.9 -amd -R -l1 -n4 /dev/sdga1 /dev/sdgb1 missing missing\n"
-        "sleep 3\n"
-        "/sbin/mdadm -C /dev/md1 -e 0.9 -amd -R -l1 -n4 /dev/sdga2 /dev/sdgb2 missing missing\n";
-    CommandsExpect(machine, ARRAYS);
-    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0);
-    EXPECT_EQ(CommandsBeside(result, {"sdga", "sdgb"}), ARRAYS);
-    EXPECT_EQ(LogErrors(result), Inited("/dev/sdga1 /dev/sdgb1 ", "/dev/sdga2 /dev/sdgb2 "));
+    MACHINE machine = MachineOfDisks({{"sda", BLANK}, {"sdgc", BLANK}}, CONF_DUAL_HEAD);
+    ExpansionUnitAdd(machine, "host6", "/dev/sdga,/dev/sdgb"); // neither sda nor sdgc
+    ExpectDisks({.szName = "unit",
+                 .disks = OnEach({"sdga", "sdgb"}, BLANK_8),
+                 .beside = ArraysOf("-n4 /dev/sdga1 /dev/sdgb1 missing missing",
+                                    "-n4 /dev/sdga2 /dev/sdgb2 missing missing"),
+                 .errors = Inited("/dev/sdga1 /dev/sdgb1 ", "/dev/sdga2 /dev/sdgb2 "),
+                 .machine = machine});
     EXPECT_EQ(MachineFileRead("/tmp/.dualhead"), "");
 }
 
-TEST(InitsysModel, WithTwoHeadsIsToldByTheMarkerToo)
+// ---- what fails --------------------------------------------------------------------------------
+
+STEPS Uncreated(const std::string &szDisk, const std::string &szCode)
+{
+    return {{"<11>arrayctl.cpp:# Failed to create system partition of /dev/" + szDisk +
+             ", newlayout=8, errno=0x" + szCode}};
+}
+
+STEPS Unsigned(const std::string &szError)
+{
+    return {
+        {"<11>partition_edit.cpp:# Failed to add ms-dos signature to /dev/sda, err=" + szError}};
+}
+
+STEPS Unpartitioned(const std::string &szDisk, const std::string &szError)
+{
+    return {
+        {"<11>partition_edit.cpp:# Failed to partition disk /dev/" + szDisk + ", err=" + szError}};
+}
+
+STEPS ArrayFailed(const std::string &szMd, const std::string &szMembers,
+                  const std::string &szCommand)
+{
+    return {{"<11>arrayctl.cpp:# Failed to create RAID '" + szMd + "' on '" + szMembers + "' "},
+            {"<11>arrayctl.cpp:# szCmd=[/sbin/mdadm -C " + szMd + " -e 0.9 -amd -R -l1 " +
+             szCommand + "> /dev/null 2>&1]"}};
+}
+
+// A child that does not come to its end leaves its partitioner behind.
+MACHINE MachineOfKilled()
 {
     MACHINE machine = MachineWithConf(CONF_RAID);
-    MachineFile(machine, "/tmp/.dualhead", "");
-    MachineDiskAdd(machine, "sda");
-    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 1);
-    EXPECT_EQ(LogText(result), NO_DISK);
+    machine.fMayLeaveChildren = true;
+    return machine;
 }
 
-// ---- commands that fail ------------------------------------------------------------------------
+constexpr char DUPLICATED_A[] = "/bin/nurodd /dev/sda1 /dev/sda2";
 
-std::string Uncreated(const std::string &szDisk, const std::string &szCode)
-{
-    return "<11>arrayctl.cpp:# Failed to create system partition of /dev/" + szDisk +
-           ", newlayout=8, errno=0x" + szCode + "\n";
-}
+const DISKS_CASE FAILURE_CASES[] = {
+    {.szName = "WithoutTheModelsFile",
+     .errors = NO_MAXDISKS +
+               4 * STEPS{{"<11>disk_port.cpp:# Get usbportcfg key from "
+                          "/etc.defaults/nuroinfo.conf Error"}} +
+               NO_DISK,
+     .machine = Without(MachineOfDisks({{"sda", BLANK}, {"sdb", BLANK}}), "/etc.defaults"),
+     .status = 1},
+    {.szName = "ABuiltInStorageWithRaidHasNoLayout",
+     .disks = {{"sda", LISTED + WIPED}},
+     .errors = STEPS{{"<11>partition_edit.cpp:# Failed to get partition layout: version=8"}} +
+               Uncreated("sda", "2000") + NO_DISK,
+     .machine = MachineWithConf("maxdisks=4\nsupportraid=yes\nsupport_buildin_storage=yes\n"
+                                "usbportcfg=0x30\ninternalportcfg=0xf\n"),
+     .status = 1},
+    // The lookup of the second head finds no such key, and nothing sets a code after it.
+    {.szName = "WithTheCodeThatStands",
+     .disks = {{"sda",
+                LISTED + STEPS{WIPED[0]} + 2 * STEPS{{"/sbin/sfdisk -M1 /dev/@", {.status = 1}}}}},
+     .errors =
+         2 * Unsigned("256") + Unpartitioned("sda", "255") + Uncreated("sda", "2000") + NO_DISK,
+     .machine = MachineWithSlots("4"),
+     .status = 1},
+    {.szName = "NotWhenTheArraysDo",
+     .disks = OnEach({"sda", "sdb"}, BLANK_8),
+     .beside = ArraysOf("-n4 /dev/sda1 /dev/sdb1 missing missing",
+                        "-n4 /dev/sda2 /dev/sdb2 missing missing",
+                        {.szOut = "noise\n", .szErr = "noise\n", .status = 2}),
+     .errors = ArrayFailed("/dev/md0", "/dev/sda1 /dev/sdb1 ",
+                           " -n4 /dev/sda1 /dev/sdb1   missing missing") +
+               ArrayFailed("/dev/md1", "/dev/sda2 /dev/sdb2 ",
+                           " -n4 /dev/sda2 /dev/sdb2   missing missing") +
+               INITED_AB},
+    {.szName = "NotWithoutAShell",
+     .disks = {{"sda", BLANK_8}},
+     .beside = {{"sleep 3"}, {"fault system 1"}, {"sleep 3"}, {"fault system 2"}},
+     .errors = ArrayFailed("/dev/md0", "/dev/sda1 ", "-f -n4 /dev/sda1   missing missing missing") +
+               ArrayFailed("/dev/md1", "/dev/sda2 ", "-f -n4 /dev/sda2   missing missing missing") +
+               INITED_A,
+     .machine = WithFault(MachineWithConf(CONF_RAID),
+                          {.szFunction = "system", .error = EAGAIN, .fGoOn = true})},
+    // Its exit status is that of the bits 8 to 15, and a signal stands below them.
+    {.szName = "NotWhenTheShellIsKilled",
+     .disks = {{"sda", BLANK_8}},
+     .beside = {{"sleep 3"}, {"sleep 3"}},
+     .errors = INITED_A,
+     .machine = With(MachineWithConf(CONF_RAID), ShellKill),
+     .arguments = {"initsys-dd"}},
+    {.szName = "ForTheDiskWhoseDecisionCannotBeWaitedFor",
+     .disks = {{"sda", LISTED}, {"sdb", BLANK_8}},
+     .beside = STEPS{{"fault waitpid \"1 0 -\""}} + ARRAYS_B,
+     .errors = STEPS{{"<11>arrayctl.cpp:# Wait pid failed. pid: # disk: sda"}} + INITED_B,
+     .machine = WithFault(MachineOfKilled(),
+                          {.szFunction = "waitpid", .error = ECHILD, .szProcess = "0"})},
+    // The disk behind a slow one is done first, but its turn comes later.
+    {.szName = "ForKilledChildrenInTheOrderOfTheDisks",
+     .disks = {{"sda", {{LISTED[0].szText, {.signalCaller = SIGKILL, .msDelay = 1000}}}},
+               {"sdb", {{LISTED[0].szText, {.signalCaller = SIGKILL}}}},
+               {"sdc", BLANK_8}},
+     .beside = ARRAYS_C,
+     .errors = STEPS{{"<11>arrayctl.cpp:# Child exit not normally, pid: # disk: sda"},
+                     {"<11>arrayctl.cpp:# Child exit not normally, pid: # disk: sdb"}} +
+               INITED_C,
+     .machine = MachineOfKilled()},
+    {.szName = "ForTheDiskWhoseChildIsKilledAlone",
+     .disks = {{"sda", BLANK_8},
+               {"sdb", LISTED + STEPS{{WIPED[0].szText, {.signalCaller = SIGTERM}}}},
+               {"sdc", BLANK_8}},
+     .beside = ARRAYS_AC,
+     .errors = STEPS{{"<11>arrayctl.cpp:# Child exit not normally, pid: # disk: sdb"}} + INITED_AC,
+     .machine = MachineOfKilled()},
+};
+
+INSTANTIATE_TEST_SUITE_P(Fails, Initsys, testing::ValuesIn(FAILURE_CASES), ROW_NAME());
 
 // All keys that are asked are there, so no lookup has left a code before.
 TEST(InitsysFails, ForADiskThatCannotBePartitionedAlone)
 {
-    MACHINE machine = MachineWithConf(std::string(CONF_RAID) + "max_sys_raid_disks=4\n"
-                                                               "support_dual_head=no\n"
-                                                               "cacheportcfg=0x0\n");
-    BlankDiskWipe(machine, "sda");
-    BlankDiskAdd(machine, "sdb");
-    MachineTool(machine, "/sbin/sfdisk --fast-delete -1 /dev/sdb", {.status = 1}); // no matter
-    MachineTool(machine, "/sbin/sfdisk -M1 /dev/sdb", {.nTimes = 2});
-    MachineTool(machine, "/sbin/sfdisk -N1 -uS -q -f -j2048 -z4980480 -tfd -F /dev/sdb",
-                {.szErr = "too small\n", .status = 1});
-    BlankDiskWipe(machine, "sdc");
-    CommandsExpect(machine, ARRAYS_AC);
-    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0);
-    EXPECT_EQ(LogErrors(result),
-              "<11>partition_edit.cpp:# Failed to partition disk /dev/sdb, err=256\n" +
-                  Uncreated("sdb", "0") + Inited("/dev/sda1 /dev/sdc1 ", "/dev/sda2 /dev/sdc2 "));
+    ExpectDisks({.szName = "sdb",
+                 .disks = {{"sda", BLANK_8},
+                           {"sdb", LISTED + STEPS{{WIPED[0].szText, {.status = 1}}, // no matter
+                                                  WIPED[1],
+                                                  MADE_8[0],
+                                                  {MADE_8[1].szText,
+                                                   {.szErr = "too small\n", .status = 1}}}},
+                           {"sdc", BLANK_8}},
+                 .beside = ARRAYS_AC,
+                 .errors = Unpartitioned("sdb", "256") + Uncreated("sdb", "0") + INITED_AC,
+                 .machine = MachineWithConf(CONF_RAID + "max_sys_raid_disks=4\n"
+                                                        "support_dual_head=no\n"
+                                                        "cacheportcfg=0x0\n")});
     const std::string szLog = MachineFileRead("/var/log/space_operation_error.log").value_or("");
     EXPECT_NE(szLog.find(" command=\"/sbin/sfdisk -N1 -uS -q -f -j2048 -z4980480 -tfd -F "
                          "/dev/sdb\" Error=\"too small \"\n"),
@@ -602,290 +469,162 @@ TEST(InitsysFails, ForADiskThatCannotBePartitionedAlone)
         << szLog;
 }
 
-TEST(InitsysFails, WithTheCodeThatStands)
+MACHINE MachineOfFour(const STEPS &steps)
 {
-    // The lookup of the second head finds no such key, and nothing sets a code after it.
-    MACHINE machine = MachineWithConf(std::string(CONF_RAID) + "max_sys_raid_disks=4\n");
-    BlankDiskAdd(machine, "sda");
-    MachineTool(machine, "/sbin/sfdisk --fast-delete -1 /dev/sda");
-    MachineTool(machine, "/sbin/sfdisk -M1 /dev/sda", {.status = 1, .nTimes = 2});
-    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 1);
-    const std::string szUnsigned =
-        "<11>partition_edit.cpp:# Failed to add ms-dos signature to /dev/sda, err=256\n";
-    EXPECT_EQ(LogErrors(result),
-              szUnsigned + szUnsigned +
-                  "<11>partition_edit.cpp:# Failed to partition disk /dev/sda, err=255\n" +
-                  Uncreated("sda", "2000") + NO_DISK);
+    MACHINE machine = MachineWithConf(CONF_RAID);
+    for (const std::string &szDisk : ABCD) {
+        MachineDiskAdd(machine, szDisk);
+        StepsExpect(machine, StepsOn(szDisk, steps));
+    }
+    return machine;
 }
 
 TEST(InitsysFails, WhenEveryChildDoes)
 {
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    for (const std::string &szDisk : ABCD) {
-        BlankDiskWipe(machine, szDisk);
-        machine.rows.back().answer.status = 1; // partition 2
-    }
-    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 1, "");
+    STEPS steps = BLANK_8;
+    steps.back().answer.status = 1; // partition 2
+    const RUN_RESULT result = RunEnds(MachineOfFour(steps), {"initsys"}, 1, "");
     EXPECT_EQ(CommandsBeside(result, ABCD), "");
-    EXPECT_EQ(LogText({.log = {result.log.back()}}), NO_DISK);
-}
-
-TEST(InitsysFails, NotWhenTheArraysDo)
-{
-    MACHINE machine = MachineOf({"sda", "sdb"}, ARRAYS_AB);
-    for (TOOL_ROW &row : machine.rows) {
-        if (row.argv[1] == "-C") {
-            row.answer = {.szOut = "noise\n", .szErr = "noise\n", .status = 2};
-        }
-    }
-    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0, "");
-    EXPECT_EQ(CommandsBeside(result, ABCD), ARRAYS_AB);
-    EXPECT_EQ(LogErrors(result),
-              "<11>arrayctl.cpp:# Failed to create RAID '/dev/md0' on '/dev/sda1 /dev/sdb1 ' \n"
-              "<11>arrayctl.cpp:# szCmd=[/sbin/mdadm -C /dev/md0 -e 0.9 -amd -R -l1  -n4 "
-              "/dev/sda1 /dev/sdb1   missing missing> /dev/null 2>&1]\n"
-              "<11>arrayctl.cpp:# Failed to create RAID '/dev/md1' on '/dev/sda2 /dev/sdb2 ' \n"
-              "<11>arrayctl.cpp:# szCmd=[/sbin/mdadm -C /dev/md1 -e 0.9 -amd -R -l1  -n4 "
-              "/dev/sda2 /dev/sdb2   missing missing> /dev/null 2>&1]\n" +
-                  Inited("/dev/sda1 /dev/sdb1 ", "/dev/sda2 /dev/sdb2 "));
-}
-
-TEST(InitsysFails, NotWithoutAShell)
-{
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    BlankDiskWipe(machine, "sda");
-    machine.faults = {{.szFunction = "system", .nCall = 1, .error = EAGAIN, .fGoOn = true}};
-    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0);
-    EXPECT_EQ(CommandsBeside(result, ABCD), "sleep 3\nfault system 1\nsleep 3\nfault system 2\n");
-    EXPECT_EQ(LogErrors(result),
-              "<11>arrayctl.cpp:# Failed to create RAID '/dev/md0' on '/dev/sda1 ' \n"
-              "<11>arrayctl.cpp:# szCmd=[/sbin/mdadm -C /dev/md0 -e 0.9 -amd -R -l1 -f -n4 "
-              "/dev/sda1   missing missing missing> /dev/null 2>&1]\n"
-              "<11>arrayctl.cpp:# Failed to create RAID '/dev/md1' on '/dev/sda2 ' \n"
-              "<11>arrayctl.cpp:# szCmd=[/sbin/mdadm -C /dev/md1 -e 0.9 -amd -R -l1 -f -n4 "
-              "/dev/sda2   missing missing missing> /dev/null 2>&1]\n" +
-                  Inited("/dev/sda1 ", "/dev/sda2 "));
-}
-
-// Its exit status is that of the bits 8 to 15, and a signal stands below them.
-TEST(InitsysFails, NotWhenTheShellIsKilled)
-{
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    BlankDiskWipe(machine, "sda");
-    ShellKill(machine);
-    const RUN_RESULT result = RunEnds(machine, {"initsys-dd"}, 0, "");
-    EXPECT_EQ(CommandsBeside(result, ABCD), "sleep 3\nsleep 3\n");
-    EXPECT_EQ(LogErrors(result), Inited("/dev/sda1 ", "/dev/sda2 "));
-}
-
-TEST(InitsysFails, WithoutAPartitionerForEveryDisk)
-{
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    MachineDiskAdd(machine, "sda");
-    machine.tools["/sbin/sfdisk"] = TOOL_KIND::MISSING;
-    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 1);
-    EXPECT_EQ(LogOf(result, "partition_edit.cpp"),
-              "<15>partition_edit.cpp:# Failed to do '/sbin/sfdisk --fast-delete -1 /dev/sda'\n"
-              "<11>partition_edit.cpp:# Failed to add ms-dos signature to /dev/sda, err=32512\n"
-              "<11>partition_edit.cpp:# Failed to add ms-dos signature to /dev/sda, err=32512\n"
-              "<11>partition_edit.cpp:# Failed to partition disk /dev/sda, err=255\n");
-}
-
-// ---- calls that fail ---------------------------------------------------------------------------
-
-TEST(InitsysFails, WhenNoLayoutIsFound)
-{
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    MachineDiskAdd(machine, "sda");
-    machine.faults = {{.szFunction = "glob", .nCall = 1, .error = EIO}};
-    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 1);
-    EXPECT_EQ(LogText(result), "<11>arrayctl.cpp:# Failed to find partition layout\n");
-    EXPECT_EQ(TranscriptText(result), "fault glob 1\n");
-}
-
-struct ENUM_CASE {
-    const char *szConf;
-    const char *szDevices;
-};
-
-TEST(InitsysFails, WhenTheDisksCannotBeEnumerated)
-{
-    constexpr ENUM_CASE CASES[] = {{CONF_RAID, "INTERNAL_DEVICE"},
-                                   {CONF_DUAL_HEAD, "EUNIT_DEVICE"}};
-    for (const ENUM_CASE &row : CASES) {
-        MACHINE machine = MachineWithConf(row.szConf);
-        machine.faults = {{.szFunction = "glob", .nCall = 3, .error = EIO}};
-        const RUN_RESULT result = RunEnds(machine, {"initsys"}, 1);
-        EXPECT_EQ(LogText(result), "<11>disk_port.cpp:# read error :/sys/block/sd*\n"
-                                   "<11>arrayctl.cpp:# Failed to enum " +
-                                       std::string(row.szDevices) + "\n");
-    }
-}
-
-constexpr char NO_FORK[] = "<11>process.cpp:# fork error, errno=Resource temporarily unavailable\n"
-                           "<11>arrayctl.cpp:# Failed to fork.\n";
-
-TEST(InitsysFails, AtOnceWhenNoChildCanBeForked)
-{
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    MachineDiskAdd(machine, "sda");
-    MachineDiskAdd(machine, "sdb");
-    machine.faults = {{.szFunction = "fork", .nCall = 1, .error = EAGAIN}};
-    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 1);
-    EXPECT_EQ(LogErrors(result), NO_FORK);
-    EXPECT_EQ(TranscriptText(result), "fault fork 1\n");
+    EXPECT_EQ(LogText({.log = {result.log.back()}}), StepsText(NO_DISK));
 }
 
 // Those that decide already are not waited for.
 TEST(InitsysFails, AtOnceWhenALaterChildCannotBeForked)
 {
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    for (const std::string &szDisk : ABCD) {
-        MachineDiskAdd(machine, szDisk);
-        MachineTool(machine, ListingCommand(szDisk, 1), {.nMeet = NEVER, .nTimes = ANY_TIMES});
-        MachineTool(machine, ListingCommand(szDisk, 2), {.nMeet = NEVER, .nTimes = ANY_TIMES});
+    STEPS steps = LISTED;
+    for (STEP &step : steps) {
+        step.answer = {.nMeet = NEVER, .nTimes = ANY_TIMES};
     }
-    machine.faults = {{.szFunction = "fork", .nCall = 3, .error = EAGAIN}};
+    MACHINE machine =
+        WithFault(MachineOfFour(steps), {.szFunction = "fork", .nCall = 3, .error = EAGAIN});
     machine.fMayLeaveChildren = true;
     const RUN_RESULT result = RunEnds(machine, {"initsys"}, 1);
-    EXPECT_EQ(LogErrors(result), NO_FORK);
+    EXPECT_EQ(LogErrors(result), StepsText(NO_FORK));
     EXPECT_EQ(CommandsOn(result, "sdc"), "");
-}
-
-// With the marker the two that decide start nothing themselves.
-TEST(InitsysFails, AtOnceWhenAPartitioningChildCannotBeForked)
-{
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    MachineFile(machine, "/.force_clean_all_disk", "");
-    MachineDiskAdd(machine, "sda");
-    MachineDiskAdd(machine, "sdb");
-    machine.faults = {{.szFunction = "fork", .nCall = 3, .error = EAGAIN}};
-    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 1);
-    EXPECT_EQ(LogErrors(result), NO_FORK);
-    EXPECT_EQ(TranscriptText(result), "fault fork 3\n");
-}
-
-TEST(InitsysFails, ForTheDiskWhoseDecisionCannotBeWaitedFor)
-{
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    BlankDiskAdd(machine, "sda");
-    BlankDiskWipe(machine, "sdb");
-    CommandsExpect(machine, ARRAYS_B);
-    machine.faults = {{.szFunction = "waitpid", .nCall = 1, .error = ECHILD}};
-    machine.fMayLeaveChildren = true;
-    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0);
-    EXPECT_EQ(LogOf(result, "arrayctl.cpp"),
-              "<11>arrayctl.cpp:# Wait pid failed. pid: # disk: sda\n" +
-                  Inited("/dev/sdb1 ", "/dev/sdb2 "));
-    EXPECT_EQ(CommandsOn(result, "sda"), Of("sda", LISTED));
 }
 
 TEST(InitsysFails, ForTheDiskWhosePartitioningCannotBeWaitedFor)
 {
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    BlankDiskWipe(machine, "sda");
-    BlankDiskAdd(machine, "sdb");
-    DiskExpect(machine, "sdb", WIPE_8);
-    for (TOOL_ROW &row : machine.rows) {
-        const bool fRenews = row.argv.back() == "/dev/sdb" && row.argv[1] != "-l";
-        row.answer.nTimes = fRenews ? ANY_TIMES : 1; // it may come to its end or not
+    MACHINE machine = MachineOfKilled();
+    MachineDiskAdd(machine, "sda");
+    MachineDiskAdd(machine, "sdb");
+    STEPS renewed = WIPED + MADE_8;
+    for (STEP &step : renewed) {
+        step.answer.nTimes = ANY_TIMES; // it may come to its end or not
     }
-    CommandsExpect(machine, ARRAYS_A);
+    StepsExpect(machine, StepsOn("sda", BLANK_8) + StepsOn("sdb", LISTED + renewed) + ARRAYS_A);
     machine.faults = {{.szFunction = "waitpid", .nCall = 4, .error = ECHILD}}; // two have decided
-    machine.fMayLeaveChildren = true;
     const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0);
     EXPECT_EQ(LogOf(result, "arrayctl.cpp"),
-              "<11>arrayctl.cpp:# Wait pid failed. pid: # disk: sdb\n" +
-                  Inited("/dev/sda1 ", "/dev/sda2 "));
+              "<11>arrayctl.cpp:# Wait pid failed. pid: # disk: sdb\n" + StepsText(INITED_A));
 }
 
-// Whichever calls they are that ask for memory. The C library's own are among them, and its glob()
-// does not survive each of them, so only the runs that end in the message are looked at.
 TEST(InitsysFails, WithoutMemory)
 {
-    constexpr char NO_LIST[] = "<11>arrayctl.cpp:# Out of memeory, failed to allocate memory for "
-                               "PNLIBSZLIST via NLIBCSzListAlloc\n";
-    constexpr char NO_CHILDREN[] = "<11>arrayctl.cpp:# failed to alloc\n";
-    bool fListSeen = false;
-    bool fChildrenSeen = false;
-    for (const char *const szFunction : {"malloc", "calloc"}) {
-        for (int nCall = 1; nCall <= 24; nCall++) {
-            MACHINE machine = MachineWithConf(CONF_RAID);
-            MachineFile(machine, "/.force_clean_all_disk", "");
-            MachineDiskAdd(machine, "sda");
-            MachineTool(machine, "/sbin/sfdisk ...", {.nTimes = ANY_TIMES});
-            MachineTool(machine, "/sbin/mdadm ...", {.nTimes = ANY_TIMES});
-            machine.faults = {{.szFunction = szFunction, .nCall = nCall}};
-            const RUN_RESULT result = MachineTry(machine, {"initsys"});
-            const std::string szLog = LogOf(result, "arrayctl.cpp");
-            if (szLog == NO_LIST || szLog == NO_CHILDREN) {
-                EXPECT_EQ(result.status, 1);
-                EXPECT_EQ(result.problems, std::vector<std::string>());
-            }
-            fListSeen = fListSeen || szLog == NO_LIST;
-            fChildrenSeen = fChildrenSeen || szLog == NO_CHILDREN;
-        }
-    }
-    EXPECT_TRUE(fListSeen);
-    EXPECT_TRUE(fChildrenSeen);
+    MACHINE machine = WithFile(MachineOfDisks({{"sda", BLANK}}), FORCE_MARKER, "");
+    MachineTool(machine, "/sbin/sfdisk ...", {.nTimes = ANY_TIMES});
+    MachineTool(machine, "/sbin/mdadm ...", {.nTimes = ANY_TIMES});
+    EXPECT_GE(RunsWithoutMemory(machine, "initsys", NO_MEMORY_FOR_LIST), 1);
+    EXPECT_GE(RunsWithoutMemory(machine, "initsys", "<11>arrayctl.cpp:# failed to alloc\n"), 1);
 }
+
+// ---- runs that end early -----------------------------------------------------------------------
+
+struct InitsysEnds : testing::TestWithParam<RUN_CASE> {
+};
+
+TEST_P(InitsysEnds, Early)
+{
+    ExpectRun(GetParam());
+}
+
+MACHINE WithGlobFault(const MACHINE &machine, int nCall)
+{
+    return WithFault(machine, {.szFunction = "glob", .nCall = nCall, .error = EIO});
+}
+
+const STEPS TWO_BLANK = {{"<15>partition_layout.cpp:# /dev/sda: dont contain partition [1]"},
+                         {"<15>partition_layout.cpp:# /dev/sdb: dont contain partition [1]"}};
+const STEPS UNREAD = {{"fault glob 3"}, {"<11>disk_port.cpp:# read error :/sys/block/sd*"}};
+
+const RUN_CASE RUN_CASES[] = {
+    {.szName = "WithoutADisk",
+     .machine = MachineWithConf(CONF_RAID),
+     .arguments = {"initsys"},
+     .status = 1,
+     .steps = NO_DISK},
+    {.szName = "WithTheMarkerOfTwoHeads",
+     .machine = WithFile(MachineOfDisks({{"sda", BLANK}}), "/tmp/.dualhead", ""),
+     .arguments = {"initsys"},
+     .status = 1,
+     .steps = NO_DISK},
+    {.szName = "WithoutALayout",
+     .machine = WithGlobFault(MachineOfDisks({{"sda", BLANK}}), 1),
+     .arguments = {"initsys"},
+     .status = 1,
+     .steps = {{"fault glob 1"}, {"<11>arrayctl.cpp:# Failed to find partition layout"}}},
+    {.szName = "WithoutTheInternalDisks",
+     .machine = WithGlobFault(MachineWithConf(CONF_RAID), 3),
+     .arguments = {"initsys"},
+     .status = 1,
+     .steps = UNREAD + STEPS{{"<11>arrayctl.cpp:# Failed to enum INTERNAL_DEVICE"}}},
+    {.szName = "WithoutTheUnitsDisks",
+     .machine = WithGlobFault(MachineWithConf(CONF_DUAL_HEAD), 3),
+     .arguments = {"initsys"},
+     .status = 1,
+     .steps = UNREAD + STEPS{{"<11>arrayctl.cpp:# Failed to enum EUNIT_DEVICE"}}},
+    {.szName = "WithoutAChild",
+     .machine = WithFault(MachineOfDisks({{"sda", BLANK}, {"sdb", BLANK}}),
+                          {.szFunction = "fork", .error = EAGAIN}),
+     .arguments = {"initsys"},
+     .status = 1,
+     .steps = TWO_BLANK + STEPS{{"fault fork 1"}} + NO_FORK},
+    // With the marker the two that decide start nothing themselves.
+    {.szName = "WithoutAPartitioningChild",
+     .machine =
+         WithFault(WithFile(MachineOfDisks({{"sda", BLANK}, {"sdb", BLANK}}), FORCE_MARKER, ""),
+                   {.szFunction = "fork", .nCall = 3, .error = EAGAIN}),
+     .arguments = {"initsys"},
+     .status = 1,
+     .steps = TWO_BLANK + STEPS{{"fault fork 3"}} + NO_FORK},
+    {.szName = "WithoutAPartitioner",
+     .machine = WithTool(MachineOfDisks({{"sda", BLANK}}), "/sbin/sfdisk", TOOL_KIND::MISSING),
+     .arguments = {"initsys"},
+     .status = 1,
+     .steps =
+         STEPS{TWO_BLANK[0],
+               {"<15>partition_edit.cpp:# Failed to do '/sbin/sfdisk --fast-delete -1 /dev/sda'"}} +
+         2 * Unsigned("32512") + Unpartitioned("sda", "255") + Uncreated("sda", "2000") + NO_DISK},
+    {.szName = "WithTwoEmptyListsForTheDuplicationTool",
+     .machine = MachineWithConf(CONF_RAID),
+     .arguments = {"initsys-dd"},
+     .status = 1,
+     .steps = STEPS{{"/bin/nurodd"}} + NO_DISK},
+};
+
+INSTANTIATE_TEST_SUITE_P(, InitsysEnds, testing::ValuesIn(RUN_CASES), ROW_NAME());
 
 // ---- children ----------------------------------------------------------------------------------
 
 TEST(InitsysChildren, WorkSideBySide)
 {
-    MACHINE machine = MachineOf(ABCD, "");
-    for (TOOL_ROW &row : machine.rows) {
-        row.answer.nMeet = !HasWord(row, "-N1") ? 0 : HasWord(row, "-l") ? 4 : 8;
-    }
-    CommandsExpect(machine, ARRAYS_ABCD);
-    (void)RunEnds(machine, {"initsys"}, 0);
-}
-
-// The disk behind a slow one is done first, but its turn comes later.
-TEST(InitsysChildren, AreWaitedForInTheOrderOfTheDisks)
-{
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    MachineDiskAdd(machine, "sda");
-    MachineTool(machine, ListingCommand("sda", 1), {.signalCaller = SIGKILL, .msDelay = 1000});
-    MachineDiskAdd(machine, "sdb");
-    MachineTool(machine, ListingCommand("sdb", 1), {.signalCaller = SIGKILL});
-    BlankDiskWipe(machine, "sdc");
-    CommandsExpect(machine, ARRAYS_C);
-    machine.fMayLeaveChildren = true; // the killing partitioner itself
-    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0);
-    EXPECT_EQ(LogOf(result, "arrayctl.cpp"),
-              "<11>arrayctl.cpp:# Child exit not normally, pid: # disk: sda\n"
-              "<11>arrayctl.cpp:# Child exit not normally, pid: # disk: sdb\n" +
-                  Inited("/dev/sdc1 ", "/dev/sdc2 "));
-}
-
-TEST(InitsysChildren, CostTheirOwnDiskWhenKilled)
-{
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    BlankDiskWipe(machine, "sda");
-    BlankDiskAdd(machine, "sdb");
-    MachineTool(machine, "/sbin/sfdisk --fast-delete -1 /dev/sdb", {.signalCaller = SIGTERM});
-    BlankDiskWipe(machine, "sdc");
-    CommandsExpect(machine, ARRAYS_AC);
-    machine.fMayLeaveChildren = true;
-    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0);
-    EXPECT_EQ(LogOf(result, "arrayctl.cpp"),
-              "<11>arrayctl.cpp:# Child exit not normally, pid: # disk: sdb\n" +
-                  Inited("/dev/sda1 /dev/sdc1 ", "/dev/sda2 /dev/sdc2 "));
-    EXPECT_EQ(CommandsOn(result, "sdb"),
-              Of("sdb", LISTED) + "/sbin/sfdisk --fast-delete -1 /dev/sdb\n");
+    STEPS steps = BLANK_8;
+    steps[0].answer.nMeet = 4; // partition 1 is asked for, and
+    steps[5].answer.nMeet = 8; // made
+    ExpectDisks({.szName = "four",
+                 .disks = OnEach(ABCD, steps),
+                 .beside = ARRAYS_ABCD,
+                 .errors = INITED_ABCD});
 }
 
 TEST(InitsysChildren, HaveNothingToReadOrToSay)
 {
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    BlankDiskWipe(machine, "sda");
-    for (TOOL_ROW &row : machine.rows) {
-        row.answer.szErr = "noise\n";
+    STEPS steps = BLANK_8;
+    for (STEP &step : steps) {
+        step.answer.szErr = "noise\n";
     }
-    CommandsExpect(machine, ARRAYS_A);
-    const RUN_RESULT result = RunEnds(machine, {"initsys"}, 0, "");
+    const RUN_RESULT result = ExpectDisks(
+        {.szName = "one", .disks = {{"sda", steps}}, .beside = ARRAYS_A, .errors = INITED_A});
     for (const RUN_EVENT &event : result.events) {
         if (IsOnDisk(event, "sda")) {
             EXPECT_TRUE(event.fNullInput) << event.argv[1];
@@ -895,80 +634,70 @@ TEST(InitsysChildren, HaveNothingToReadOrToSay)
 
 // ---- the duplication tool ----------------------------------------------------------------------
 
-TEST(InitsysDuplicate, HandsThePartitionsOverBeforeTheArrays)
-{
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    BlankDiskWipe(machine, "sda");
-    BlankDiskWipe(machine, "sdb");
-    const std::string szDuplicate = "/bin/nurodd /dev/sda1 /dev/sdb1 /dev/sda2 /dev/sdb2";
-    MachineTool(machine, szDuplicate, {.szOut = "noise\n", .szErr = "noise\n"});
-    CommandsExpect(machine, ARRAYS_AB);
-    ShellWatch(machine);
-    const RUN_RESULT result = RunEnds(machine, {"initsys-dd", "anything"}, 0, "");
-    EXPECT_EQ(CommandsBeside(result, ABCD), szDuplicate + "\n" + ARRAYS_AB);
-    const std::string szShell = ShellText();
-    EXPECT_EQ(szShell.substr(0, szShell.find('\n')),
-              "/bin/nurodd /dev/sda1 /dev/sdb1  /dev/sda2 /dev/sdb2  > /dev/null 2>&1");
-    EXPECT_EQ(LogErrors(result), Inited("/dev/sda1 /dev/sdb1 ", "/dev/sda2 /dev/sdb2 "));
-}
+const DISKS_CASE DUPLICATION_CASES[] = {
+    {.szName = "BeforeTheArrays",
+     .disks = OnEach({"sda", "sdb"}, BLANK_8),
+     .beside = STEPS{{"/bin/nurodd /dev/sda1 /dev/sdb1 /dev/sda2 /dev/sdb2",
+                      {.szOut = "noise\n", .szErr = "noise\n"}}} +
+               ARRAYS_AB,
+     .errors = INITED_AB,
+     .arguments = {"initsys-dd", "anything"},
+     .szShell = "/bin/nurodd /dev/sda1 /dev/sdb1  /dev/sda2 /dev/sdb2  > /dev/null 2>&1\n"
+                "/sbin/mdadm -C /dev/md0 -e 0.9 -amd -R -l1  -n4 /dev/sda1 /dev/sdb1   "
+                "missing missing> /dev/null 2>&1\n"
+                "/sbin/mdadm -C /dev/md1 -e 0.9 -amd -R -l1  -n4 /dev/sda2 /dev/sdb2   "
+                "missing missing> /dev/null 2>&1\n"},
+    // The disks that are left out are not handed over either.
+    {.szName = "TheMembersAlone",
+     .disks = {{"sda", BLANK_8}, {"sdb", BLANK_8 + ZEROED}},
+     .beside = STEPS{{DUPLICATED_A}} + ARRAYS_OF_ONE_SLOT,
+     .errors = INITED_A,
+     .machine = MachineWithSlots("1"),
+     .arguments = {"initsys-dd"}},
+    {.szName = "WithoutAShell", // one line only
+     .disks = {{"sda", BLANK_8}},
+     .beside = STEPS{{"fault system 1"}} + ARRAYS_A,
+     .errors = INITED_A,
+     .machine = WithFault(MachineWithConf(CONF_RAID), {.szFunction = "system", .error = EAGAIN}),
+     .arguments = {"initsys-dd"},
+     .szOut = "can not fork to nurodd\n"},
+    {.szName = "WithTwoEmptyLists",
+     .disks = {{"sda",
+                LISTED + WIPED + STEPS{MADE_8[0], MADE_8[1], {MADE_8[2].szText, {.status = 1}}}}},
+     .beside = {{"/bin/nurodd"}},
+     .errors = STEPS{{"<11>partition_edit.cpp:# Failed to [/sbin/sfdisk -N2 -uS -q -f -j0 "
+                      "-z4194304 -tfd -F /dev/sda], err=256"}} +
+               Uncreated("sda", "2000") + NO_DISK,
+     .arguments = {"initsys-dd"},
+     .status = 1,
+     .szShell = "/bin/nurodd   > /dev/null 2>&1\n"},
+};
 
-// The disks that are left out are not handed over either.
-TEST(InitsysDuplicate, GetsTheMembersAlone)
+INSTANTIATE_TEST_SUITE_P(Duplicates, Initsys, testing::ValuesIn(DUPLICATION_CASES), ROW_NAME());
+
+void ExpectDuplicationFails(const MACHINE &machine, const STEPS &duplicated)
 {
-    MACHINE machine = MachineWithConf(ConfWithSlots("1"));
-    BlankDiskWipe(machine, "sda");
-    BlankDiskWipe(machine, "sdb");
-    MachineTool(machine, "/sbin/mdadm --zero-superblock /dev/sdb1");
-    MachineTool(machine, "/sbin/mdadm --zero-superblock /dev/sdb2");
-    MachineTool(machine, "/bin/nurodd /dev/sda1 /dev/sda2");
-    CommandsExpect(machine, ARRAYS_OF_ONE);
-    RunEnds(machine, {"initsys-dd"}, 0);
+    ExpectDisks({.szName = "one disk",
+                 .disks = {{"sda", BLANK_8}},
+                 .beside = duplicated + ARRAYS_A,
+                 .errors = INITED_A,
+                 .machine = machine,
+                 .arguments = {"initsys-dd"},
+                 .szOut = "system init with nurodd failed\n"});
 }
 
 TEST(InitsysDuplicate, ThatFailsChangesNothing)
 {
     for (const int status : {1, 127, 255}) {
-        MACHINE machine = MachineWithConf(CONF_RAID);
-        BlankDiskWipe(machine, "sda");
-        MachineTool(machine, "/bin/nurodd /dev/sda1 /dev/sda2", {.status = status});
-        CommandsExpect(machine, ARRAYS_A);
-        RunEnds(machine, {"initsys-dd"}, 0, "system init with nurodd failed\n");
+        ExpectDuplicationFails(MachineWithConf(CONF_RAID), {{DUPLICATED_A, {.status = status}}});
     }
 }
 
 TEST(InitsysDuplicate, ThatIsMissingIsAFailedOne)
 {
     for (const TOOL_KIND kind : {TOOL_KIND::MISSING, TOOL_KIND::NOT_EXECUTABLE}) {
-        MACHINE machine = MachineWithConf(CONF_RAID);
-        BlankDiskWipe(machine, "sda");
-        machine.tools["/bin/nurodd"] = kind;
-        CommandsExpect(machine, ARRAYS_A);
-        RunEnds(machine, {"initsys-dd"}, 0, "system init with nurodd failed\n");
+        ExpectDuplicationFails(WithTool(MachineWithConf(CONF_RAID), "/bin/nurodd", kind), {});
     }
-}
-
-TEST(InitsysDuplicate, WithoutAShellIsAnotherMessage)
-{
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    BlankDiskWipe(machine, "sda");
-    machine.faults = {{.szFunction = "system", .nCall = 1, .error = EAGAIN}};
-    CommandsExpect(machine, ARRAYS_A);
-    RunEnds(machine, {"initsys-dd"}, 0, "can not fork to nurodd\n"); // one line only
-}
-
-TEST(InitsysDuplicate, RunsWithTwoEmptyListsWhenNoDiskIsThere)
-{
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    MachineTool(machine, "/bin/nurodd");
-    ShellWatch(machine);
-    const RUN_RESULT result = RunEnds(machine, {"initsys-dd"}, 1, "");
-    EXPECT_EQ(ShellText(), "/bin/nurodd   > /dev/null 2>&1\n");
-    EXPECT_EQ(LogText(result), NO_DISK);
-
-    BlankDiskWipe(machine, "sda");
-    machine.rows.back().answer.status = 1;
-    RunEnds(machine, {"initsys-dd"}, 1);
-    EXPECT_EQ(ShellText(), "/bin/nurodd   > /dev/null 2>&1\n");
 }
 
 } // namespace

@@ -180,7 +180,7 @@ TEST(Newvol, GivesEveryDiskTheNewestGap)
 TEST(Newvol, TakesTypeAndGapOfTheModel)
 {
     struct {
-        const char *szConf;
+        std::string szConf;
         DATA_PARTITION made;
     } const cases[] = {
         {CONF_NO_RAID, {.szType = "-t83"}},
@@ -212,7 +212,7 @@ TEST(Newvol, AnswersFurtherArgumentsWithTheUsage)
 
 TEST(Newvol, SaysThatThereIsNoDisk)
 {
-    for (const char *const szConf : {CONF_RAID, CONF_DUAL_HEAD}) {
+    for (const std::string &szConf : {CONF_RAID, CONF_DUAL_HEAD}) {
         MACHINE machine = MachineWithConf(szConf);
         MachineDiskAdd(machine, "sde"); // USB
         const RUN_RESULT result = RunEnds(machine, {"newvol"}, 1, NO_DISK);
@@ -221,13 +221,13 @@ TEST(Newvol, SaysThatThereIsNoDisk)
 }
 
 struct ENUM_CASE {
-    const char *szConf;
+    std::string szConf;
     const char *szDevices;
 };
 
 TEST(Newvol, FailsWhenTheDisksCannotBeEnumerated)
 {
-    constexpr ENUM_CASE CASES[] = {{CONF_RAID, "INTERNAL_DEVICE"},
+    const ENUM_CASE CASES[] = {{CONF_RAID, "INTERNAL_DEVICE"},
                                    {CONF_DUAL_HEAD, "EUNIT_DEVICE"}};
     for (const ENUM_CASE &row : CASES) {
         MACHINE machine = MachineWithConf(row.szConf);
@@ -301,7 +301,7 @@ STEP CreateFailed(const std::string &szDisk)
 // Blank disks of a model with, and of one without the key of the second head.
 MACHINE BlankDisks(const std::vector<std::string> &disks, const char *szMore = "")
 {
-    MACHINE machine = MachineWithConf(std::string(CONF_RAID) + szMore);
+    MACHINE machine = MachineWithConf(CONF_RAID + szMore);
     for (const std::string &szDisk : disks) {
         MachineDiskAdd(machine, szDisk);
     }
@@ -392,7 +392,7 @@ std::vector<std::string> UnitDisks(size_t nDisk)
 
 MACHINE MachineWithUnit(const std::string &szConf, size_t nDisk, size_t nTaken)
 {
-    MACHINE machine = MachineWithConf(std::string(CONF_DUAL_HEAD) + szConf);
+    MACHINE machine = MachineWithConf(CONF_DUAL_HEAD + szConf);
     MachineDiskAdd(machine, "sda"); // internal: left alone
     std::string szDevices;
     for (const std::string &szDisk : UnitDisks(nDisk)) {
@@ -425,12 +425,12 @@ std::string OverLimit(size_t nTaken)
 }
 
 struct LIMIT_CASE {
-    const char *szConf;
+    std::string szConf;
     size_t nDisk;
     size_t nTaken;
 };
 
-constexpr LIMIT_CASE LIMIT_CASES[] = {
+const LIMIT_CASE LIMIT_CASES[] = {
     {"", 12, 12},
     {"", 13, 12},
     {"", 15, 12},
@@ -474,7 +474,7 @@ TEST(NewvolDualHead, ReadsItsLimitOnEveryTurn)
 {
     MACHINE machine = MachineWithUnit("raidgroup_split_units=2\n", 4, 2);
     machine.rows[0].answer.writes = {
-        {"/etc.defaults/nuroinfo.conf", std::string(CONF_DUAL_HEAD) + "raidgroup_split_units=1\n"}};
+        {"/etc.defaults/nuroinfo.conf", CONF_DUAL_HEAD + "raidgroup_split_units=1\n"}};
     machine.rows.erase(machine.rows.begin() + 3, machine.rows.end());
     UnitArrayExpect(machine, 1);
     const RUN_RESULT result = RunEnds(machine, {"newvol"}, 0);
@@ -485,7 +485,7 @@ TEST(NewvolDualHead, AloneHasALimit)
 {
     for (const char *const szLimit : {"1", "0", "-1"}) {
         MACHINE machine = MachineWithDisks(
-            std::string(CONF_RAID) + "raidgroup_split_units=" + szLimit + "\n", FirstDisks(4));
+            CONF_RAID + "raidgroup_split_units=" + szLimit + "\n", FirstDisks(4));
         MachineTool(machine, "/sbin/mdadm -C /dev/md2 -amd -R -l5 -n4 /dev/sda3 /dev/sdb3 "
                              "/dev/sdc3 /dev/sdd3");
         const RUN_RESULT result = RunEnds(machine, {"newvol"}, 0);

@@ -2,7 +2,9 @@
 #include "nurostoragecore/partition_edit.h"
 
 #include "nurocore/error.h"
-#include "steps.h"
+#include "nurostoragecore/partition_enum.h"
+#include "nurostoragecore/partition_layout.h"
+#include "nurostoragecore/partition_version.h"
 #include "storage_machine.h"
 
 #include <cerrno>
@@ -19,80 +21,62 @@ constexpr u64 UNTOUCHED = 4711;
 constexpr u64 ALL_ONES = 0xFFFFFFFFFFFFFFFFULL;
 constexpr char ERROR_LOG[] = "/var/log/space_operation_error.log";
 
-// Each of these is run once and succeeds.
-MACHINE MachineOfCommands(const std::string &szConf, const std::vector<std::string> &commands)
+// With a call that has no code of its own.
+RUN_RESULT ExpectCreate(const MACHINE &machine, int kind, std::optional<u32> version, int result,
+                        const STEPS &steps)
 {
-    MACHINE machine = MachineWithConf(szConf);
-    for (const std::string &szCommand : commands) {
-        MachineTool(machine, szCommand);
-    }
-    return machine;
-}
-
-RUN_RESULT Create(const MACHINE &machine, const char *szDisk, int kind, std::optional<u32> version,
-                  int resultExpected)
-{
-    return MachineCall(machine, [=] {
-        const u32 wanted = version.value_or(0);
-        EXPECT_QUIET(PartitionCreate(szDisk, kind, version ? &wanted : nullptr),
-                     resultExpected); // it has no code of its own
-    });
+    return ExpectCall({.szName = "create",
+                       .machine = machine,
+                       .call =
+                           [=] {
+                               const u32 wanted = version.value_or(0);
+                               return PartitionCreate("/dev/sda", kind,
+                                                      version ? &wanted : nullptr);
+                           },
+                       .result = result,
+                       .steps = StepsOn("sda", steps)});
 }
 
 // ---- system and swap partitions ----------------------------------------------------------------
 
 struct SYSTEM_CASE {
-    const char *szConf;
+    std::string szConf;
     u32 version;
-    const char *szFirst;
-    const char *szSecond;
+    STEPS made;
 };
 
-constexpr SYSTEM_CASE SYSTEM_CASES[] = {
-    {CONF_RAID, 8, "-N1 -uS -q -f -j2048 -z4980480 -tfd", "-N2 -uS -q -f -j0 -z4194304 -tfd"},
-    {CONF_RAID, 0, "-N1 -uS -q -f -j2048 -z4980480 -tfd", "-N2 -uS -q -f -j0 -z4194304 -tfd"},
-    {CONF_RAID, 7, "-N1 -uS -q -f -j256 -z4980480 -tfd", "-N2 -uS -q -f -j0 -z4194304 -tfd"},
-    {CONF_RAID, 6, "-N1 -uS -q -f -j63 -z4980087 -tfd", "-N2 -uS -q -f -j0 -z4192965 -tfd"},
-    {CONF_RAID, 2, "-N1 -uS -q -f -j63 -z4980087 -tfd", "-N2 -uS -q -f -j0 -z1044225 -tfd"},
-    {CONF_RAID, 1, "-N1 -uS -q -f -j63 -z1574307 -tfd", "-N2 -uS -q -f -j0 -z787185 -tfd"},
-    {CONF_NO_RAID, 8, "-N1 -uS -q -f -j2048 -z4980480 -t83", "-N2 -uS -q -f -j0 -z4194304 -t82"},
-    {CONF_NO_RAID, 7, "-N1 -uS -q -f -j256 -z4980480 -t83", "-N2 -uS -q -f -j0 -z4194304 -t82"},
-    {CONF_NO_RAID, 6, "-N1 -uS -q -f -j63 -z4980087 -t83", "-N2 -uS -q -f -j0 -z4192965 -t82"},
-    {CONF_NO_RAID, 5, "-N1 -uS -q -f -j63 -z722862 -t83", "-N2 -uS -q -f -j0 -z594405 -t82"},
-    {CONF_NO_RAID, 3, "-N1 -uS -q -f -j63 -z530082 -t83", "-N2 -uS -q -f -j0 -z787185 -t82"},
-    {CONF_NO_RAID, 2, "-N1 -uS -q -f -j63 -z4980087 -t83", "-N2 -uS -q -f -j0 -z1044225 -t82"},
-    {CONF_NO_RAID, 1, "-N1 -uS -q -f -j63 -z273042 -t83", "-N2 -uS -q -f -j0 -z787185 -t82"},
+const SYSTEM_CASE SYSTEM_CASES[] = {
+    {CONF_RAID, 8, MADE_8},
+    {CONF_RAID, 0, MADE_8},
+    {CONF_RAID, 7, MADE_7},
+    {CONF_RAID, 6, MADE_6},
+    {CONF_RAID, 2, MADE_2},
+    {CONF_RAID, 1, MADE_1},
+    {CONF_NO_RAID, 8, MADE_8_NO_RAID},
+    {CONF_NO_RAID, 7, Made("-j256 -z4980480 -t83", "-j0 -z4194304 -t82")},
+    {CONF_NO_RAID, 6, Made("-j63 -z4980087 -t83", "-j0 -z4192965 -t82")},
+    {CONF_NO_RAID, 5, Made("-j63 -z722862 -t83", "-j0 -z594405 -t82")},
+    {CONF_NO_RAID, 3, MADE_3_NO_RAID},
+    {CONF_NO_RAID, 2, Made("-j63 -z4980087 -t83", "-j0 -z1044225 -t82")},
+    {CONF_NO_RAID, 1, Made("-j63 -z273042 -t83", "-j0 -z787185 -t82")},
     // The row says 83 for partition 2; the model decides.
-    {CONF_BUILDIN, 7, "-N1 -uS -q -f -j256 -z2097152 -t83", "-N2 -uS -q -f -j0 -z5105569 -t82"},
-    {CONF_BUILDIN, 8, "-N1 -uS -q -f -j256 -z2097152 -t83", "-N2 -uS -q -f -j0 -z5105569 -t82"},
-    {CONF_BUILDIN, 0, "-N1 -uS -q -f -j256 -z2097152 -t83", "-N2 -uS -q -f -j0 -z5105569 -t82"},
+    {CONF_BUILDIN, 7, MADE_BUILDIN},
+    {CONF_BUILDIN, 8, MADE_BUILDIN},
+    {CONF_BUILDIN, 0, MADE_BUILDIN},
 };
 
 TEST(PartitionCreateSystem, WritesASignatureAndTheTwoPartitionsOfTheVersion)
 {
     for (const SYSTEM_CASE &row : SYSTEM_CASES) {
-        SCOPED_TRACE(std::string(row.szConf) + std::to_string(row.version));
-        const std::vector<std::string> commands = {
-            "/sbin/sfdisk -M1 /dev/sdb",
-            std::string("/sbin/sfdisk ") + row.szFirst + " -F /dev/sdb",
-            std::string("/sbin/sfdisk ") + row.szSecond + " -F /dev/sdb",
-        };
-        const RUN_RESULT result =
-            Create(MachineOfCommands(row.szConf, commands), "/dev/sdb", 1, row.version, 0);
-        EXPECT_EQ(TranscriptText(result), Lines(commands));
-        EXPECT_EQ(LogText(result), "");
+        SCOPED_TRACE(row.szConf + std::to_string(row.version));
+        ExpectCreate(MachineWithConf(row.szConf), 1, row.version, 0, row.made);
         EXPECT_EQ(MachineFileRead(ERROR_LOG), std::nullopt);
     }
 }
 
 TEST(PartitionCreateSystem, GivesTheToolsNothingToReadOrToSay)
 {
-    const RUN_RESULT result =
-        Create(MachineOfCommands(CONF_RAID,
-                                 {"/sbin/sfdisk -M1 /dev/sdb",
-                                  "/sbin/sfdisk -N1 -uS -q -f -j2048 -z4980480 -tfd -F /dev/sdb",
-                                  "/sbin/sfdisk -N2 -uS -q -f -j0 -z4194304 -tfd -F /dev/sdb"}),
-               "/dev/sdb", 1, 8, 0);
+    const RUN_RESULT result = ExpectCreate(MachineWithConf(CONF_RAID), 1, 8, 0, MADE_8);
     for (const RUN_EVENT &event : result.events) {
         EXPECT_TRUE(event.fNullInput);
         EXPECT_TRUE(event.fNullOutput);
@@ -100,66 +84,43 @@ TEST(PartitionCreateSystem, GivesTheToolsNothingToReadOrToSay)
     }
 }
 
-long long CreateSystem8()
-{
-    const u32 version = 8;
-    return PartitionCreate("/dev/sdb", 1, &version);
-}
-
 TEST(PartitionCreateSystem, EndsWithTheCommandThatFails)
 {
-    const STEP signature = {"/sbin/sfdisk -M1 /dev/sdb"};
-    const STEP first = {"/sbin/sfdisk -N1 -uS -q -f -j2048 -z4980480 -tfd -F /dev/sdb"};
-    const STEP second = {"/sbin/sfdisk -N2 -uS -q -f -j0 -z4194304 -tfd -F /dev/sdb"};
     const STEP unsigned255 = {
-        "<11>partition_edit.cpp:# Failed to partition disk /dev/sdb, err=255"};
+        "<11>partition_edit.cpp:# Failed to partition disk /dev/sda, err=255"};
     const MACHINE machine = MachineWithConf(CONF_RAID);
-    ExpectCalls(
-        {{.szName = "no partitioner",
-          .machine = WithTool(machine, "/sbin/sfdisk", TOOL_KIND::MISSING),
-          .call = CreateSystem8,
-          .result = -1,
-          .steps = {{"<11>partition_edit.cpp:# Failed to add ms-dos signature to /dev/sdb, "
-                     "err=32512"},
-                    unsigned255}},
-         {.szName = "partition 1",
-          .machine = machine,
-          .call = CreateSystem8,
-          .result = -1,
-          .steps = {signature,
-                    {first.szText, {.status = 3}},
-                    {"<11>partition_edit.cpp:# Failed to partition disk /dev/sdb, err=768"}}},
-         {.szName = "partition 2",
-          .machine = machine,
-          .call = CreateSystem8,
-          .result = -1,
-          .steps = {signature,
-                    first,
-                    {second.szText, {.status = 1}},
-                    {"<11>partition_edit.cpp:# Failed to [/sbin/sfdisk -N2 -uS -q -f -j0 "
-                     "-z4194304 -tfd -F /dev/sdb], err=256"}}},
-         {.szName = "the signature",
-          .machine = machine,
-          .call = CreateSystem8,
-          .result = -1,
-          .steps = {{signature.szText, {.szErr = "no such disk\n", .status = 1}},
-                    {"<11>partition_edit.cpp:# Failed to add ms-dos signature to /dev/sdb, "
-                     "err=256"},
-                    unsigned255}}});
+    ExpectCreate(WithTool(machine, "/sbin/sfdisk", TOOL_KIND::MISSING), 1, 8, -1,
+                 {{"<11>partition_edit.cpp:# Failed to add ms-dos signature to /dev/sda, "
+                   "err=32512"},
+                  unsigned255});
+    ExpectCreate(machine, 1, 8, -1,
+                 {MADE_8[0],
+                  {MADE_8[1].szText, {.status = 3}},
+                  {"<11>partition_edit.cpp:# Failed to partition disk /dev/sda, err=768"}});
+    ExpectCreate(machine, 1, 8, -1,
+                 {MADE_8[0],
+                  MADE_8[1],
+                  {MADE_8[2].szText, {.status = 1}},
+                  {"<11>partition_edit.cpp:# Failed to [/sbin/sfdisk -N2 -uS -q -f -j0 "
+                   "-z4194304 -tfd -F /dev/sda], err=256"}});
+    ExpectCreate(machine, 1, 8, -1,
+                 {{MADE_8[0].szText, {.szErr = "no such disk\n", .status = 1}},
+                  {"<11>partition_edit.cpp:# Failed to add ms-dos signature to /dev/sda, err=256"},
+                  unsigned255});
     EXPECT_EQ(MachineFileRead(ERROR_LOG),
-              "Nov 05 01:02:03 command=\"/sbin/sfdisk -M1 /dev/sdb\" Error=\"no such disk \"\n");
+              "Nov 05 01:02:03 command=\"/sbin/sfdisk -M1 /dev/sda\" Error=\"no such disk \"\n");
 }
 
 // ---- the data partition ------------------------------------------------------------------------
 
 struct DATA_CASE {
-    const char *szConf;
+    std::string szConf;
     u32 version;
     const char *szGap;
     const char *szType;
 };
 
-constexpr DATA_CASE DATA_CASES[] = {
+const DATA_CASE DATA_CASES[] = {
     {CONF_RAID, 8, "-j260352", "-tfd"},    {CONF_RAID, 0, "-j260352", "-tfd"},
     {CONF_RAID, 7, "-j262144", "-tfd"},    {CONF_RAID, 6, "-j257040", "-tfd"},
     {CONF_RAID, 2, "-j257040", "-tfd"},    {CONF_RAID, 1, "-j273105", "-tfd"},
@@ -168,47 +129,31 @@ constexpr DATA_CASE DATA_CASES[] = {
     {CONF_BUILDIN, 8, "-j524288", "-t83"},
 };
 
-std::vector<std::string> DataCommand(const char *szGap, const char *szType, const char *szDisk)
+STEP Data(const std::string &szGap, const std::string &szType, const TOOL_ANSWER &answer = {})
 {
-    return {"/sbin/sfdisk", "-N3", "", "-uS", "-q", "-f", szGap, "-z-1", szType, "-F", szDisk};
+    return {"/sbin/sfdisk -N3 \"\" -uS -q -f " + szGap + " -z-1 " + szType + " -F /dev/@", answer};
 }
 
 TEST(PartitionCreateData, TakesTheRestOfTheDiskBehindTheGap)
 {
     for (const DATA_CASE &row : DATA_CASES) {
         for (const int kind : {2, 3}) { // with both bits the data partition alone
-            SCOPED_TRACE(std::string(row.szConf) + std::to_string(row.version));
-            MACHINE machine = MachineWithConf(row.szConf);
-            MachineTool(machine, DataCommand(row.szGap, row.szType, "/dev/sda"));
-            const RUN_RESULT result = Create(machine, "/dev/sda", kind, row.version, 0);
-            EXPECT_EQ(TranscriptText(result), std::string("/sbin/sfdisk -N3 \"\" -uS -q -f ") +
-                                                  row.szGap + " -z-1 " + row.szType +
-                                                  " -F /dev/sda\n");
-            EXPECT_EQ(LogText(result), "");
+            SCOPED_TRACE(row.szConf + std::to_string(row.version));
+            ExpectCreate(MachineWithConf(row.szConf), kind, row.version, 0,
+                         {Data(row.szGap, row.szType)});
         }
     }
 }
 
 TEST(PartitionCreateData, TellsTheCommandThatFails)
 {
-    const std::string szCommand = "/sbin/sfdisk -N3 \"\" -uS -q -f -j260352 -z-1 -tfd -F /dev/sda";
     const std::string szTold = "<11>partition_edit.cpp:# Failed to [/sbin/sfdisk -N3  -uS -q -f "
                                "-j260352 -z-1 -tfd -F /dev/sda], err=";
-    const auto call = [] {
-        const u32 version = 8;
-        return PartitionCreate("/dev/sda", 2, &version);
-    };
-    ExpectCalls(
-        {{.szName = "killed",
-          .machine = MachineWithConf(CONF_RAID),
-          .call = call,
-          .result = -1,
-          .steps = {{szCommand, {.signal = 9}}, {szTold + "9"}}},
-         {.szName = "refused",
-          .machine = MachineWithConf(CONF_RAID),
-          .call = call,
-          .result = -1,
-          .steps = {{szCommand, {.szErr = "does not fit\n", .status = 1}}, {szTold + "256"}}}});
+    const MACHINE machine = MachineWithConf(CONF_RAID);
+    ExpectCreate(machine, 2, 8, -1, {Data("-j260352", "-tfd", {.signal = 9}), {szTold + "9"}});
+    ExpectCreate(
+        machine, 2, 8, -1,
+        {Data("-j260352", "-tfd", {.szErr = "does not fit\n", .status = 1}), {szTold + "256"}});
     EXPECT_EQ(MachineFileRead(ERROR_LOG),
               "Nov 05 01:02:03 command=\"/sbin/sfdisk -N3  -uS -q -f -j260352 -z-1 -tfd -F "
               "/dev/sda\" Error=\"does not fit \"\n");
@@ -219,52 +164,36 @@ TEST(PartitionCreateData, TellsTheCommandThatFails)
 // Of a disk that has none, or fits no row, the machine's.
 TEST(PartitionCreateVersion, IsThatOfTheDiskUnlessGiven)
 {
-    MACHINE six = MachineWithConf(CONF_RAID);
-    PartitionedDiskAdd(six, "sdb", PLACES_6);
-    SystemArrayAdd(six, {{"sdb1"}});
-    const struct {
-        const char *szName;
-        MACHINE machine;
-        const DISK_PLACES *pPlaces;
-        const char *szGap;
-        const char *szLog = "";
-    } cases[] = {
-        {"7", MachineWithConf(CONF_RAID), &PLACES_7, "-j262144"},
-        {"8", MachineWithConf(CONF_RAID), &PLACES_8, "-j260352"},
-        {"no row", six, &PLACES_FOREIGN, "-j257040"},
-        {"blank", six, nullptr, "-j257040",
-         "<15>partition_layout.cpp:# /dev/sda: dont contain partition [1]\n"},
-    };
-    for (const auto &row : cases) {
-        SCOPED_TRACE(row.szName);
-        MACHINE machine = row.machine;
-        if (row.pPlaces != nullptr) {
-            PartitionedDiskAdd(machine, "sda", *row.pPlaces);
-        }
-        MachineTool(machine, DataCommand(row.szGap, "-tfd", "/dev/sda"));
-        EXPECT_EQ(LogText(Create(machine, "/dev/sda", 2, std::nullopt, 0)), row.szLog);
-    }
+    const MACHINE six = With(MachineOfDisks({{"sdb", PLACES_6}}),
+                             [](MACHINE &machine) { SystemArrayAdd(machine, {{"sdb1"}}); });
+    MACHINE foreign = six;
+    PartitionedDiskAdd(foreign, "sda", PLACES_FOREIGN);
+    ExpectCreate(MachineOfDisks({{"sda", PLACES_7}}), 2, {}, 0, {Data("-j262144", "-tfd")});
+    ExpectCreate(MachineOfDisks({{"sda", PLACES_8}}), 2, {}, 0, {Data("-j260352", "-tfd")});
+    ExpectCreate(foreign, 2, {}, 0, {Data("-j257040", "-tfd")});
+    ExpectCreate(six, 2, {}, 0,
+                 {{"<15>partition_layout.cpp:# /dev/sda: dont contain partition [1]"},
+                  Data("-j257040", "-tfd")});
 }
 
 TEST(PartitionCreateVersion, ThatCannotBeFoundEndsIt)
 {
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    MachineDiskAdd(machine, "sda");
-    machine.faults = {{.szFunction = "glob", .nCall = 1, .error = EIO}};
-    const RUN_RESULT result = Create(machine, "/dev/sda", 2, std::nullopt, -1);
-    EXPECT_EQ(LogErrors(result), "<11>partition_edit.cpp:# Failed to get partition version\n");
-    EXPECT_EQ(TranscriptText(result), "fault glob 1\n");
+    ExpectCreate(WithFault(MachineOfDisks({{"sda", BLANK}}), {.szFunction = "glob", .error = EIO}),
+                 2, {}, -1,
+                 {{"<15>partition_layout.cpp:# /dev/sda: dont contain partition [1]"},
+                  {"fault glob 1"},
+                  {"<11>partition_edit.cpp:# Failed to get partition version"}});
 }
 
 struct ROWLESS_CASE {
-    const char *szConf;
+    std::string szConf;
     u32 version;
     const char *szVersion;
 };
 
 TEST(PartitionCreateVersion, WithoutARowEndsIt)
 {
-    constexpr ROWLESS_CASE CASES[] = {
+    const ROWLESS_CASE CASES[] = {
         {CONF_RAID, 4, "4"},
         {CONF_RAID, 3, "3"},
         {CONF_RAID, 5, "5"},
@@ -277,14 +206,11 @@ TEST(PartitionCreateVersion, WithoutARowEndsIt)
     };
     for (const ROWLESS_CASE &row : CASES) {
         for (const int kind : {0, 1, 2, 3}) {
-            SCOPED_TRACE(std::string(row.szConf) + std::to_string(row.version));
-            const RUN_RESULT result =
-                Create(MachineWithConf(row.szConf), "/dev/sda", kind, row.version, -1);
-            EXPECT_EQ(LogText(result),
-                      std::string("<11>partition_edit.cpp:# Failed to get partition layout: "
-                                  "version=") +
-                          row.szVersion + "\n");
-            EXPECT_EQ(TranscriptText(result), "");
+            SCOPED_TRACE(row.szConf + std::to_string(row.version));
+            ExpectCreate(MachineWithConf(row.szConf), kind, row.version, -1,
+                         {{std::string("<11>partition_edit.cpp:# Failed to get partition layout: "
+                                       "version=") +
+                           row.szVersion}});
         }
     }
 }
@@ -292,9 +218,8 @@ TEST(PartitionCreateVersion, WithoutARowEndsIt)
 TEST(PartitionCreateKind, WithNeitherBitIsFoundOutAtTheEnd)
 {
     for (const int kind : {0, 4, 128}) {
-        const RUN_RESULT result = Create(MachineWithConf(CONF_RAID), "/dev/sda", kind, 8, -1);
-        EXPECT_EQ(LogText(result), "<11>partition_edit.cpp:# Failed to [], err=-1\n");
-        EXPECT_EQ(TranscriptText(result), "");
+        ExpectCreate(MachineWithConf(CONF_RAID), kind, 8, -1,
+                     {{"<11>partition_edit.cpp:# Failed to [], err=-1"}});
     }
 }
 
@@ -377,20 +302,85 @@ TEST(PartitionZero, WipesThePartitionsSuperblock)
                             {"<11>disk_name.cpp:# fail to get device partition name"}}}});
 }
 
-TEST(PartitionEdit, BadArgumentsAreTold)
+// ---- bad arguments to all modules of partitions ------------------------------------------------
+
+u64 sectorsOut = 0;
+u32 typeOut = 0;
+u32 versionIn = 8;
+PNLIBSZLIST pNone = nullptr;
+constexpr char EDIT_REFUSES[] = "<11>partition_edit.cpp:# Bad parameters";
+constexpr char ENUM_REFUSES[] = "<11>partition_enum.cpp:# bad parameters";
+constexpr char NO_NAME[] = "<11>disk_name.cpp:# out put szPartitionPath can not be NULL and "
+                           "path length can't be zero";
+
+struct BAD_CASE {
+    const char *szName;
+    long long (*pCall)();
+    u32 code = OLD_CODE;
+    const char *szLog = nullptr;
+};
+
+constexpr BAD_CASE BAD_CASES[] = {
+    {"create, no disk", [] { return 0LL + PartitionCreate(nullptr, 1, &versionIn); }, OLD_CODE,
+     EDIT_REFUSES},
+    {"clean, no disk", [] { return 0LL + PartitionClean(nullptr, 3); }, OLD_CODE, EDIT_REFUSES},
+    {"signature, no disk", [] { return 0LL + PartitionTableAdd(nullptr); }, OLD_CODE, EDIT_REFUSES},
+    {"wipe, no disk", [] { return 0LL + PartitionZeroSuperblock(nullptr, 1); }, OLD_CODE,
+     EDIT_REFUSES},
+    {"wipe, 0", [] { return 0LL + PartitionZeroSuperblock("/dev/sda", 0); }, OLD_CODE,
+     EDIT_REFUSES},
+    {"wipe, -1", [] { return 0LL + PartitionZeroSuperblock("/dev/sda", -1); }, OLD_CODE,
+     EDIT_REFUSES},
+    {"geometry, 0",
+     [] { return 0LL + PartitionGeometryGet(0, "/dev/sdb", &sectorsOut, &typeOut); }},
+    {"geometry, -1",
+     [] { return 0LL + PartitionGeometryGet(-1, "/dev/sdb", &sectorsOut, &typeOut); }},
+    {"geometry, the lowest",
+     [] { return 0LL + PartitionGeometryGet(INT_MIN, "/dev/sdb", &sectorsOut, &typeOut); }},
+    {"geometry, no disk",
+     [] { return 0LL + PartitionGeometryGet(5, nullptr, &sectorsOut, &typeOut); }},
+    {"geometry, no start",
+     [] { return 0LL + PartitionGeometryGet(5, "/dev/sdb", nullptr, &typeOut); }},
+    {"geometry, no typeOut",
+     [] { return 0LL + PartitionGeometryGet(5, "/dev/sdb", &sectorsOut, nullptr); }},
+    {"place, no disk",
+     [] { return 0LL + PartitionStartSizeGet(nullptr, 1, &sectorsOut, &sectorsOut); },
+     ERR_BAD_PARAMETER},
+    {"place, no start", [] { return 0LL + PartitionStartSizeGet("sda", 1, nullptr, &sectorsOut); },
+     ERR_BAD_PARAMETER},
+    {"place, no size", [] { return 0LL + PartitionStartSizeGet("sda", 1, &sectorsOut, nullptr); },
+     ERR_BAD_PARAMETER},
+    {"place, 0", [] { return 0LL + PartitionStartSizeGet("sda", 0, &sectorsOut, &sectorsOut); },
+     OLD_CODE, NO_NAME},
+    {"place, -1", [] { return 0LL + PartitionStartSizeGet("sda", -1, &sectorsOut, &sectorsOut); },
+     OLD_CODE, NO_NAME},
+    {"place, the boot device",
+     [] { return 0LL + PartitionStartSizeGet("/dev/nuroboot", 1, &sectorsOut, &sectorsOut); },
+     OLD_CODE, "<11>disk_name.cpp:# we don't generate nuroboot partition name here"},
+    {"version, nowhere to", [] { return 0LL + PartitionLayoutGetMax(nullptr, 0); }},
+    {"biggest version, nowhere to", [] { return 0LL + PartitionLayoutGetMax(nullptr, 1); }},
+    {"first version, nowhere to", [] { return 0LL + PartitionLayoutGet(nullptr); }},
+    {"enumeration, no place", [] { return 0LL + PartitionPathEnum(nullptr, nullptr); }, OLD_CODE,
+     ENUM_REFUSES},
+    {"enumeration, no list", [] { return 0LL + PartitionPathEnum(nullptr, &pNone); }, OLD_CODE,
+     ENUM_REFUSES},
+};
+
+// And nothing is stored.
+TEST(Partition, BadArgumentsAreTold)
 {
-    const STEPS told = {{"<11>partition_edit.cpp:# Bad parameters"}};
-    const u32 version = 8;
-    const std::function<long long()> calls[] = {
-        [&version] { return PartitionCreate(nullptr, 1, &version); },
-        [] { return PartitionClean(nullptr, 3); },
-        [] { return PartitionTableAdd(nullptr); },
-        [] { return PartitionZeroSuperblock(nullptr, 1); },
-        [] { return PartitionZeroSuperblock("/dev/sda", 0); },
-        [] { return PartitionZeroSuperblock("/dev/sda", -1); }};
-    for (size_t i = 0; i < std::size(calls); i++) {
-        SCOPED_TRACE(i);
-        ExpectCalls({{.szName = "refused", .call = calls[i], .result = -1, .steps = told}});
+    for (const BAD_CASE &row : BAD_CASES) {
+        ExpectCall({.szName = row.szName,
+                    .call =
+                        [&row] {
+                            const long long result = row.pCall();
+                            EXPECT_EQ(sectorsOut, 0U);
+                            EXPECT_EQ(typeOut, 0U);
+                            return result;
+                        },
+                    .result = -1,
+                    .code = row.code,
+                    .steps = row.szLog == nullptr ? STEPS{} : STEPS{{row.szLog}}});
     }
 }
 
@@ -421,19 +411,31 @@ constexpr LISTED_CASE LISTED_CASES[] = {
     {"/dev/sda1 none x y zz\n", 0, 0, 0},
 };
 
+MACHINE MachineOfListing(const std::string &szOut, const std::string &szDisk = "sda")
+{
+    MACHINE machine = MachineMake();
+    MachineTool(machine, ListingCommand(szDisk, 1), {.szOut = szOut, .szErr = "none\n"});
+    return machine;
+}
+
+// Of partition 1. Where it is absent, nothing is stored.
+void ExpectGeometry(const MACHINE &machine, i64 sectors, u64 start = UNTOUCHED,
+                    u32 type = UNTOUCHED, const std::string &szDisk = "/dev/sda")
+{
+    QuietCall(machine, [&] {
+        u64 startRead = UNTOUCHED;
+        u32 typeRead = UNTOUCHED;
+        EXPECT_EQ(PartitionGeometryGet(1, szDisk.c_str(), &startRead, &typeRead), sectors);
+        EXPECT_EQ(startRead, start);
+        EXPECT_EQ(typeRead, type);
+    });
+}
+
 TEST(PartitionGeometry, ReadsTheFieldsOfTheFirstLine)
 {
     for (const LISTED_CASE &row : LISTED_CASES) {
         SCOPED_TRACE(row.szLine);
-        MACHINE machine = MachineMake();
-        MachineTool(machine, "/sbin/sfdisk -l -uS -N1 /dev/sda", {.szOut = row.szLine});
-        QuietCall(machine, [&row] {
-            u64 start = UNTOUCHED;
-            u32 type = UNTOUCHED;
-            EXPECT_EQ(PartitionGeometryGet(1, "/dev/sda", &start, &type), row.sectors);
-            EXPECT_EQ(start, row.start);
-            EXPECT_EQ(type, row.type);
-        });
+        ExpectGeometry(MachineOfListing(row.szLine), row.sectors, row.start, row.type);
     }
 }
 
@@ -443,83 +445,53 @@ TEST(PartitionGeometry, StoresNothingForAnAbsentPartition)
     for (const char *const szLine :
          {"", "/dev/sda1", "/dev/sda1 2048 4982527 4980480", "/dev/sda1 2048 4982527\t4980480 "}) {
         SCOPED_TRACE(szLine);
-        MACHINE machine = MachineMake();
-        MachineTool(machine, "/sbin/sfdisk -l -uS -N1 /dev/sda",
-                    {.szOut = szLine, .szErr = "none\n", .status = 1});
-        QuietCall(machine, [] {
-            u64 start = UNTOUCHED;
-            u32 type = UNTOUCHED;
-            EXPECT_EQ(PartitionGeometryGet(1, "/dev/sda", &start, &type), -1);
-            EXPECT_EQ(start, UNTOUCHED);
-            EXPECT_EQ(type, UNTOUCHED);
-        });
+        MACHINE machine = MachineOfListing(szLine);
+        machine.rows[0].answer.status = 1;
+        ExpectGeometry(machine, -1);
         EXPECT_EQ(MachineFileRead(ERROR_LOG), std::nullopt);
     }
 }
 
 TEST(PartitionGeometry, AsksForTheDiskByItsPath)
 {
-    MACHINE machine = MachineMake();
-    MachineTool(machine, "/sbin/sfdisk -l -uS -N5 /dev/sdb",
-                {.szOut = "/dev/sdb5 1 2 3 4\n", .nTimes = 2});
-    const RUN_RESULT result = QuietCall(machine, [] {
-        u64 start = 0;
-        u32 type = 0;
-        EXPECT_EQ(PartitionGeometryGet(5, "sdb", &start, &type), 3);
-        EXPECT_EQ(PartitionGeometryGet(5, "/dev/sdb", &start, &type), 3);
-        EXPECT_EQ(PartitionGeometryGet(0, "/dev/sdb", &start, &type), -1);
-        EXPECT_EQ(PartitionGeometryGet(-1, "/dev/sdb", &start, &type), -1);
-        EXPECT_EQ(PartitionGeometryGet(INT_MIN, "/dev/sdb", &start, &type), -1);
-        EXPECT_EQ(PartitionGeometryGet(5, nullptr, &start, &type), -1);
-        EXPECT_EQ(PartitionGeometryGet(5, "/dev/sdb", nullptr, &type), -1);
-        EXPECT_EQ(PartitionGeometryGet(5, "/dev/sdb", &start, nullptr), -1);
-    });
-    ASSERT_EQ(result.events.size(), 2U);
-    EXPECT_TRUE(result.events[0].fNullInput);
-    EXPECT_TRUE(result.events[0].fNullError);
+    for (const char *const szDisk : {"sdb", "/dev/sdb"}) {
+        const RUN_RESULT result = ExpectCall(
+            {.szName = szDisk,
+             .call =
+                 [szDisk] {
+                     u64 start = 0;
+                     u32 type = 0;
+                     return PartitionGeometryGet(5, szDisk, &start, &type);
+                 },
+             .result = 3,
+             .steps = {{"/sbin/sfdisk -l -uS -N5 /dev/sdb", {.szOut = "/dev/sdb5 1 2 3 4\n"}}}});
+        ASSERT_EQ(result.events.size(), 1U);
+        EXPECT_TRUE(result.events[0].fNullInput);
+        EXPECT_TRUE(result.events[0].fNullError);
+    }
 }
 
 // "/dev/" and 58 characters of a name.
 TEST(PartitionGeometry, CutsThePathToSixtyThreeCharacters)
 {
     const std::string szDisk(58, 'x');
-    MACHINE machine = MachineMake();
-    MachineTool(machine, "/sbin/sfdisk -l -uS -N1 /dev/" + szDisk,
-                {.szOut = "/dev/x1 1 2 3 4\n", .nTimes = 3});
-    MachineCall(machine, [&szDisk] {
-        for (const std::string &szName : {szDisk, szDisk + "y", "/dev/" + szDisk + "yz"}) {
-            u64 start = 0;
-            u32 type = 0;
-            EXPECT_EQ(PartitionGeometryGet(1, szName.c_str(), &start, &type), 3) << szName;
-        }
-    });
+    for (const std::string &szName : {szDisk, szDisk + "y", "/dev/" + szDisk + "yz"}) {
+        ExpectGeometry(MachineOfListing("/dev/x1 1 2 3 4\n", szDisk), 3, 1, 4, szName);
+    }
 }
 
 TEST(PartitionGeometry, TakesAPartitionerThatCannotBeRunForNone)
 {
     for (const TOOL_KIND kind :
          {TOOL_KIND::MISSING, TOOL_KIND::FOLDER, TOOL_KIND::NOT_EXECUTABLE}) {
-        MACHINE machine = MachineMake();
-        machine.tools["/sbin/sfdisk"] = kind;
-        QuietCall(machine, [] {
-            u64 start = UNTOUCHED;
-            u32 type = UNTOUCHED;
-            EXPECT_EQ(PartitionGeometryGet(1, "/dev/sda", &start, &type), -1);
-            EXPECT_EQ(start, UNTOUCHED);
-        });
+        ExpectGeometry(WithTool(MachineMake(), "/sbin/sfdisk", kind), -1);
     }
-
     for (const char *const szFunction : {"fork", "pipe2", "fdopen"}) {
-        MACHINE machine = MachineMake();
-        MachineTool(machine, "/sbin/sfdisk -l -uS -N1 /dev/sda", {.nTimes = ANY_TIMES});
-        machine.faults = {{.szFunction = szFunction, .error = EMFILE}};
+        MACHINE machine =
+            WithFault(MachineOfListing(""), {.szFunction = szFunction, .error = EMFILE});
+        machine.rows[0].answer.nTimes = ANY_TIMES;
         machine.fMayLeaveChildren = true; // one whose stream could not be had is not waited for
-        MachineCall(machine, [] {
-            u64 start = UNTOUCHED;
-            u32 type = UNTOUCHED;
-            EXPECT_EQ(PartitionGeometryGet(1, "/dev/sda", &start, &type), -1);
-            EXPECT_EQ(start, UNTOUCHED);
-        });
+        ExpectGeometry(machine, -1);
     }
 }
 
@@ -528,35 +500,14 @@ TEST(PartitionGeometry, ReadsNoFurtherThan256Bytes)
 {
     const std::string szFields = "/dev/sda1 1 2 3";
     const std::string szBlanks(256 - szFields.size() - 2, ' ');
-    struct {
-        std::string szLine;
-        u32 type;
-    } const cases[] = {{szFields + szBlanks + "83 Linux\n", 0x83},
-                       {szFields + szBlanks + " 83 Linux\n", 0x8}};
-    for (const auto &row : cases) {
-        MACHINE machine = MachineMake();
-        MachineTool(machine, "/sbin/sfdisk -l -uS -N1 /dev/sda", {.szOut = row.szLine});
-        MachineCall(machine, [&row] {
-            u64 start = 0;
-            u32 type = 0;
-            EXPECT_EQ(PartitionGeometryGet(1, "/dev/sda", &start, &type), 3);
-            EXPECT_EQ(type, row.type);
-        });
-    }
+    ExpectGeometry(MachineOfListing(szFields + szBlanks + "83 Linux\n"), 3, 1, 0x83);
+    ExpectGeometry(MachineOfListing(szFields + szBlanks + " 83 Linux\n"), 3, 1, 0x8);
 }
 
 // However much more is said, and in one line.
 TEST(PartitionGeometry, ReadsTheBeginningOfALongLine)
 {
-    MACHINE machine = MachineMake();
-    MachineTool(machine, "/sbin/sfdisk -l -uS -N1 /dev/sda",
-                {.szOut = "/dev/sda1 1 2 3 83 " + std::string(100000, 'x')});
-    MachineCall(machine, [] {
-        u64 start = 0;
-        u32 type = 0;
-        EXPECT_EQ(PartitionGeometryGet(1, "/dev/sda", &start, &type), 3);
-        EXPECT_EQ(type, 0x83U);
-    });
+    ExpectGeometry(MachineOfListing("/dev/sda1 1 2 3 83 " + std::string(100000, 'x')), 3, 1, 0x83);
 }
 
 } // namespace

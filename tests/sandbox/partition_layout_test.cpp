@@ -119,7 +119,7 @@ TEST(PartitionLayoutIndex, IsTheFirstRowThatFits)
         {0, 6, 11}, {1, 0, 7},  {2, 1, 8},  {3, 2, -1},  {4, -1, -1},          {5, 3, -1},
         {6, 4, 9},  {7, 5, 10}, {8, 6, 11}, {9, -1, -1}, {0xFFFFFFFF, -1, -1},
     };
-    for (const char *const szConf : {CONF_RAID, CONF_NO_RAID, ""}) {
+    for (const std::string &szConf : {CONF_RAID, CONF_NO_RAID, std::string()}) {
         MachineCall(MachineWithConf(szConf), [&CASES] {
             for (const INDEX_CASE &row : CASES) {
                 EXPECT_EQ(PartitionLayoutIndexGet(row.version, 0), row.rowWithout) << row.version;

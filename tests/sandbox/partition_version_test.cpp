@@ -333,7 +333,7 @@ TEST(PartitionVersion, StopsAtTheFirstDiskUnlessTheBiggestIsWanted)
 
 TEST(PartitionVersion, OfADualHeadMachineIsThatOfItsExpansionUnits)
 {
-    MACHINE machine = MachineWithConf(std::string(CONF_NO_RAID) + "support_dual_head=yes\n");
+    MACHINE machine = MachineWithConf(CONF_NO_RAID + "support_dual_head=yes\n");
     PartitionedDiskAdd(machine, "sda", PLACES_8);
     PartitionedDiskAdd(machine, "sdga", PLACES_6);
     PartitionedDiskAdd(machine, "sdgb", PLACES_7);

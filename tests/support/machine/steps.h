@@ -20,6 +20,7 @@
 
 #include <functional>
 #include <gtest/gtest.h>
+#include <ostream>
 #include <string>
 #include <vector>
 
@@ -65,14 +66,28 @@ inline void StepsExpect(MACHINE &machine, const STEPS &steps)
     }
 }
 
-inline void ExpectSteps(const RUN_RESULT &result, const STEPS &steps)
+inline std::string StepsText(const STEPS &steps)
 {
     std::string szText;
     for (const STEP &step : steps) {
         szText += step.szText + "\n";
     }
-    EXPECT_EQ(OrderText(result), szText);
+    return szText;
 }
+
+inline void ExpectSteps(const RUN_RESULT &result, const STEPS &steps)
+{
+    EXPECT_EQ(OrderText(result), StepsText(steps));
+}
+
+// Names the tests of a table after its rows: the last argument of INSTANTIATE_TEST_SUITE_P.
+struct ROW_NAME {
+    template <typename ROW>
+    std::string operator()(const testing::TestParamInfo<ROW> &row) const
+    {
+        return row.param.szName;
+    }
+};
 
 // One call of a library on a machine of its own: what it returns, the code that it leaves in the
 // last-error record (OLD_CODE: it does not change the record), what it does.
@@ -84,6 +99,11 @@ struct CALL_CASE {
     u32 code = OLD_CODE;
     STEPS steps = {};
 };
+
+inline void PrintTo(const CALL_CASE &row, std::ostream *pStream)
+{
+    *pStream << row.szName;
+}
 
 inline RUN_RESULT ExpectCall(const CALL_CASE &row)
 {
@@ -115,6 +135,11 @@ struct RUN_CASE {
     int status = 0;
     STEPS steps = {};
 };
+
+inline void PrintTo(const RUN_CASE &row, std::ostream *pStream)
+{
+    *pStream << row.szName;
+}
 
 inline RUN_RESULT ExpectRun(const RUN_CASE &row)
 {
