@@ -1,17 +1,18 @@
 // SPDX-License-Identifier: MIT
 #include "hwcontrol/disk_port.h"
 
-#include "last_error.h"
 #include "nurocore/conf.h"
 #include "nurocore/error.h"
 #include "nurocore/types.h"
-#include "sandbox.h"
+#include "steps.h"
 
 #include <array>
 #include <cerrno>
 #include <cstring>
 #include <fstream>
 #include <gtest/gtest.h>
+#include <ostream>
+#include <sstream>
 #include <string>
 #include <unistd.h>
 #include <vector>
@@ -19,15 +20,15 @@
 namespace
 {
 
-constexpr char USB_MISSING[] =
-    "<11>disk_port.cpp:# Get usbportcfg key from /etc.defaults/nuroinfo.conf Error\n";
-constexpr char TOO_LONG[] = "<11>disk_name.cpp:# buffer size of szDiskPath should be longer than "
-                            "string length of szPartPath\n";
+const STEPS USB_MISSING = {
+    {"<11>disk_port.cpp:# Get usbportcfg key from /etc.defaults/nuroinfo.conf Error"}};
+const STEPS TOO_LONG = {{"<11>disk_name.cpp:# buffer size of szDiskPath should be longer than "
+                         "string length of szPartPath"}};
 
-std::string NoMatch(const std::string &name)
+STEPS NoMatch(const std::string &name)
 {
-    return "<15>disk_port.cpp:# expected sdx or /dev/sdx, not " + name +
-           ", not match any port type\n";
+    return {{"<15>disk_port.cpp:# expected sdx or /dev/sdx, not " + name +
+             ", not match any port type"}};
 }
 
 std::string Letters(size_t n)
@@ -58,249 +59,178 @@ int DescriptorNext()
     return fd;
 }
 
-struct NAMED_TYPE {
-    const char *szPath;
-    int type;
+struct TYPED {
+    DISK_PORT_TYPE type;
+    std::vector<std::string> paths;
 };
 
 struct PORT_CASE {
     const char *szTitle;
     std::string conf;
-    std::vector<NAMED_TYPE> disks;
+    std::vector<TYPED> disks;
 };
+
+// The paths are of these types, and this is logged about them.
+void ExpectTypes(const MACHINE &machine, const std::vector<TYPED> &disks, const STEPS &steps = {})
+{
+    const RUN_RESULT result = MachineCall(machine, [&disks] {
+        for (const TYPED &disk : disks) {
+            for (const std::string &path : disk.paths) {
+                EXPECT_EQ(ExternalDiskPortCheck(path.c_str()), disk.type) << path;
+            }
+        }
+    });
+    ExpectSteps(result, steps);
+}
 
 // No machine of this table has an expansion unit.
 const PORT_CASE PORT_CASES[] = {
     {"internal and USB",
      "internalportcfg=0xf\nusbportcfg=0x30\n",
-     {{"sda", INTERNAL_DEVICE},
-      {"sdb", INTERNAL_DEVICE},
-      {"sdc", INTERNAL_DEVICE},
-      {"sdd", INTERNAL_DEVICE},
-      {"sde", USB_DEVICE},
-      {"sdf", USB_DEVICE},
-      {"sdg", OTHER_DEVICE},
-      {"sdz", OTHER_DEVICE},
-      {"sdaa", OTHER_DEVICE}}},
+     {{INTERNAL_DEVICE, {"sda", "sdb", "sdc", "sdd"}},
+      {USB_DEVICE, {"sde", "sdf"}},
+      {OTHER_DEVICE, {"sdg", "sdz", "sdaa"}}}},
     {"with and without /dev, whole disks and partitions",
      "internalportcfg=0x1\nusbportcfg=0x2\n",
-     {{"/dev/sda", INTERNAL_DEVICE},
-      {"/dev/sda3", INTERNAL_DEVICE},
-      {"sda12", INTERNAL_DEVICE},
-      {"sda0", INTERNAL_DEVICE},
-      {"/dev/sdb1", USB_DEVICE},
-      {"x/dev/sda", INTERNAL_DEVICE},
-      {"/devices/sda", INTERNAL_DEVICE},
-      {"sda1p1", INTERNAL_DEVICE}}},
+     {{INTERNAL_DEVICE,
+       {"/dev/sda", "/dev/sda3", "sda12", "sda0", "x/dev/sda", "/devices/sda", "sda1p1"}},
+      {USB_DEVICE, {"/dev/sdb1"}}}},
     {"names of other kinds",
      "internalportcfg=0xf\nusbportcfg=0x30\n",
-     {{"isda", ISD_DEVICE},
-      {"/dev/isdb2", ISD_DEVICE},
-      {"isd", ISD_DEVICE},
-      {"nuroboot", BOOT_DEVICE},
-      {"/dev/nuroboot1", BOOT_DEVICE},
-      {"nurobootx", BOOT_DEVICE},
-      {"mmcblk0", MMC_DEVICE},
-      {"/dev/mmcblk0p1", MMC_DEVICE},
-      {"sdammcblk", MMC_DEVICE}}},
+     {{ISD_DEVICE, {"isda", "/dev/isdb2", "isd"}},
+      {BOOT_DEVICE, {"nuroboot", "/dev/nuroboot1", "nurobootx"}},
+      {MMC_DEVICE, {"mmcblk0", "/dev/mmcblk0p1", "sdammcblk"}}}},
+    // 119153338869, of the last, modulo 2^32 is negative.
     {"a name without letters has no bit",
      "internalportcfg=0xffffffffffffffff\nusbportcfg=0xffffffffffffffff\n"
      "esataportcfg=0xffffffffffffffff\ncacheportcfg=0xffffffffffffffff\n",
-     {{"sd", OTHER_DEVICE},
-      {"sd1", OTHER_DEVICE},
-      {"/dev/sd", OTHER_DEVICE},
-      {"sdA", OTHER_DEVICE},
-      // 119153338869 modulo 2^32 is negative
-      {"sdnuroboot", OTHER_DEVICE}}},
+     {{OTHER_DEVICE, {"sd", "sd1", "/dev/sd", "sdA", "sdnuroboot"}}}},
     {"the order of the tests",
      "internalportcfg=0x1\nusbportcfg=0x3\ncacheportcfg=0x7\n",
-     {{"sda", INTERNAL_DEVICE}, {"sdb", USB_DEVICE}, {"sdc", CACHE_DEVICE}, {"sdd", OTHER_DEVICE}}},
+     {{INTERNAL_DEVICE, {"sda"}},
+      {USB_DEVICE, {"sdb"}},
+      {CACHE_DEVICE, {"sdc"}},
+      {OTHER_DEVICE, {"sdd"}}}},
     {"eSATA comes first",
      "esataportcfg=0x1\ninternalportcfg=0x1\nusbportcfg=0x1\ncacheportcfg=0x1\n",
-     {{"sda", ESATA_DEVICE}, {"sdb", OTHER_DEVICE}}},
+     {{ESATA_DEVICE, {"sda"}}, {OTHER_DEVICE, {"sdb"}}}},
     {"cache with its first and last bit",
      "usbportcfg=0x10\ncacheportcfg=0x80000001\n",
-     {{"sda", CACHE_DEVICE},
-      {"sdb", OTHER_DEVICE},
-      {"sde", USB_DEVICE},
-      {"sdaf", CACHE_DEVICE},
-      {"sdag", OTHER_DEVICE}}},
+     {{CACHE_DEVICE, {"sda", "sdaf"}}, {OTHER_DEVICE, {"sdb", "sdag"}}, {USB_DEVICE, {"sde"}}}},
     {"bits 0, 25, 26 and 30 of the internal mask",
      "usbportcfg=0x2\ninternalportcfg=0x46000001\n",
-     {{"sda", INTERNAL_DEVICE},
-      {"sdy", OTHER_DEVICE},
-      {"sdz", INTERNAL_DEVICE},
-      {"sdaa", INTERNAL_DEVICE},
-      {"sdab", OTHER_DEVICE},
-      {"sdae", INTERNAL_DEVICE},
-      {"sdaf", OTHER_DEVICE},
-      {"sdag", OTHER_DEVICE},
-      {"sdba", OTHER_DEVICE}}},
+     {{INTERNAL_DEVICE, {"sda", "sdz", "sdaa", "sdae"}},
+      {OTHER_DEVICE, {"sdy", "sdab", "sdaf", "sdag", "sdba"}}}},
     {"the 32nd disk by bit 31",
      "usbportcfg=0x2\ninternalportcfg=0x80000000\n",
-     {{"sdaf", INTERNAL_DEVICE}, {"sdae", OTHER_DEVICE}, {"sdag", OTHER_DEVICE}}},
+     {{INTERNAL_DEVICE, {"sdaf"}}, {OTHER_DEVICE, {"sdae", "sdag"}}}},
     {"the 32nd disk by bit 32",
      "usbportcfg=0x2\ninternalportcfg=0x100000000\n",
-     {{"sdaf", INTERNAL_DEVICE}, {"sda", OTHER_DEVICE}, {"sdag", OTHER_DEVICE}}},
+     {{INTERNAL_DEVICE, {"sdaf"}}, {OTHER_DEVICE, {"sda", "sdag"}}}},
     {"the 32nd disk by bit 63",
      "usbportcfg=0x2\ninternalportcfg=8000000000000000\n",
-     {{"sdaf", INTERNAL_DEVICE}, {"sdag", OTHER_DEVICE}, {"sdbl", OTHER_DEVICE}}},
+     {{INTERNAL_DEVICE, {"sdaf"}}, {OTHER_DEVICE, {"sdag", "sdbl"}}}},
     {"the 32nd disk by a high bit of the USB mask",
      "usbportcfg=0x4000000000000000\n",
-     {{"sdaf", USB_DEVICE}, {"sdae", OTHER_DEVICE}, {"sdag", OTHER_DEVICE}}},
+     {{USB_DEVICE, {"sdaf"}}, {OTHER_DEVICE, {"sdae", "sdag"}}}},
     {"the 32nd disk by a high bit of the cache mask",
      "usbportcfg=1\ncacheportcfg=0x10000000000\n",
-     {{"sdaf", CACHE_DEVICE}, {"sdao", OTHER_DEVICE}, {"sdag", OTHER_DEVICE}}},
+     {{CACHE_DEVICE, {"sdaf"}}, {OTHER_DEVICE, {"sdao", "sdag"}}}},
     {"disks beyond the 32nd match no mask",
      "internalportcfg=0xffffffffffffffff\nusbportcfg=0xffffffffffffffff\n"
      "cacheportcfg=0xffffffffffffffff\n",
-     {{"sdaf", INTERNAL_DEVICE},
-      {"sdag", OTHER_DEVICE},
-      {"sdbl", OTHER_DEVICE},
-      {"sdbm", OTHER_DEVICE},
-      {"sdzz", OTHER_DEVICE},
-      {"sdaaa", OTHER_DEVICE}}},
+     {{INTERNAL_DEVICE, {"sdaf"}}, {OTHER_DEVICE, {"sdag", "sdbl", "sdbm", "sdzz", "sdaaa"}}}},
     // One letter: its own bit. Two: the bit of the first letter, a for bit 0.
     {"eSATA bit 0",
      "usbportcfg=0x40000000\nesataportcfg=0x1\n",
-     {{"sda", ESATA_DEVICE},
-      {"sdaa", ESATA_DEVICE},
-      {"sdaf", ESATA_DEVICE},
-      {"sdaz", ESATA_DEVICE},
-      {"sdb", OTHER_DEVICE},
-      {"sdba", OTHER_DEVICE},
-      {"sdae", ESATA_DEVICE}}},
+     {{ESATA_DEVICE, {"sda", "sdaa", "sdaf", "sdaz", "sdae"}}, {OTHER_DEVICE, {"sdb", "sdba"}}}},
     {"eSATA bit 1",
      "usbportcfg=0x40000000\nesataportcfg=0x2\n",
-     {{"sda", OTHER_DEVICE},
-      {"sdaz", OTHER_DEVICE},
-      {"sdb", ESATA_DEVICE},
-      {"sdba", ESATA_DEVICE},
-      {"sdbz", ESATA_DEVICE},
-      {"sdca", OTHER_DEVICE},
-      {"sdae", USB_DEVICE}}},
+     {{OTHER_DEVICE, {"sda", "sdaz", "sdca"}},
+      {ESATA_DEVICE, {"sdb", "sdba", "sdbz"}},
+      {USB_DEVICE, {"sdae"}}}},
     {"eSATA bit 25",
      "usbportcfg=0x40000000\nesataportcfg=0x2000000\n",
-     {{"sdz", ESATA_DEVICE},
-      {"sdza", ESATA_DEVICE},
-      {"sdzz", ESATA_DEVICE},
-      {"sdyz", OTHER_DEVICE},
-      {"sdaaa", OTHER_DEVICE}}},
+     {{ESATA_DEVICE, {"sdz", "sdza", "sdzz"}}, {OTHER_DEVICE, {"sdyz", "sdaaa"}}}},
     // 26 is sdaa's index, whose bit is 0; the bit itself is that of sdaaa (702 / 26 - 1 = 26).
     {"eSATA bit 26",
      "usbportcfg=0x40000000\nesataportcfg=0x4000000\n",
-     {{"sdaa", OTHER_DEVICE},
-      {"sdz", OTHER_DEVICE},
-      {"sdaaa", ESATA_DEVICE},
-      {"sdaaz", ESATA_DEVICE},
-      {"sdaba", OTHER_DEVICE}}},
+     {{OTHER_DEVICE, {"sdaa", "sdz", "sdaba"}}, {ESATA_DEVICE, {"sdaaa", "sdaaz"}}}},
     // sdafa is index 832, 832 / 26 - 1 = 31; sdaga 858, whose shift of 32 has no bit.
     {"eSATA bit 31 is not widened",
      "usbportcfg=0x40000000\nesataportcfg=0x80000000\n",
-     {{"sdafa", ESATA_DEVICE},
-      {"sdaf", OTHER_DEVICE},
-      {"sdaga", OTHER_DEVICE},
-      {"sdzzz", OTHER_DEVICE}}},
+     {{ESATA_DEVICE, {"sdafa"}}, {OTHER_DEVICE, {"sdaf", "sdaga", "sdzzz"}}}},
     {"only the low half of the eSATA mask counts",
      "usbportcfg=0x40000000\nesataportcfg=0xffffffff00000000\n",
-     {{"sda", OTHER_DEVICE},
-      {"sdaf", OTHER_DEVICE},
-      {"sdafa", OTHER_DEVICE},
-      {"sdaga", OTHER_DEVICE},
-      {"sdae", USB_DEVICE}}},
+     {{OTHER_DEVICE, {"sda", "sdaf", "sdafa", "sdaga"}}, {USB_DEVICE, {"sdae"}}}},
     {"an eSATA mask of 0",
      "usbportcfg=0x2\nesataportcfg=0\ninternalportcfg=1\n",
-     {{"sda", INTERNAL_DEVICE}, {"sdaa", OTHER_DEVICE}}},
+     {{INTERNAL_DEVICE, {"sda"}}, {OTHER_DEVICE, {"sdaa"}}}},
     {"hexadecimal without 0x, in capitals, in quotes, with blanks",
      "usbportcfg=10\ninternalportcfg = \"0XF\"\ncacheportcfg=\t20 disks\r\n",
-     {{"sda", INTERNAL_DEVICE},
-      {"sdd", INTERNAL_DEVICE},
-      {"sde", USB_DEVICE},
-      {"sdf", CACHE_DEVICE},
-      {"sdk", OTHER_DEVICE}}},
+     {{INTERNAL_DEVICE, {"sda", "sdd"}},
+      {USB_DEVICE, {"sde"}},
+      {CACHE_DEVICE, {"sdf"}},
+      {OTHER_DEVICE, {"sdk"}}}},
     {"values that are no numbers are 0",
      "usbportcfg=none\ninternalportcfg=xyz\ncacheportcfg=0xg\n",
-     {{"sda", OTHER_DEVICE}}},
+     {{OTHER_DEVICE, {"sda"}}}},
     {"an empty USB value is one",
      "usbportcfg= \ninternalportcfg=1\n",
-     {{"sda", INTERNAL_DEVICE}, {"sdb", OTHER_DEVICE}}},
+     {{INTERNAL_DEVICE, {"sda"}}, {OTHER_DEVICE, {"sdb"}}}},
     {"64 digits are read, and saturate",
      "usbportcfg=" + std::string(63, '0') + "1\ninternalportcfg=" + std::string(64, 'f') + "\n",
-     {{"sda", INTERNAL_DEVICE}, {"sdaf", INTERNAL_DEVICE}, {"sdag", OTHER_DEVICE}}},
+     {{INTERNAL_DEVICE, {"sda", "sdaf"}}, {OTHER_DEVICE, {"sdag"}}}},
     {"65 digits are no value",
      "usbportcfg=1\ninternalportcfg=" + std::string(64, '0') + "f\n",
-     {{"sda", USB_DEVICE}, {"sdb", OTHER_DEVICE}}},
+     {{USB_DEVICE, {"sda"}}, {OTHER_DEVICE, {"sdb"}}}},
     {"the first of two lines decides",
      "usbportcfg=1\nusbportcfg=2\n#internalportcfg=2\ninternalportcfg=4\n",
-     {{"sda", USB_DEVICE}, {"sdb", OTHER_DEVICE}, {"sdc", INTERNAL_DEVICE}}},
+     {{USB_DEVICE, {"sda"}}, {OTHER_DEVICE, {"sdb"}}, {INTERNAL_DEVICE, {"sdc"}}}},
 };
 
 TEST(ExternalDiskPortCheck, ClassifiesByTheMasksOfTheModel)
 {
     for (const PORT_CASE &row : PORT_CASES) {
         SCOPED_TRACE(row.szTitle);
-        QuietCall(MachineWithConf(row.conf), [&row] {
-            RecordReset();
-            for (const NAMED_TYPE &disk : row.disks) {
-                EXPECT_EQ(ExternalDiskPortCheck(disk.szPath), disk.type) << disk.szPath;
-            }
-        });
+        ExpectTypes(MachineWithConf(row.conf), row.disks);
     }
 }
 
 TEST(ExternalDiskPortCheck, RefusesNull)
 {
-    const RUN_RESULT result = MachineCall(MachineWithConf("usbportcfg=1\n"), [] {
-        EXPECT_EQ(ExternalDiskPortCheck(nullptr), UNKNOWN_DEVICE);
-    });
-    EXPECT_EQ(LogText(result), "<11>disk_port.cpp:# device path should not be NULL\n");
+    ExpectCalls({{.szName = "null",
+                  .machine = MachineWithConf("usbportcfg=1\n"),
+                  .call = [] { return ExternalDiskPortCheck(nullptr); },
+                  .result = UNKNOWN_DEVICE,
+                  .steps = {{"<11>disk_port.cpp:# device path should not be NULL"}}}});
 }
 
+// Behind "/dev" stands no further slash to look behind.
 TEST(ExternalDiskPortCheck, KnowsNoOtherNames)
 {
-    const struct {
-        const char *szPath;
-        std::string szNamed; // in the line of the log
-    } rows[] = {{"hda", "hda"},
-                {"/dev/hda1", "hda"},
-                {"md0", "md"},
-                {"/dev/md2", "md"},
-                {"", ""},
-                {"/dev/", ""},
-                {"3", ""},
-                {"xsda", "xsda"},
-                {"SDA", "SDA"},
-                {"/dev/SDA", "SDA"},
-                {"/dev", "/dev"}, // no further slash to look behind
-                {"xnuroboot", "xnuroboot"},
-                {"/dev/disk/sda", "disk/sda"}};
-    for (const auto &row : rows) {
-        const RUN_RESULT result =
-            MachineCall(MachineWithConf("usbportcfg=1\ninternalportcfg=1\n"), [&row] {
-                EXPECT_EQ(ExternalDiskPortCheck(row.szPath), UNKNOWN_DEVICE) << row.szPath;
-            });
-        EXPECT_EQ(LogText(result), NoMatch(row.szNamed));
-    }
+    ExpectTypes(MachineWithConf("usbportcfg=1\ninternalportcfg=1\n"),
+                {{UNKNOWN_DEVICE,
+                  {"hda", "/dev/hda1", "md0", "/dev/md2", "", "/dev/", "3", "xsda", "SDA",
+                   "/dev/SDA", "/dev", "xnuroboot", "/dev/disk/sda"}}},
+                NoMatch("hda") + NoMatch("hda") + NoMatch("md") + NoMatch("md") + NoMatch("") +
+                    NoMatch("") + NoMatch("") + NoMatch("xsda") + NoMatch("SDA") + NoMatch("SDA") +
+                    NoMatch("/dev") + NoMatch("xnuroboot") + NoMatch("disk/sda"));
 }
 
 TEST(ExternalDiskPortCheck, TakesPathsOfUpTo31Characters)
 {
     const MACHINE machine = MachineWithConf("usbportcfg=1\n");
-    QuietCall(machine, [] {
-        EXPECT_EQ(ExternalDiskPortCheck(Letters(31).c_str()), OTHER_DEVICE);
-        EXPECT_EQ(ExternalDiskPortCheck(("/dev/" + Letters(26)).c_str()), OTHER_DEVICE);
-        EXPECT_EQ(ExternalDiskPortCheck((Letters(30) + "1").c_str()), OTHER_DEVICE);
-        EXPECT_EQ(ExternalDiskPortCheck((Letters(40) + "mmcblk").c_str()), MMC_DEVICE);
-    });
-    for (const std::string &path : {Letters(32), Letters(33), Letters(31) + "1",
-                                    "/dev/" + Letters(27), "nuroboot" + std::string(24, 'x')}) {
-        SCOPED_TRACE(path);
-        const RUN_RESULT result = MachineCall(
-            machine, [&path] { EXPECT_EQ(ExternalDiskPortCheck(path.c_str()), UNKNOWN_DEVICE); });
-        EXPECT_EQ(LogText(result), TOO_LONG);
-    }
+    ExpectTypes(machine, {{OTHER_DEVICE, {Letters(31), "/dev/" + Letters(26), Letters(30) + "1"}},
+                          {MMC_DEVICE, {Letters(40) + "mmcblk"}}});
+    ExpectTypes(machine,
+                {{UNKNOWN_DEVICE,
+                  {Letters(32), Letters(33), Letters(31) + "1", "/dev/" + Letters(27),
+                   "nuroboot" + std::string(24, 'x')}}},
+                5 * TOO_LONG);
 }
 
+// Two are told by their names alone.
 TEST(ExternalDiskPortCheck, ClassifiesNothingWithoutTheUsbMask)
 {
     const std::string others = "esataportcfg=1\ninternalportcfg=0xf\ncacheportcfg=0xff\n";
@@ -308,27 +238,17 @@ TEST(ExternalDiskPortCheck, ClassifiesNothingWithoutTheUsbMask)
          {std::string(), std::string("usbportcfg=\n"), std::string("usbportcfg\n"),
           std::string("#usbportcfg=1\n"), "usbportcfg=" + std::string(65, '1') + "\n"}) {
         SCOPED_TRACE(usb);
-        const RUN_RESULT result = MachineCall(MachineWithConf(usb + others), [] {
-            EXPECT_EQ(ExternalDiskPortCheck("sda"), UNKNOWN_DEVICE);
-            EXPECT_EQ(ExternalDiskPortCheck("/dev/sdb1"), UNKNOWN_DEVICE);
-            EXPECT_EQ(ExternalDiskPortCheck("isda"), UNKNOWN_DEVICE);
-            EXPECT_EQ(ExternalDiskPortCheck("hda"), UNKNOWN_DEVICE);
-            // These two are told by their names alone.
-            EXPECT_EQ(ExternalDiskPortCheck("nuroboot"), BOOT_DEVICE);
-            EXPECT_EQ(ExternalDiskPortCheck("mmcblk0"), MMC_DEVICE);
-        });
-        EXPECT_EQ(LogText(result),
-                  std::string(USB_MISSING) + USB_MISSING + USB_MISSING + USB_MISSING);
+        ExpectTypes(MachineWithConf(usb + others),
+                    {{UNKNOWN_DEVICE, {"sda", "/dev/sdb1", "isda", "hda"}},
+                     {BOOT_DEVICE, {"nuroboot"}},
+                     {MMC_DEVICE, {"mmcblk0"}}},
+                    4 * USB_MISSING);
     }
 }
 
 TEST(ExternalDiskPortCheck, ClassifiesNothingWithoutTheFile)
 {
-    MACHINE machine = MachineMake();
-    MachineRemove(machine, "/etc.defaults");
-    const RUN_RESULT result =
-        MachineCall(machine, [] { EXPECT_EQ(ExternalDiskPortCheck("sda"), UNKNOWN_DEVICE); });
-    EXPECT_EQ(LogText(result), USB_MISSING);
+    ExpectTypes(Without(MachineMake(), "/etc.defaults"), {{UNKNOWN_DEVICE, {"sda"}}}, USB_MISSING);
 }
 
 TEST(ExternalDiskPortCheckName, TakesBareNamesAsTheyAre)
@@ -345,7 +265,7 @@ TEST(ExternalDiskPortCheckName, TakesBareNamesAsTheyAre)
         EXPECT_EQ(ExternalDiskPortCheckName(nullptr), UNKNOWN_DEVICE);
         EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
     });
-    EXPECT_EQ(LogText(result), NoMatch("nuroboot") + NoMatch("mmcblk0") + NoMatch("/dev/sda"));
+    ExpectSteps(result, NoMatch("nuroboot") + NoMatch("mmcblk0") + NoMatch("/dev/sda"));
 }
 
 TEST(PortMasks, AreReadOnceWhenThereIsAUsbMask)
@@ -374,7 +294,7 @@ TEST(PortMasks, AreReadOnEveryCallWhileTheUsbMaskIsZero)
         EXPECT_EQ(ExternalDiskPortCheck("sdc"), USB_DEVICE);
         EXPECT_EQ(ExternalDiskPortCheck("sdd"), INTERNAL_DEVICE);
     });
-    EXPECT_EQ(LogText(result), std::string(USB_MISSING) + USB_MISSING);
+    ExpectSteps(result, 2 * USB_MISSING);
 }
 
 TEST(PortMasks, KeepWhatAMissingKeyDoesNotReplace)
@@ -392,28 +312,22 @@ TEST(PortMasks, KeepWhatAMissingKeyDoesNotReplace)
 
 // ---- expansion units ---------------------------------------------------------------------------
 
+// sdg is told loosely: its name is in sdga.
 TEST(ExpansionUnit, ReportsTheDisksBehindAnEsataPort)
 {
     MACHINE machine = MachineWithConf("usbportcfg=1\ninternalportcfg=0xfe\nesataportcfg=0x40\n");
     UnitAdd(machine, "host3", "/dev/sdga,/dev/sdgb");
-    QuietCall(machine, [] {
-        EXPECT_EQ(ExternalDiskPortCheck("sdga"), EUNIT_DEVICE);
-        EXPECT_EQ(ExternalDiskPortCheck("/dev/sdgb3"), EUNIT_DEVICE);
-        EXPECT_EQ(ExternalDiskPortCheck("sdgc"), ESATA_DEVICE);
-        EXPECT_EQ(ExternalDiskPortCheck("sdg"), EUNIT_DEVICE); // loose: sdg is in sdga
-        EXPECT_EQ(ExternalDiskPortCheck("sdf"), INTERNAL_DEVICE);
-        EXPECT_EQ(ExternalDiskPortCheck("sdfa"), OTHER_DEVICE);
-    });
+    ExpectTypes(machine, {{EUNIT_DEVICE, {"sdga", "/dev/sdgb3", "sdg"}},
+                          {ESATA_DEVICE, {"sdgc"}},
+                          {INTERNAL_DEVICE, {"sdf"}},
+                          {OTHER_DEVICE, {"sdfa"}}});
 }
 
 TEST(ExpansionUnit, DoesNotCountForDisksOfOtherPorts)
 {
     MACHINE machine = MachineWithConf("usbportcfg=1\ninternalportcfg=0x40\n");
     UnitAdd(machine, "host0", "/dev/sdg,/dev/sda");
-    QuietCall(machine, [] {
-        EXPECT_EQ(ExternalDiskPortCheck("sdg"), INTERNAL_DEVICE);
-        EXPECT_EQ(ExternalDiskPortCheck("sda"), USB_DEVICE);
-    });
+    ExpectTypes(machine, {{INTERNAL_DEVICE, {"sdg"}}, {USB_DEVICE, {"sda"}}});
 }
 
 struct UNIT_CASE {
@@ -610,12 +524,9 @@ TEST(ExpansionUnit, IsNoneWhenItsListIsTooLongForTheCheck)
     for (const char *szHost : {"host1", "host2", "host3", "host4", "host5"}) {
         UnitAdd(machine, szHost, devices);
     }
-    const auto check = [](DISK_PORT_TYPE type) {
-        return [type] { EXPECT_EQ(ExternalDiskPortCheck("sdb"), type); };
-    };
-    EXPECT_EQ(LogText(MachineCall(machine, check(EUNIT_DEVICE))), "");
+    ExpectTypes(machine, {{EUNIT_DEVICE, {"sdb"}}});
     UnitAdd(machine, "host6", devices);
-    EXPECT_EQ(LogText(MachineCall(machine, check(ESATA_DEVICE))), "");
+    ExpectTypes(machine, {{ESATA_DEVICE, {"sdb"}}});
 }
 
 // Fills the units' list with `cbOther` bytes of other disks and reports sdb behind them.
@@ -673,61 +584,146 @@ std::string ItemsOf(PNLIBSZLIST pList)
 constexpr char ENUM_CONF[] =
     "usbportcfg=0x30\nesataportcfg=0x40\ninternalportcfg=0xf\ncacheportcfg=0x80\n";
 
+MACHINE MachineWithFolders(const std::string &conf, const std::vector<std::string> &disks)
+{
+    MACHINE machine = MachineWithConf(conf);
+    for (const std::string &disk : disks) {
+        MachineFolder(machine, "/sys/block/" + disk);
+    }
+    return machine;
+}
+
 MACHINE MachineWithDisks()
 {
-    MACHINE machine = MachineWithConf(ENUM_CONF);
-    for (const char *szDisk :
-         {"sdh", "sdgb", "sdga", "sdg",  "sdf",      "sde", "sdd", "sdc",     "sdb", "sdaf",
-          "sda", "sdi",  "isdb", "isda", "nuroboot", "md0", "sr0", "mmcblk0", "hda", "sd"}) {
-        MachineFolder(machine, std::string("/sys/block/") + szDisk);
-    }
+    MACHINE machine =
+        MachineWithFolders(ENUM_CONF, {"sdh",      "sdgb", "sdga", "sdg",     "sdf", "sde",  "sdd",
+                                       "sdc",      "sdb",  "sdaf", "sda",     "sdi", "isdb", "isda",
+                                       "nuroboot", "md0",  "sr0",  "mmcblk0", "hda", "sd"});
     UnitAdd(machine, "host0", "/dev/sdga,/dev/sdgc");
     return machine;
 }
 
+// What a list of 512 bytes holds behind the call; the items of `before` stand in it at first.
 struct ENUM_CASE {
+    const char *szName;
     DISK_PORT_TYPE type;
-    const char *szItems;
+    std::string items;
+    MACHINE machine = MachineWithDisks();
+    std::string before = "";
+    int fMode = SZLIST_SORTED;
+    int result = 0;
+    STEPS steps = {};
+    int nSize = 512;
 };
 
-constexpr ENUM_CASE ENUM_CASES[] = {
-    {INTERNAL_DEVICE, "sda sdb sdc sdd "},
-    {ESATA_DEVICE, "sdgb "},
-    {EUNIT_DEVICE, "sdg sdga "},
-    {USB_DEVICE, "sde sdf "},
-    {BOOT_DEVICE, "nuroboot "},
-    {ISD_DEVICE, "isda isdb "},
-    {CACHE_DEVICE, "sdh "},
-};
-
-TEST(ExternalDiskPortEnum, ListsTheDisksOfAType)
+void PrintTo(const ENUM_CASE &row, std::ostream *pStream)
 {
-    const MACHINE machine = MachineWithDisks();
-    for (const ENUM_CASE &row : ENUM_CASES) {
-        SCOPED_TRACE(row.type);
-        QuietCall(machine, [&row] {
-            PNLIBSZLIST pList = NLIBCSzListAlloc(1024);
-            EXPECT_EQ(ExternalDiskPortEnum(row.type, &pList), 0);
-            EXPECT_EQ(ItemsOf(pList), row.szItems);
-            EXPECT_EQ(pList->fMode, SZLIST_SORTED);
-            NLIBCSzListFree(pList);
-        });
-    }
+    *pStream << row.szName;
 }
 
-TEST(ExternalDiskPortEnum, SortsByBytes)
+struct ExternalDiskPortEnumList : testing::TestWithParam<ENUM_CASE> {
+};
+
+TEST_P(ExternalDiskPortEnumList, Lists)
 {
-    MACHINE machine = MachineWithConf("usbportcfg=0x80000000\ninternalportcfg=0x7fffffff\n");
-    for (const char *szDisk : {"sdb", "sdaa", "sdz", "sda", "sdab", "sdaf"}) {
-        MachineFolder(machine, std::string("/sys/block/") + szDisk);
-    }
-    QuietCall(machine, [] {
-        PNLIBSZLIST pList = NLIBCSzListAlloc(1024);
-        EXPECT_EQ(ExternalDiskPortEnum(INTERNAL_DEVICE, &pList), 0);
-        EXPECT_EQ(ItemsOf(pList), "sda sdaa sdab sdb sdz ");
+    const ENUM_CASE &row = GetParam();
+    const RUN_RESULT result = MachineCall(row.machine, [&row] {
+        PNLIBSZLIST pList = NLIBCSzListAlloc(512);
+        std::istringstream before(row.before);
+        for (std::string item; before >> item;) {
+            (void)NLIBCSzListPush(&pList, item.c_str());
+        }
+        EXPECT_EQ(ExternalDiskPortEnum(row.type, &pList), row.result);
+        EXPECT_EQ(ItemsOf(pList), row.items);
+        EXPECT_EQ(pList->fMode, row.fMode);
+        EXPECT_EQ(pList->nSize, row.nSize);
         NLIBCSzListFree(pList);
     });
+    ExpectSteps(result, row.steps);
 }
+
+// 120 names: with their slots they need more than a list of 512 bytes has.
+std::vector<std::string> ManyDisks()
+{
+    std::vector<std::string> disks;
+    for (char first = 'b'; first < 'h'; first++) {
+        for (char second = 'a'; second < 'u'; second++) {
+            disks.push_back({'s', 'd', first, second});
+        }
+    }
+    return disks;
+}
+
+std::string ManyItems()
+{
+    std::string items;
+    for (const std::string &disk : ManyDisks()) {
+        items += disk + " ";
+    }
+    return items;
+}
+
+const ENUM_CASE ENUM_CASES[] = {
+    {"Internal", INTERNAL_DEVICE, "sda sdb sdc sdd "},
+    {"Esata", ESATA_DEVICE, "sdgb "},
+    {"Eunit", EUNIT_DEVICE, "sdg sdga "},
+    {"Usb", USB_DEVICE, "sde sdf "},
+    {"Boot", BOOT_DEVICE, "nuroboot "},
+    {"Isd", ISD_DEVICE, "isda isdb "},
+    {"Cache", CACHE_DEVICE, "sdh "},
+    {"ByBytes", INTERNAL_DEVICE, "sda sdaa sdab sdb sdz ",
+     MachineWithFolders("usbportcfg=0x80000000\ninternalportcfg=0x7fffffff\n",
+                        {"sdb", "sdaa", "sdz", "sda", "sdab", "sdaf"})},
+    {"AsMuchAsTheListGrows",
+     ESATA_DEVICE,
+     ManyItems(),
+     MachineWithFolders("usbportcfg=1\nesataportcfg=0x3ffffff\n", ManyDisks()),
+     "",
+     SZLIST_SORTED,
+     0,
+     {},
+     2048},
+    {"NoDiskOfTheTypeSorted", INTERNAL_DEVICE, "", MachineWithFolders("usbportcfg=1\n", {"sdb"})},
+    {"NothingButALineForEachDiskWithoutTheUsbMask", INTERNAL_DEVICE, "",
+     MachineWithFolders("internalportcfg=0xf\n", {"sda", "sdb"}), "", SZLIST_SORTED, 0,
+     2 * USB_MISSING},
+};
+
+INSTANTIATE_TEST_SUITE_P(, ExternalDiskPortEnumList, testing::ValuesIn(ENUM_CASES), ROW_NAME());
+
+// The list stays as it was.
+ENUM_CASE Refused(const char *szName, int type, const std::string &line, int error = 0)
+{
+    MACHINE machine = MachineWithDisks();
+    STEPS steps = {{line}};
+    if (error != 0) {
+        machine.faults = {{.szFunction = "glob", .error = error}};
+        steps = STEPS{{"fault glob 1"}} + steps;
+    }
+    return {szName, static_cast<DISK_PORT_TYPE>(type), "b ", machine, "b", SZLIST_UNSORTED, -1,
+            steps};
+}
+
+constexpr char NO_TYPE[] = "<11>disk_port.cpp:# disk port type doesn't exist";
+constexpr char NO_MEMORY[] =
+    "<11>disk_port.cpp:# out of memory to alloc glob function when looking for:";
+
+// Without memory for the matches, or with a folder that cannot be read.
+const ENUM_CASE REFUSED_CASES[] = {
+    Refused("Type0", 0, NO_TYPE),
+    Refused("Type8", 8, NO_TYPE),
+    Refused("Type9", 9, NO_TYPE),
+    Refused("Type10", 10, NO_TYPE),
+    Refused("Type15", 15, NO_TYPE),
+    Refused("Unread", INTERNAL_DEVICE, "<11>disk_port.cpp:# read error :/sys/block/sd*", EIO),
+    Refused("UnreadIsd", ISD_DEVICE, "<11>disk_port.cpp:# read error :/sys/block/isd*", EIO),
+    Refused("UnreadBoot", BOOT_DEVICE, "<11>disk_port.cpp:# read error :/sys/block/nuroboot", EIO),
+    Refused("NoMemory", CACHE_DEVICE, std::string(NO_MEMORY) + "/sys/block/sd*", ENOMEM),
+    Refused("NoMemoryBoot", BOOT_DEVICE, std::string(NO_MEMORY) + "/sys/block/nuroboot", ENOMEM),
+};
+
+INSTANTIATE_TEST_SUITE_P(Refused, ExternalDiskPortEnumList, testing::ValuesIn(REFUSED_CASES),
+                         ROW_NAME());
 
 TEST(ExternalDiskPortEnum, AppendsAndSortsTheWholeList)
 {
@@ -742,88 +738,22 @@ TEST(ExternalDiskPortEnum, AppendsAndSortsTheWholeList)
     });
 }
 
-// 120 names of 5 bytes and 4 a slot need more than a list of 512 bytes has.
-TEST(ExternalDiskPortEnum, LetsTheListGrow)
-{
-    MACHINE machine = MachineWithConf("usbportcfg=1\nesataportcfg=0x3ffffff\n");
-    std::string expected;
-    for (char first = 'b'; first < 'h'; first++) {
-        for (char second = 'a'; second < 'u'; second++) {
-            const std::string disk = {'s', 'd', first, second};
-            MachineFolder(machine, "/sys/block/" + disk);
-            expected += disk + " ";
-        }
-    }
-    QuietCall(machine, [&expected] {
-        PNLIBSZLIST pList = NLIBCSzListAlloc(512);
-        EXPECT_EQ(ExternalDiskPortEnum(ESATA_DEVICE, &pList), 0);
-        EXPECT_EQ(ItemsOf(pList), expected);
-        EXPECT_EQ(pList->nSize, 2048);
-        NLIBCSzListFree(pList);
-    });
-}
-
-TEST(ExternalDiskPortEnum, SortsWhenDisksAreThereButNoneIsOfTheType)
-{
-    MACHINE machine = MachineWithConf("usbportcfg=1\n");
-    MachineFolder(machine, "/sys/block/sdb");
-    QuietCall(machine, [] {
-        PNLIBSZLIST pList = NLIBCSzListAlloc(512);
-        EXPECT_EQ(ExternalDiskPortEnum(INTERNAL_DEVICE, &pList), 0);
-        EXPECT_EQ(pList->nItem, 0);
-        EXPECT_EQ(pList->fMode, SZLIST_SORTED);
-        NLIBCSzListFree(pList);
-    });
-}
-
 TEST(ExternalDiskPortEnum, LeavesTheListAloneWhereNoDiskIs)
 {
-    MACHINE machine = MachineWithConf(ENUM_CONF);
-    MachineFolder(machine, "/sys/block/md0");
-    MACHINE noFolder = machine;
-    MachineRemove(noFolder, "/sys/block");
-    const auto enumerate = [] {
-        PNLIBSZLIST pList = NLIBCSzListAlloc(512);
-        (void)NLIBCSzListPush(&pList, "b");
-        (void)NLIBCSzListPush(&pList, "a");
-        for (const ENUM_CASE &row : ENUM_CASES) {
-            EXPECT_EQ(ExternalDiskPortEnum(row.type, &pList), 0) << row.type;
-        }
-        EXPECT_EQ(ItemsOf(pList), "b a ");
-        EXPECT_EQ(pList->fMode, SZLIST_UNSORTED);
-        NLIBCSzListFree(pList);
-    };
-    EXPECT_EQ(LogText(MachineCall(machine, enumerate)), "");
-    EXPECT_EQ(LogText(MachineCall(noFolder, enumerate)), "");
-}
-
-TEST(ExternalDiskPortEnum, FindsNothingButLogsEachDiskWithoutTheUsbMask)
-{
-    MACHINE machine = MachineWithConf("internalportcfg=0xf\n");
-    MachineFolder(machine, "/sys/block/sda");
-    MachineFolder(machine, "/sys/block/sdb");
-    const RUN_RESULT result = MachineCall(machine, [] {
-        PNLIBSZLIST pList = NLIBCSzListAlloc(512);
-        EXPECT_EQ(ExternalDiskPortEnum(INTERNAL_DEVICE, &pList), 0);
-        EXPECT_EQ(pList->nItem, 0);
-        NLIBCSzListFree(pList);
-    });
-    EXPECT_EQ(LogText(result), std::string(USB_MISSING) + USB_MISSING);
-}
-
-TEST(ExternalDiskPortEnum, RefusesTypesThatAreNotEnumerated)
-{
-    for (const int type : {0, 8, 9, 10, 15}) {
-        SCOPED_TRACE(type);
-        const RUN_RESULT result = MachineCall(MachineWithDisks(), [type] {
+    const MACHINE machine = MachineWithFolders(ENUM_CONF, {"md0"});
+    for (const MACHINE &blank : {machine, Without(machine, "/sys/block")}) {
+        QuietCall(blank, [] {
             PNLIBSZLIST pList = NLIBCSzListAlloc(512);
             (void)NLIBCSzListPush(&pList, "b");
-            EXPECT_EQ(ExternalDiskPortEnum(static_cast<DISK_PORT_TYPE>(type), &pList), -1);
-            EXPECT_EQ(ItemsOf(pList), "b ");
+            (void)NLIBCSzListPush(&pList, "a");
+            for (int type = INTERNAL_DEVICE; type <= CACHE_DEVICE; type++) {
+                EXPECT_EQ(ExternalDiskPortEnum(static_cast<DISK_PORT_TYPE>(type), &pList), 0)
+                    << type;
+            }
+            EXPECT_EQ(ItemsOf(pList), "b a ");
             EXPECT_EQ(pList->fMode, SZLIST_UNSORTED);
             NLIBCSzListFree(pList);
         });
-        EXPECT_EQ(LogText(result), "<11>disk_port.cpp:# disk port type doesn't exist\n");
     }
 }
 
@@ -835,60 +765,25 @@ TEST(ExternalDiskPortEnum, RefusesNull)
         EXPECT_EQ(ExternalDiskPortEnum(INTERNAL_DEVICE, &pList), -1);
         EXPECT_EQ(ExternalDiskPortEnum(OTHER_DEVICE, nullptr), -1);
     });
-    const std::string line = "<11>disk_port.cpp:# device name list can not be NULL\n";
-    EXPECT_EQ(LogText(result), line + line + line);
-}
-
-struct GLOB_CASE {
-    DISK_PORT_TYPE type;
-    int error; // ENOMEM: no memory for the matches; every other: a folder cannot be read
-    std::string log;
-};
-
-const GLOB_CASE GLOB_CASES[] = {
-    {INTERNAL_DEVICE, EIO, "<11>disk_port.cpp:# read error :/sys/block/sd*\n"},
-    {ISD_DEVICE, EIO, "<11>disk_port.cpp:# read error :/sys/block/isd*\n"},
-    {BOOT_DEVICE, EIO, "<11>disk_port.cpp:# read error :/sys/block/nuroboot\n"},
-    {CACHE_DEVICE, ENOMEM,
-     "<11>disk_port.cpp:# out of memory to alloc glob function when looking for:/sys/block/sd*\n"},
-    {BOOT_DEVICE, ENOMEM,
-     "<11>disk_port.cpp:# out of memory to alloc glob function when looking "
-     "for:/sys/block/nuroboot\n"},
-};
-
-TEST(ExternalDiskPortEnum, FailsWhenTheDisksCannotBeListed)
-{
-    for (const GLOB_CASE &row : GLOB_CASES) {
-        SCOPED_TRACE(testing::Message() << row.type << ' ' << row.error);
-        MACHINE machine = MachineWithDisks();
-        machine.faults = {{.szFunction = "glob", .error = row.error}};
-        const RUN_RESULT result = MachineCall(machine, [&row] {
-            PNLIBSZLIST pList = NLIBCSzListAlloc(512);
-            (void)NLIBCSzListPush(&pList, "b");
-            EXPECT_EQ(ExternalDiskPortEnum(row.type, &pList), -1);
-            EXPECT_EQ(ItemsOf(pList), "b ");
-            EXPECT_EQ(pList->fMode, SZLIST_UNSORTED);
-            NLIBCSzListFree(pList);
-        });
-        EXPECT_EQ(LogText(result), row.log);
-    }
+    ExpectSteps(result, 3 * STEPS{{"<11>disk_port.cpp:# device name list can not be NULL"}});
 }
 
 TEST(IsSupportSas, IsAskedOnceInAProcess)
 {
-    const auto ask = [](int fSas, const std::string &conf) {
-        return [fSas, conf] {
-            EXPECT_EQ(IsSupportSas(), fSas);
-            ConfRewrite(conf);
-            EXPECT_EQ(IsSupportSas(), fSas);
-        };
-    };
     const std::string yes = "supportsas=\"YES\"\n";
     const std::string no = "supportsas=no\n";
-    EXPECT_EQ(LogText(MachineCall(MachineWithConf(yes), ask(1, no))), "");
-    EXPECT_EQ(LogText(MachineCall(MachineWithConf(no), ask(0, yes))), "");
-    EXPECT_EQ(LogText(MachineCall(MachineWithConf("supportsas=yesno\n"), ask(0, yes))), "");
-    EXPECT_EQ(LogText(MachineCall(MachineWithConf(""), ask(0, yes))), "");
+    const struct {
+        std::string conf;
+        int fSas;
+        std::string later;
+    } rows[] = {{yes, 1, no}, {no, 0, yes}, {"supportsas=yesno\n", 0, yes}, {"", 0, yes}};
+    for (const auto &row : rows) {
+        QuietCall(MachineWithConf(row.conf), [&row] {
+            EXPECT_EQ(IsSupportSas(), row.fSas);
+            ConfRewrite(row.later);
+            EXPECT_EQ(IsSupportSas(), row.fSas);
+        });
+    }
 }
 
 } // namespace
