@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: MIT
-#include "sandbox.h"
+#include "steps.h"
 
 #include <gtest/gtest.h>
 
@@ -15,22 +15,24 @@ constexpr const char *USAGE = "usage:\n"
 
 constexpr const char *PVS = "/sbin/pvs -o pv_name,vg_name,lv_name,origin --noheading --separator :";
 
-// A machine that is told what it is, without a single disk.
-MACHINE DisklessMake()
+constexpr char CONF[] = "maxdisks=4\nsupportraid=yes\nusbportcfg=0xf0\ninternalportcfg=0xf\n";
+
+// On a machine that is told what it is, without a single disk.
+void ExpectWords(const std::vector<std::string> &arguments, int status, const std::string &szOut,
+                 const STEPS &steps = {})
 {
-    MACHINE machine = MachineMake();
-    MachineConf(machine, "maxdisks=4\nsupportraid=yes\nusbportcfg=0xf0\ninternalportcfg=0xf\n");
-    return machine;
+    ExpectRun({.szName = testing::PrintToString(arguments).c_str(),
+               .machine = MachineWithConf(CONF),
+               .arguments = arguments,
+               .szOut = szOut,
+               .status = status,
+               .steps = steps});
 }
 
 void ExpectRefused(const std::vector<std::string> &arguments, const std::string &szOut)
 {
-    SCOPED_TRACE(testing::PrintToString(arguments));
-    const RUN_RESULT result = RunEnds(DisklessMake(), arguments, 1, szOut);
-    EXPECT_EQ(OrderText(result), "");
+    ExpectWords(arguments, 1, szOut);
 }
-
-} // namespace
 
 TEST(CommandLine, NoCommandPrintsTheUsage)
 {
@@ -40,31 +42,32 @@ TEST(CommandLine, NoCommandPrintsTheUsage)
 TEST(CommandLine, AnUnknownCommandIsNotRecognized)
 {
     const std::string szRefused = std::string("command not recognized\n") + USAGE;
-    for (const char *const szWord : {"",
-                                     "Status",
-                                     "STATUS",
-                                     "statu",
-                                     "status2",
-                                     " status",
-                                     "status ",
-                                     "destroyed",
-                                     "dest",
-                                     "Destroy",
-                                     "newvols",
-                                     "new",
-                                     "initsy",
-                                     "initsys-",
-                                     "initsys-ddd",
-                                     "initsysdd",
-                                     "enumformatalldisk",
-                                     "enumformatalldisks_",
-                                     "enumformatalldisks_indualhead",
-                                     "enumformatalldisks_indualhead_install2",
-                                     "help",
-                                     "--help",
-                                     "-h",
-                                     "2",
-                                     "\xff"}) {
+    const std::vector<const char *> words = {"",
+                                             "Status",
+                                             "STATUS",
+                                             "statu",
+                                             "status2",
+                                             " status",
+                                             "status ",
+                                             "destroyed",
+                                             "dest",
+                                             "Destroy",
+                                             "newvols",
+                                             "new",
+                                             "initsy",
+                                             "initsys-",
+                                             "initsys-ddd",
+                                             "initsysdd",
+                                             "enumformatalldisk",
+                                             "enumformatalldisks_",
+                                             "enumformatalldisks_indualhead",
+                                             "enumformatalldisks_indualhead_install2",
+                                             "help",
+                                             "--help",
+                                             "-h",
+                                             "2",
+                                             "\xff"};
+    for (const char *const szWord : words) {
         ExpectRefused({szWord}, szRefused);
         ExpectRefused({szWord, "2"}, szRefused);
     }
@@ -125,10 +128,12 @@ TEST(CommandLine, StatusMakesThePathFromTheLeadingNumber)
 {
     for (const RAID_ID_CASE &id : RAID_IDS) {
         SCOPED_TRACE(id.szArgument);
-        const RUN_RESULT result = RunEnds(MachineMake(), {"status", id.szArgument}, 1,
-                                          std::string("RAID ") + id.szPath + " is not found\n");
-        EXPECT_EQ(LogText(result), std::string("<15>raid_info.cpp:# Failed to open ") + id.szPath +
-                                       ", errno=No such file or directory\n");
+        ExpectRun({.szName = id.szPath,
+                   .arguments = {"status", id.szArgument},
+                   .szOut = std::string("RAID ") + id.szPath + " is not found\n",
+                   .status = 1,
+                   .steps = {{std::string("<15>raid_info.cpp:# Failed to open ") + id.szPath +
+                              ", errno=No such file or directory"}}});
     }
 }
 
@@ -157,52 +162,38 @@ TEST(CommandLine, StatusIgnoresWhatFollowsTheId)
     }
 }
 
+const STEPS NO_DISK = {
+    {"<11>arrayctl.cpp:# No disk to create system and swap partition, initsys fail!"}};
+
 TEST(CommandLine, NewvolAloneIsTaken)
 {
-    const RUN_RESULT result =
-        RunEnds(DisklessMake(), {"newvol"}, 1, "No disk to create RAID... \n");
-    EXPECT_EQ(TranscriptText(result), "");
+    ExpectWords({"newvol"}, 1, "No disk to create RAID... \n");
 }
 
 TEST(CommandLine, InitsysIgnoresWhatFollows)
 {
-    for (const std::vector<std::string> &arguments :
-         {std::vector<std::string>{"initsys"}, std::vector<std::string>{"initsys", "anything"},
-          std::vector<std::string>{"initsys", "2", "3"}}) {
-        const RUN_RESULT result = RunEnds(DisklessMake(), arguments, 1, "");
-        EXPECT_EQ(LogText(result), "<11>arrayctl.cpp:# No disk to create system and swap "
-                                   "partition, initsys fail!\n");
-        EXPECT_EQ(TranscriptText(result), "");
-    }
+    ExpectWords({"initsys"}, 1, "", NO_DISK);
+    ExpectWords({"initsys", "anything"}, 1, "", NO_DISK);
+    ExpectWords({"initsys", "2", "3"}, 1, "", NO_DISK);
 }
 
 TEST(CommandLine, InitsysDdIgnoresWhatFollowsAndDuplicates)
 {
-    for (const std::vector<std::string> &arguments :
-         {std::vector<std::string>{"initsys-dd"},
-          std::vector<std::string>{"initsys-dd", "anything"}}) {
-        MACHINE machine = DisklessMake();
-        MachineTool(machine, "/bin/nurodd");
-        const RUN_RESULT result = RunEnds(machine, arguments, 1, "");
-        EXPECT_EQ(TranscriptText(result), "/bin/nurodd\n");
-    }
+    ExpectWords({"initsys-dd"}, 1, "", STEPS{{"/bin/nurodd"}} + NO_DISK);
+    ExpectWords({"initsys-dd", "anything"}, 1, "", STEPS{{"/bin/nurodd"}} + NO_DISK);
 }
 
 TEST(CommandLine, TheEnumerationsAreTakenThoughNotAdvertised)
 {
-    for (const std::vector<std::string> &arguments :
-         {std::vector<std::string>{"enumformatalldisks"},
-          std::vector<std::string>{"enumformatalldisks", "anything"},
-          std::vector<std::string>{"enumformatalldisks_indualhead_install"},
-          std::vector<std::string>{"enumformatalldisks_indualhead_install", "2", "3"}}) {
-        const RUN_RESULT result = RunEnds(DisklessMake(), arguments, 0, "");
-        EXPECT_EQ(OrderText(result), "");
-    }
+    ExpectWords({"enumformatalldisks"}, 0, "");
+    ExpectWords({"enumformatalldisks", "anything"}, 0, "");
+    ExpectWords({"enumformatalldisks_indualhead_install"}, 0, "");
+    ExpectWords({"enumformatalldisks_indualhead_install", "2", "3"}, 0, "");
 }
 
 TEST(CommandLine, TheTwoEnumerationsDifferOnlyOnADualHeadMachine)
 {
-    MACHINE machine = DisklessMake();
+    MACHINE machine = MachineWithConf(CONF);
     MachineDiskAdd(machine, "sda");
     MachineTool(machine, "/sbin/sfdisk ...", {.nTimes = ANY_TIMES});
     MachineTool(machine, "/sbin/mdadm ...", {.nTimes = ANY_TIMES});
@@ -219,3 +210,5 @@ TEST(CommandLine, TheLogIsWrittenUnderTheProgramsOwnName)
     EXPECT_EQ(result.log[0].szTag, "arrayctl");
     EXPECT_EQ(result.log[0].priority, 15);
 }
+
+} // namespace

@@ -1,29 +1,27 @@
 // SPDX-License-Identifier: MIT
 #include "nurocore/conf.h"
 
-#include "last_error.h"
 #include "nurocore/error.h"
 #include "nurocore/file.h"
 #include "nurocore/types.h"
-#include "sandbox.h"
+#include "steps.h"
 
 #include <cstdio>
 #include <fstream>
 #include <gtest/gtest.h>
 #include <string>
 #include <unistd.h>
+#include <vector>
 
 namespace
 {
 
-constexpr char MAX_DISKS_FAILED[] =
-    "<11>conf.cpp:# Failed to NLIBCFileGetKeyValue(/etc.defaults/nuroinfo.conf,maxdisks)\n";
+const STEPS MAX_DISKS_FAILED = {
+    {"<11>conf.cpp:# Failed to NLIBCFileGetKeyValue(/etc.defaults/nuroinfo.conf,maxdisks)"}};
 
 MACHINE MachineWithoutConf()
 {
-    MACHINE machine = MachineMake();
-    MachineRemove(machine, "/etc.defaults");
-    return machine;
+    return Without(MachineMake(), "/etc.defaults");
 }
 
 // On the machine, while it runs.
@@ -38,61 +36,46 @@ bool IsMarked(const char *szPath)
 }
 
 struct YES_CASE {
-    const char *szConf;
     int result;
     u32 code; // that the lookup leaves
+    std::vector<const char *> confs;
 };
 
-constexpr YES_CASE YES_CASES[] = {
-    {"supportraid=yes\n", 1, OLD_CODE},
-    {"supportraid=YES\n", 1, OLD_CODE},
-    {"supportraid=Yes\n", 1, OLD_CODE},
-    {"supportraid=yEs", 1, OLD_CODE},
-    {"supportraid=\"yes\"\n", 1, OLD_CODE},
-    {"  supportraid \t=  \"YES\" \r\n", 1, OLD_CODE},
-    {"supportraid=yes          \n", 1, OLD_CODE},
-    {"\"supportraid\"=yes\n", 1, OLD_CODE},
-    {"==supportraid=yes\n", 1, OLD_CODE},
-    {"supportsas=no\nsupportraid=yes\nsupportraid=no\n", 1, OLD_CODE},
-    {"supportraid=no\nsupportraid=yes\n", 0, OLD_CODE},
-    {"supportraid=no\n", 0, OLD_CODE},
-    {"supportraid=ye\n", 0, OLD_CODE},
-    {"supportraid=y\n", 0, OLD_CODE},
-    {"supportraid=1\n", 0, OLD_CODE},
-    {"supportraid=true\n", 0, OLD_CODE},
-    {"supportraid=yess\n", 0, OLD_CODE},
-    {"supportraid==yes\n", 0, OLD_CODE},
-    {"supportraid=yes\f\n", 0, OLD_CODE},
-    {"supportraid=\"yes\n", 0, OLD_CODE},
-    {"supportraid=\"\"\n", 0, OLD_CODE},
-    {"supportraid=   \n", 0, OLD_CODE},
-    {"supportraid=\r\n", 0, OLD_CODE},
+const YES_CASE YES_CASES[] = {
+    {1,
+     OLD_CODE,
+     {"supportraid=yes\n", "supportraid=YES\n", "supportraid=Yes\n", "supportraid=yEs",
+      "supportraid=\"yes\"\n", "  supportraid \t=  \"YES\" \r\n", "supportraid=yes          \n",
+      "\"supportraid\"=yes\n", "==supportraid=yes\n",
+      "supportsas=no\nsupportraid=yes\nsupportraid=no\n"}},
+    {0,
+     OLD_CODE,
+     {"supportraid=no\nsupportraid=yes\n", "supportraid=no\n", "supportraid=ye\n",
+      "supportraid=y\n", "supportraid=1\n", "supportraid=true\n", "supportraid=yess\n",
+      "supportraid==yes\n", "supportraid=yes\f\n", "supportraid=\"yes\n", "supportraid=\"\"\n",
+      "supportraid=   \n", "supportraid=\r\n"}},
     // Five characters do not fit, whatever they are.
-    {"supportraid=yesno\n", 0, ERR_BUF_TOO_SMALL},
-    {"supportraid=yes=1\n", 0, ERR_BUF_TOO_SMALL},
-    {"supportraid=yes, it does\n", 0, ERR_BUF_TOO_SMALL},
+    {0,
+     ERR_BUF_TOO_SMALL,
+     {"supportraid=yesno\n", "supportraid=yes=1\n", "supportraid=yes, it does\n"}},
     // No such key, or no value.
-    {"", 0, ERR_KEY_NOT_FOUND},
-    {"supportraid=\n", 0, ERR_KEY_NOT_FOUND},
-    {"supportraid=\nsupportraid=yes\n", 0, ERR_KEY_NOT_FOUND},
-    {"supportraid\n", 0, ERR_KEY_NOT_FOUND},
-    {"supportraid yes\n", 0, ERR_KEY_NOT_FOUND},
-    {"#supportraid=yes\n", 0, ERR_KEY_NOT_FOUND},
-    {";supportraid=yes\n", 0, ERR_KEY_NOT_FOUND},
-    {" #supportraid=yes\n", 0, ERR_KEY_NOT_FOUND},
-    {"Supportraid=yes\n", 0, ERR_KEY_NOT_FOUND},
-    {"supportraid2=yes\n", 0, ERR_KEY_NOT_FOUND},
+    {0,
+     ERR_KEY_NOT_FOUND,
+     {"", "supportraid=\n", "supportraid=\nsupportraid=yes\n", "supportraid\n", "supportraid yes\n",
+      "#supportraid=yes\n", ";supportraid=yes\n", " #supportraid=yes\n", "Supportraid=yes\n",
+      "supportraid2=yes\n"}},
 };
 
 TEST(ConfKeyIsYes, TakesYesOfAnyCaseAlone)
 {
     QuietCall(MachineMake(), [] {
         for (const YES_CASE &row : YES_CASES) {
-            (void)unlink(NUROINFO_CONF_PATH);
-            ConfRewrite(row.szConf);
-            RecordReset();
-            EXPECT_EQ(NLIBCConfKeyIsYes("supportraid"), row.result) << row.szConf;
-            EXPECT_EQ(NLIBCErrGet(), row.code) << row.szConf;
+            for (const char *const szConf : row.confs) {
+                SCOPED_TRACE(szConf);
+                (void)unlink(NUROINFO_CONF_PATH);
+                ConfRewrite(szConf);
+                EXPECT_FAILS(NLIBCConfKeyIsYes("supportraid"), row.result, row.code);
+            }
         }
     });
 }
@@ -101,8 +84,7 @@ TEST(ConfKeyIsYes, IsNoForNullAndWithoutTheFile)
 {
     QuietCall(MachineWithoutConf(), [] {
         EXPECT_QUIET(NLIBCConfKeyIsYes(nullptr), 0);
-        EXPECT_EQ(NLIBCConfKeyIsYes("supportraid"), 0);
-        EXPECT_EQ(NLIBCErrGet(), ERR_OPEN_FAILED);
+        EXPECT_FAILS(NLIBCConfKeyIsYes("supportraid"), 0, ERR_OPEN_FAILED);
     });
 }
 
@@ -151,16 +133,17 @@ TEST(ConfMaxDisks, IsTheNumberThatTheValueBeginsWith)
         const RUN_RESULT result = MachineCall(MachineWithConf("maxdisks=" + row.value), [&row] {
             EXPECT_EQ(NLIBCConfMaxDisksGet(), row.number);
         });
-        EXPECT_EQ(LogText(result), row.fFound ? "" : MAX_DISKS_FAILED);
+        ExpectSteps(result, row.fFound ? STEPS{} : MAX_DISKS_FAILED);
     }
 }
 
 TEST(ConfMaxDisks, IsZeroAndLoggedWithoutKeyOrFile)
 {
-    const auto ask = [] { EXPECT_EQ(NLIBCConfMaxDisksGet(), 0); };
-    EXPECT_EQ(LogText(MachineCall(MachineWithConf("#maxdisks=4\n"), ask)), MAX_DISKS_FAILED);
-    EXPECT_EQ(LogText(MachineCall(MachineWithConf("MAXDISKS=4\n"), ask)), MAX_DISKS_FAILED);
-    EXPECT_EQ(LogText(MachineCall(MachineWithoutConf(), ask)), MAX_DISKS_FAILED);
+    for (const MACHINE &machine : {MachineWithConf("#maxdisks=4\n"),
+                                   MachineWithConf("MAXDISKS=4\n"), MachineWithoutConf()}) {
+        ExpectSteps(MachineCall(machine, [] { EXPECT_EQ(NLIBCConfMaxDisksGet(), 0); }),
+                    MAX_DISKS_FAILED);
+    }
 }
 
 TEST(ConfMaxDisks, IsReadAnewOnEveryCall)
@@ -187,9 +170,9 @@ TEST(ConfMaxSysRaidDisks, FallsBackToTheNumberOfDisksWhenItHasNoValue)
 TEST(ConfMaxSysRaidDisks, LogsTheFailedFallbackOnly)
 {
     const auto ask = [] { EXPECT_EQ(NLIBCConfMaxSysRaidDisksGet(), 0); };
-    EXPECT_EQ(LogText(MachineCall(MachineWithConf(""), ask)), MAX_DISKS_FAILED);
-    EXPECT_EQ(LogText(MachineCall(MachineWithoutConf(), ask)), MAX_DISKS_FAILED);
-    EXPECT_EQ(LogText(MachineCall(MachineWithConf("max_sys_raid_disks=0\n"), ask)), "");
+    ExpectSteps(MachineCall(MachineWithConf(""), ask), MAX_DISKS_FAILED);
+    ExpectSteps(MachineCall(MachineWithoutConf(), ask), MAX_DISKS_FAILED);
+    QuietCall(MachineWithConf("max_sys_raid_disks=0\n"), ask);
 }
 
 constexpr char MARKER[] = "/tmp/.dualhead";
@@ -280,56 +263,56 @@ TEST(ConfSupportDualHead, BelievesAMarkerWithoutAskingTheModel)
 
 TEST(ConfSupportDualHead, TakesAnythingThatIsThereForAMarker)
 {
-    MACHINE folder = MachineWithoutConf();
-    MachineFolder(folder, MARKER);
-    EXPECT_EQ(LogText(MachineCall(folder, [] { EXPECT_EQ(NLIBCConfSupportDualHead(), 1); })), "");
-
-    MACHINE folderNot = MachineWithoutConf();
-    MachineFolder(folderNot, MARKER_NOT);
-    EXPECT_EQ(LogText(MachineCall(folderNot, [] { EXPECT_EQ(NLIBCConfSupportDualHead(), 0); })),
-              "");
+    for (const bool fDual : {true, false}) {
+        MACHINE machine = MachineWithoutConf();
+        MachineFolder(machine, fDual ? MARKER : MARKER_NOT);
+        QuietCall(machine, [fDual] { EXPECT_EQ(NLIBCConfSupportDualHead(), fDual ? 1 : 0); });
+    }
 }
 
 TEST(ConfSupportDualHead, IsAskedOnceInAProcess)
 {
-    QuietCall(MachineWithConf("support_dual_head=yes\n"), [] {
-        EXPECT_EQ(NLIBCConfSupportDualHead(), 1);
-        EXPECT_EQ(unlink(MARKER), 0);
-        ConfRewrite("support_dual_head=no\n");
-        EXPECT_EQ(NLIBCConfSupportDualHead(), 1);
-        EXPECT_FALSE(IsMarked(MARKER));
-        EXPECT_FALSE(IsMarked(MARKER_NOT));
-    });
-
-    QuietCall(MachineWithConf("support_dual_head=no\n"), [] {
-        EXPECT_EQ(NLIBCConfSupportDualHead(), 0);
-        EXPECT_EQ(unlink(MARKER_NOT), 0);
-        ConfRewrite("support_dual_head=yes\n");
-        EXPECT_EQ(NLIBCConfSupportDualHead(), 0);
-        EXPECT_FALSE(IsMarked(MARKER));
-        EXPECT_FALSE(IsMarked(MARKER_NOT));
-    });
+    const std::string yes = "support_dual_head=yes\n";
+    const std::string no = "support_dual_head=no\n";
+    for (const bool fDual : {true, false}) {
+        QuietCall(MachineWithConf(fDual ? yes : no), [&] {
+            EXPECT_EQ(NLIBCConfSupportDualHead(), fDual ? 1 : 0);
+            EXPECT_EQ(unlink(fDual ? MARKER : MARKER_NOT), 0);
+            ConfRewrite(fDual ? no : yes);
+            EXPECT_EQ(NLIBCConfSupportDualHead(), fDual ? 1 : 0);
+            EXPECT_FALSE(IsMarked(MARKER));
+            EXPECT_FALSE(IsMarked(MARKER_NOT));
+        });
+    }
 }
 
 TEST(ConfSupportDualHead, AnswersAllTheSameWhenNoMarkerCanBeLeft)
 {
-    MACHINE machine = MachineWithConf("support_dual_head=yes\n");
-    MachineLink(machine, MARKER, "/no/such/file");
-    MachineLink(machine, MARKER_NOT, "/no/such/file");
-    const RUN_RESULT result = MachineCall(machine, [] {
-        EXPECT_EQ(NLIBCConfSupportDualHead(), 1);
-        EXPECT_EQ(NLIBCConfSupportDualHead(), 1);
-    });
-    EXPECT_EQ(LogText(result),
-              "<11>file.cpp:# file exist: /tmp/.dualhead, errno=No such file or directory\n"
-              "<11>conf.cpp:# Failed to touch '/tmp/.dualhead'\n");
-
-    MachineConf(machine, "support_dual_head=no\n");
-    const RUN_RESULT resultNot =
-        MachineCall(machine, [] { EXPECT_EQ(NLIBCConfSupportDualHead(), 0); });
-    EXPECT_EQ(LogText(resultNot),
-              "<11>file.cpp:# file exist: /tmp/.not.dualhead, errno=No such file or directory\n"
-              "<11>conf.cpp:# Failed to touch '/tmp/.not.dualhead'\n");
+    const struct {
+        const char *szConf;
+        int result;
+        STEPS steps;
+    } rows[] = {
+        {"support_dual_head=yes\n",
+         1,
+         {{"<11>file.cpp:# file exist: /tmp/.dualhead, errno=No such file or directory"},
+          {"<11>conf.cpp:# Failed to touch '/tmp/.dualhead'"}}},
+        {"support_dual_head=no\n",
+         0,
+         {{"<11>file.cpp:# file exist: /tmp/.not.dualhead, errno=No such file or directory"},
+          {"<11>conf.cpp:# Failed to touch '/tmp/.not.dualhead'"}}},
+    };
+    for (const auto &row : rows) {
+        MACHINE machine = MachineWithConf(row.szConf);
+        MachineLink(machine, MARKER, "/no/such/file");
+        MachineLink(machine, MARKER_NOT, "/no/such/file");
+        ExpectSteps(MachineCall(machine,
+                                [&row] {
+                                    EXPECT_EQ(NLIBCConfSupportDualHead(), row.result);
+                                    EXPECT_EQ(NLIBCConfSupportDualHead(), row.result);
+                                }),
+                    row.steps);
+    }
 }
 
 TEST(ConfSupportDualHead, IsNoMoreAMarkerWhenItsLinkLeadsNowhere)

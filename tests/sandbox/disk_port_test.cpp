@@ -197,15 +197,6 @@ TEST(ExternalDiskPortCheck, ClassifiesByTheMasksOfTheModel)
     }
 }
 
-TEST(ExternalDiskPortCheck, RefusesNull)
-{
-    ExpectCalls({{.szName = "null",
-                  .machine = MachineWithConf("usbportcfg=1\n"),
-                  .call = [] { return ExternalDiskPortCheck(nullptr); },
-                  .result = UNKNOWN_DEVICE,
-                  .steps = {{"<11>disk_port.cpp:# device path should not be NULL"}}}});
-}
-
 // Behind "/dev" stands no further slash to look behind.
 TEST(ExternalDiskPortCheck, KnowsNoOtherNames)
 {
@@ -262,8 +253,6 @@ TEST(ExternalDiskPortCheckName, TakesBareNamesAsTheyAre)
         EXPECT_EQ(ExternalDiskPortCheckName("nuroboot"), UNKNOWN_DEVICE);
         EXPECT_EQ(ExternalDiskPortCheckName("mmcblk0"), UNKNOWN_DEVICE);
         EXPECT_EQ(ExternalDiskPortCheckName("/dev/sda"), UNKNOWN_DEVICE);
-        EXPECT_EQ(ExternalDiskPortCheckName(nullptr), UNKNOWN_DEVICE);
-        EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
     });
     ExpectSteps(result, NoMatch("nuroboot") + NoMatch("mmcblk0") + NoMatch("/dev/sda"));
 }
@@ -435,18 +424,6 @@ TEST(ExternalDiskPortEnumEunit, FailsWhereHostsCannotBeListed)
             EXPECT_STREQ(szOut, "");
         });
     }
-}
-
-TEST(ExternalDiskPortEnumEunit, RefusesNull)
-{
-    MACHINE machine = MachineMake();
-    UnitAdd(machine, "host0", "/dev/sdga");
-    QuietCall(machine, [] {
-        char szOut[8] = "x";
-        EXPECT_FAILS(ExternalDiskPortEnumEunit(0, nullptr, 1024), -1, ERR_BAD_PARAMETER);
-        EXPECT_FAILS(ExternalDiskPortEnumEunit(0, szOut, 0), -1, ERR_BAD_PARAMETER);
-        EXPECT_STREQ(szOut, "x");
-    });
 }
 
 TEST(ExternalDiskPortEnumEunit, ListsOnlyWhatOpensWhenAsked)
@@ -755,17 +732,6 @@ TEST(ExternalDiskPortEnum, LeavesTheListAloneWhereNoDiskIs)
             NLIBCSzListFree(pList);
         });
     }
-}
-
-TEST(ExternalDiskPortEnum, RefusesNull)
-{
-    const RUN_RESULT result = MachineCall(MachineWithDisks(), [] {
-        PNLIBSZLIST pList = nullptr;
-        EXPECT_EQ(ExternalDiskPortEnum(INTERNAL_DEVICE, nullptr), -1);
-        EXPECT_EQ(ExternalDiskPortEnum(INTERNAL_DEVICE, &pList), -1);
-        EXPECT_EQ(ExternalDiskPortEnum(OTHER_DEVICE, nullptr), -1);
-    });
-    ExpectSteps(result, 3 * STEPS{{"<11>disk_port.cpp:# device name list can not be NULL"}});
 }
 
 TEST(IsSupportSas, IsAskedOnceInAProcess)

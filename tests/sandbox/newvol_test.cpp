@@ -1,9 +1,10 @@
 // SPDX-License-Identifier: MIT
-#include "steps.h"
 #include "storage_machine.h"
 
 #include <cerrno>
+#include <cstddef>
 #include <gtest/gtest.h>
+#include <ostream>
 #include <string>
 #include <vector>
 
@@ -14,186 +15,175 @@ constexpr char USAGE[] = "usage:\n\tarrayctl destroy <RAID ID> \n\tarrayctl stat
                          "\tarrayctl newvol \n\tarrayctl initsys \n\tarrayctl initsys-dd \n";
 constexpr char NO_DISK[] = "No disk to create RAID... \n";
 constexpr char CREATING_1[] = "Creating RAID 1 volume... \n";
+constexpr char CREATING_5[] = "Creating RAID 5 volume... \n";
 
-struct DATA_PARTITION {
-    std::string szGap = "-j260352"; // the newest layout's, whatever the disk has
-    std::string szType = "-tfd";
-};
+// The newest layout's gap, whatever the disk has.
+constexpr char DATA_8[] = "-j260352 -z-1 -tfd";
 
-std::string CleanText(const std::string &szDisk)
+STEPS Renewed(const std::string &szDisk, const std::string &szMade = DATA_8,
+              const TOOL_ANSWER &answer = {})
 {
-    return "/sbin/sfdisk --fast-delete 3:128 /dev/" + szDisk + "\n/sbin/sfdisk -M1 /dev/" + szDisk +
-           "\n";
+    return StepsOn(szDisk,
+                   Cleaned(RANGE_DATA) +
+                       STEPS{{"/sbin/sfdisk -N3 \"\" -uS -q -f " + szMade + " -F /dev/@", answer}});
 }
 
-std::string RenewText(const std::string &szDisk, const DATA_PARTITION &made = {})
+STEPS RenewedAll(const std::vector<std::string> &disks)
 {
-    return CleanText(szDisk) + "/sbin/sfdisk -N3 \"\" -uS -q -f " + made.szGap + " -z-1 " +
-           made.szType + " -F /dev/" + szDisk + "\n";
+    STEPS steps;
+    for (const std::string &szDisk : disks) {
+        steps = steps + Renewed(szDisk);
+    }
+    return steps;
 }
 
-void CleanExpect(MACHINE &machine, const std::string &szDisk)
-{
-    MachineTool(machine, "/sbin/sfdisk --fast-delete 3:128 /dev/" + szDisk);
-    MachineTool(machine, "/sbin/sfdisk -M1 /dev/" + szDisk);
-}
-
-void CreateExpect(MACHINE &machine, const std::string &szDisk, const DATA_PARTITION &made = {},
-                  const TOOL_ANSWER &answer = {})
-{
-    MachineTool(machine,
-                {"/sbin/sfdisk", "-N3", "", "-uS", "-q", "-f", made.szGap, "-z-1", made.szType,
-                 "-F", "/dev/" + szDisk},
-                answer);
-}
-
-void DataDiskAdd(MACHINE &machine, const std::string &szDisk, const DATA_PARTITION &made = {})
-{
-    MachineDiskAdd(machine, szDisk);
-    CleanExpect(machine, szDisk);
-    CreateExpect(machine, szDisk, made);
-}
-
-MACHINE MachineWithDisks(const std::string &szConf, const std::vector<std::string> &disks)
+MACHINE BlankDisks(const std::vector<std::string> &disks, const std::string &szConf = CONF_RAID)
 {
     MACHINE machine = MachineWithConf(szConf);
     for (const std::string &szDisk : disks) {
-        DataDiskAdd(machine, szDisk);
+        MachineDiskAdd(machine, szDisk);
     }
-    ShellWatch(machine);
     return machine;
 }
 
-std::string MembersText(const std::vector<std::string> &disks)
-{
-    std::string szText;
-    for (const std::string &szDisk : disks) {
-        szText += "/dev/" + szDisk + "3 ";
-    }
-    return szText;
-}
-
-std::string RenewAllText(const std::vector<std::string> &disks)
-{
-    std::string szText;
-    for (const std::string &szDisk : disks) {
-        szText += RenewText(szDisk);
-    }
-    return szText;
-}
-
-std::vector<std::string> FirstDisks(size_t nDisk)
-{
-    const std::vector<std::string> all = {"sda", "sdb", "sdc", "sdd"};
-    return {all.begin(), all.begin() + static_cast<std::ptrdiff_t>(nDisk)};
-}
+constexpr char ARRAY_OF_ONE[] = "/sbin/mdadm -C /dev/md2 -amd -R -l1 -f -n1 /dev/sda3";
 
 // ---- which array -------------------------------------------------------------------------------
+
+const std::vector<std::string> ABCD = {"sda", "sdb", "sdc", "sdd"};
 
 struct ARRAY_CASE {
     size_t nDisk;
     std::vector<std::string> markers;
-    int level;
-    std::string szShell; // between the level and the members
+    const char *szLevel;
+    const char *szShell; // between the level and the members
+    const char *szArray; // the same as words, with the members
 };
 
 const ARRAY_CASE ARRAY_CASES[] = {
-    {1, {}, 1, " -f -n1 "},
-    {2, {}, 1, "  -n2 "},
-    {3, {}, 5, "  -n3 "},
-    {4, {}, 5, "  -n4 "},
-    {1, {"/tmp/raid.0"}, 0, " -f -n1 "},
-    {2, {"/tmp/raid.0"}, 0, "  -n2 "},
-    {4, {"/tmp/raid.0"}, 0, "  -n4 "},
-    {1, {"/tmp/raid.1"}, 1, " -f -n1 "},
-    {4, {"/tmp/raid.1"}, 1, "  -n4 "},
-    {1, {"/tmp/raid.5"}, 5, " -f -n1 "},
-    {2, {"/tmp/raid.5"}, 5, "  -n2 "},
-    {4, {"/tmp/raid.5"}, 5, "  -n4 "},
-    {4, {"/tmp/raid.1", "/tmp/raid.5"}, 1, "  -n4 "},
-    {4, {"/tmp/raid.0", "/tmp/raid.5"}, 0, "  -n4 "},
-    {4, {"/tmp/raid.0", "/tmp/raid.1", "/tmp/raid.5"}, 0, "  -n4 "},
-    {3, {"/tmp/raid.6", "/tmp/raid.10"}, 5, "  -n3 "},
+    {1, {}, "1", " -f -n1 ", "-f -n1 /dev/sda3"},
+    {2, {}, "1", "  -n2 ", "-n2 /dev/sda3 /dev/sdb3"},
+    {3, {}, "5", "  -n3 ", "-n3 /dev/sda3 /dev/sdb3 /dev/sdc3"},
+    {4, {}, "5", "  -n4 ", "-n4 /dev/sda3 /dev/sdb3 /dev/sdc3 /dev/sdd3"},
+    {1, {"/tmp/raid.0"}, "0", " -f -n1 ", "-f -n1 /dev/sda3"},
+    {2, {"/tmp/raid.0"}, "0", "  -n2 ", "-n2 /dev/sda3 /dev/sdb3"},
+    {4, {"/tmp/raid.0"}, "0", "  -n4 ", "-n4 /dev/sda3 /dev/sdb3 /dev/sdc3 /dev/sdd3"},
+    {1, {"/tmp/raid.1"}, "1", " -f -n1 ", "-f -n1 /dev/sda3"},
+    {4, {"/tmp/raid.1"}, "1", "  -n4 ", "-n4 /dev/sda3 /dev/sdb3 /dev/sdc3 /dev/sdd3"},
+    {1, {"/tmp/raid.5"}, "5", " -f -n1 ", "-f -n1 /dev/sda3"},
+    {2, {"/tmp/raid.5"}, "5", "  -n2 ", "-n2 /dev/sda3 /dev/sdb3"},
+    {4, {"/tmp/raid.5"}, "5", "  -n4 ", "-n4 /dev/sda3 /dev/sdb3 /dev/sdc3 /dev/sdd3"},
+    {4,
+     {"/tmp/raid.1", "/tmp/raid.5"},
+     "1",
+     "  -n4 ",
+     "-n4 /dev/sda3 /dev/sdb3 /dev/sdc3 /dev/sdd3"},
+    {4,
+     {"/tmp/raid.0", "/tmp/raid.5"},
+     "0",
+     "  -n4 ",
+     "-n4 /dev/sda3 /dev/sdb3 /dev/sdc3 /dev/sdd3"},
+    {4,
+     {"/tmp/raid.0", "/tmp/raid.1", "/tmp/raid.5"},
+     "0",
+     "  -n4 ",
+     "-n4 /dev/sda3 /dev/sdb3 /dev/sdc3 /dev/sdd3"},
+    {3, {"/tmp/raid.6", "/tmp/raid.10"}, "5", "  -n3 ", "-n3 /dev/sda3 /dev/sdb3 /dev/sdc3"},
 };
 
 TEST(Newvol, MakesTheDataArrayOfTheInternalDisks)
 {
+    constexpr char MEMBERS[] = "/dev/sda3 /dev/sdb3 /dev/sdc3 /dev/sdd3 ";
+    constexpr size_t MEMBER_LENGTH = 10;
     for (const ARRAY_CASE &row : ARRAY_CASES) {
-        SCOPED_TRACE(testing::Message() << row.nDisk << " disks, level " << row.level);
-        const std::vector<std::string> disks = FirstDisks(row.nDisk);
-        MACHINE machine = MachineWithDisks(CONF_RAID, disks);
+        SCOPED_TRACE(testing::Message() << row.nDisk << " disks, level " << row.szLevel);
+        const std::vector<std::string> disks(ABCD.begin(),
+                                             ABCD.begin() + static_cast<std::ptrdiff_t>(row.nDisk));
+        MACHINE machine = BlankDisks(disks);
         for (const std::string &szMarker : row.markers) {
             MachineFile(machine, szMarker, "");
         }
-        MachineTool(machine, "/sbin/mdadm -C /dev/md2 ...");
-        const RUN_RESULT result = RunEnds(
-            machine, {"newvol"}, 0, "Creating RAID " + std::to_string(row.level) + " volume... \n");
-        const std::string szForced = row.nDisk == 1 ? " -f" : "";
-        std::string szMembers = MembersText(disks);
-        EXPECT_EQ(ShellText(), "/sbin/mdadm -C /dev/md2 -amd -R -l" + std::to_string(row.level) +
-                                   row.szShell + szMembers + "> /dev/null 2>&1\n");
-        szMembers.pop_back();
-        EXPECT_EQ(TranscriptText(result), RenewAllText(disks) +
-                                              "/sbin/mdadm -C /dev/md2 -amd -R -l" +
-                                              std::to_string(row.level) + szForced + " -n" +
-                                              std::to_string(row.nDisk) + " " + szMembers + "\n");
-        EXPECT_EQ(LogText(result), "");
+        ShellWatch(machine);
+        const std::string szArray = std::string("/sbin/mdadm -C /dev/md2 -amd -R -l") + row.szLevel;
+        ExpectRun({.szName = row.szArray,
+                   .machine = machine,
+                   .arguments = {"newvol"},
+                   .szOut = std::string("Creating RAID ") + row.szLevel + " volume... \n",
+                   .steps = RenewedAll(disks) + STEPS{{szArray + " " + row.szArray}}});
+        EXPECT_EQ(ShellText(), szArray + row.szShell +
+                                   std::string(MEMBERS, row.nDisk * MEMBER_LENGTH) +
+                                   "> /dev/null 2>&1\n");
         for (const std::string &szMarker : row.markers) {
             EXPECT_EQ(MachineFileRead(szMarker), "");
         }
     }
 }
 
-// Nobody can read it: to the one who runs the tool it is no marker.
-TEST(Newvol, WantsAMarkerThatCanBeRead)
+struct RUN_AND_STEPS {
+    const char *szName;
+    MACHINE machine;
+    STEPS steps;
+    std::string szOut = CREATING_1;
+    int status = 0;
+    std::vector<std::string> arguments = {"newvol"};
+};
+
+void PrintTo(const RUN_AND_STEPS &row, std::ostream *pStream)
 {
-    MACHINE machine = MachineWithDisks(CONF_RAID, FirstDisks(1));
-    MachineLink(machine, "/tmp/raid.0", "/no/such/file");
-    MachineFolder(machine, "/tmp/raid.5");
-    MachineTool(machine, "/sbin/mdadm -C /dev/md2 ...");
-    const RUN_RESULT result = MachineRun(machine, {"newvol"});
-    EXPECT_EQ(result.szOut, "Creating RAID 5 volume... \n");
+    *pStream << row.szName;
 }
 
-TEST(Newvol, LeavesOtherPortsAlone)
+struct NewvolRuns : testing::TestWithParam<RUN_AND_STEPS> {
+};
+
+TEST_P(NewvolRuns, Once)
 {
-    MACHINE machine = MachineWithDisks(CONF_RAID, {"sdb"});
-    for (const char *const szOther : {"sde", "sdg", "sdh", "mmcblk0", "nuroboot"}) {
-        MachineDiskAdd(machine, szOther);
-    }
-    MachineTool(machine, "/sbin/mdadm -C /dev/md2 -amd -R -l1 -f -n1 /dev/sdb3");
-    RunEnds(machine, {"newvol"}, 0);
+    const RUN_AND_STEPS &row = GetParam();
+    ExpectRun({row.szName, row.machine, row.arguments, row.szOut, row.status, row.steps});
 }
 
-// A disk's own layout is no matter, nor is an array on it.
-TEST(Newvol, GivesEveryDiskTheNewestGap)
-{
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    PartitionedDiskAdd(machine, "sda", PLACES_6);
-    CleanExpect(machine, "sda");
-    CreateExpect(machine, "sda");
-    SystemArrayAdd(machine, {{"sda1"}});
-    MachineTool(machine, "/sbin/mdadm -C /dev/md2 -amd -R -l1 -f -n1 /dev/sda3");
-    RunEnds(machine, {"newvol"}, 0);
-}
+// USB, eSATA, none, card, boot
+const std::vector<std::string> OTHER_PORTS = {"sdb", "sde", "sdg", "sdh", "mmcblk0", "nuroboot"};
 
-TEST(Newvol, TakesTypeAndGapOfTheModel)
-{
-    struct {
-        std::string szConf;
-        DATA_PARTITION made;
-    } const cases[] = {
-        {CONF_NO_RAID, {.szType = "-t83"}},
-        {CONF_BUILDIN, {.szGap = "-j524288", .szType = "-t83"}},
-    };
-    for (const auto &row : cases) {
-        MACHINE machine = MachineWithConf(row.szConf);
-        DataDiskAdd(machine, "sda", row.made);
-        MachineTool(machine, "/sbin/mdadm -C /dev/md2 -amd -R -l1 -f -n1 /dev/sda3");
-        const RUN_RESULT result = RunEnds(machine, {"newvol"}, 0);
-        EXPECT_EQ(CommandsOn(result, "sda"), RenewText("sda", row.made));
-    }
-}
+const RUN_AND_STEPS MODEL_CASES[] = {
+    // Nobody can read the first: to the one who runs the tool it is no marker.
+    {"WantsAMarkerThatCanBeRead",
+     With(BlankDisks({"sda"}),
+          [](MACHINE &machine) {
+              MachineLink(machine, "/tmp/raid.0", "/no/such/file");
+              MachineFolder(machine, "/tmp/raid.5");
+          }),
+     Renewed("sda") + STEPS{{"/sbin/mdadm -C /dev/md2 -amd -R -l5 -f -n1 /dev/sda3"}}, CREATING_5},
+    {"LeavesOtherPortsAlone", BlankDisks(OTHER_PORTS),
+     Renewed("sdb") + STEPS{{"/sbin/mdadm -C /dev/md2 -amd -R -l1 -f -n1 /dev/sdb3"}}},
+    // A disk's own layout is no matter, nor is an array on it.
+    {"GivesEveryDiskTheNewestGap",
+     With(MachineOfDisks({{"sda", PLACES_6}}),
+          [](MACHINE &machine) { SystemArrayAdd(machine, {{"sda1"}}); }),
+     Renewed("sda") + STEPS{{ARRAY_OF_ONE}}},
+    {"TakesTheTypeOfTheModel", BlankDisks({"sda"}, CONF_NO_RAID),
+     Renewed("sda", "-j260352 -z-1 -t83") + STEPS{{ARRAY_OF_ONE}}},
+    {"TakesTheGapOfTheModel", BlankDisks({"sda"}, CONF_BUILDIN),
+     Renewed("sda", "-j524288 -z-1 -t83") + STEPS{{ARRAY_OF_ONE}}},
+    {"SaysThatThereIsNoDisk", BlankDisks({"sde"}), {}, NO_DISK, 1}, // USB
+    {"SaysThatThereIsNoDiskOfAUnit", BlankDisks({"sde"}, CONF_DUAL_HEAD), {}, NO_DISK, 1},
+    {"FailsWithoutTheInternalDisks",
+     WithFault(MachineWithConf(CONF_RAID), {.szFunction = "glob", .error = EIO}),
+     {{"fault glob 1"},
+      {"<11>disk_port.cpp:# read error :/sys/block/sd*"},
+      {"<11>arrayctl.cpp:# Failed to enum INTERNAL_DEVICE"}},
+     "",
+     1},
+    {"FailsWithoutTheUnitsDisks",
+     WithFault(MachineWithConf(CONF_DUAL_HEAD), {.szFunction = "glob", .error = EIO}),
+     {{"fault glob 1"},
+      {"<11>disk_port.cpp:# read error :/sys/block/sd*"},
+      {"<11>arrayctl.cpp:# Failed to enum EUNIT_DEVICE"}},
+     "",
+     1},
+};
+
+INSTANTIATE_TEST_SUITE_P(, NewvolRuns, testing::ValuesIn(MODEL_CASES), ROW_NAME());
 
 // ---- refusals ----------------------------------------------------------------------------------
 
@@ -210,46 +200,15 @@ TEST(Newvol, AnswersFurtherArgumentsWithTheUsage)
     }
 }
 
-TEST(Newvol, SaysThatThereIsNoDisk)
-{
-    for (const std::string &szConf : {CONF_RAID, CONF_DUAL_HEAD}) {
-        MACHINE machine = MachineWithConf(szConf);
-        MachineDiskAdd(machine, "sde"); // USB
-        const RUN_RESULT result = RunEnds(machine, {"newvol"}, 1, NO_DISK);
-        EXPECT_EQ(OrderText(result), "");
-    }
-}
-
-struct ENUM_CASE {
-    std::string szConf;
-    const char *szDevices;
-};
-
-TEST(Newvol, FailsWhenTheDisksCannotBeEnumerated)
-{
-    const ENUM_CASE CASES[] = {{CONF_RAID, "INTERNAL_DEVICE"},
-                                   {CONF_DUAL_HEAD, "EUNIT_DEVICE"}};
-    for (const ENUM_CASE &row : CASES) {
-        MACHINE machine = MachineWithConf(row.szConf);
-        machine.faults = {{.szFunction = "glob", .nCall = 1, .error = EIO}};
-        const RUN_RESULT result = RunEnds(machine, {"newvol"}, 1, "");
-        EXPECT_EQ(LogText(result), "<11>disk_port.cpp:# read error :/sys/block/sd*\n"
-                                   "<11>arrayctl.cpp:# Failed to enum " +
-                                       std::string(row.szDevices) + "\n");
-    }
-}
-
 // Whichever call it is that asks for the list's memory; the arguments are looked at before it.
 TEST(Newvol, FailsWithoutMemoryForTheList)
 {
-    constexpr char NO_LIST[] = "<11>arrayctl.cpp:# Out of memeory, failed to allocate memory for "
-                               "PNLIBSZLIST via NLIBCSzListAlloc\n";
     bool fSeen = false;
     for (const char *const szFunction : {"malloc", "calloc"}) {
         MACHINE machine = MachineWithConf(CONF_RAID);
         machine.faults = {{.szFunction = szFunction, .nCall = 1, .error = ENOMEM}};
         const RUN_RESULT result = MachineRun(machine, {"newvol"});
-        if (LogText(result) != NO_LIST) {
+        if (LogText(result) != NO_MEMORY_FOR_LIST) {
             continue;
         }
         fSeen = true;
@@ -261,25 +220,6 @@ TEST(Newvol, FailsWithoutMemoryForTheList)
 }
 
 // ---- commands that fail ------------------------------------------------------------------------
-
-struct FAILURE_CASE {
-    const char *szName;
-    MACHINE machine;
-    STEPS steps;
-    std::string szOut = "";
-    int status = 1;
-};
-
-STEPS Cleaned(const std::string &szDisk)
-{
-    return {{"/sbin/sfdisk --fast-delete 3:128 /dev/" + szDisk},
-            {"/sbin/sfdisk -M1 /dev/" + szDisk}};
-}
-
-STEP Created(const std::string &szDisk, const TOOL_ANSWER &answer = {})
-{
-    return {"/sbin/sfdisk -N3 \"\" -uS -q -f -j260352 -z-1 -tfd -F /dev/" + szDisk, answer};
-}
 
 STEPS CleaningFailed(const std::string &szDisk)
 {
@@ -298,71 +238,51 @@ STEP CreateFailed(const std::string &szDisk)
             szDisk + "], err=256"};
 }
 
-// Blank disks of a model with, and of one without the key of the second head.
-MACHINE BlankDisks(const std::vector<std::string> &disks, const char *szMore = "")
-{
-    MACHINE machine = MachineWithConf(CONF_RAID + szMore);
-    for (const std::string &szDisk : disks) {
-        MachineDiskAdd(machine, szDisk);
-    }
-    return machine;
-}
-
-constexpr char ONE_HEAD[] = "support_dual_head=no\ncacheportcfg=0x0\n";
-constexpr char ARRAY_OF_ONE[] = "/sbin/mdadm -C /dev/md2 -amd -R -l1 -f -n1 /dev/sda3";
+// All keys that are asked are there, so no lookup has left a code before.
+const std::string CONF_ONE_HEAD = CONF_RAID + "support_dual_head=no\ncacheportcfg=0x0\n";
 
 STEP ArrayFailed(const std::string &szCode)
 {
     return {"<11>arrayctl.cpp:# Failed to create RAID '/dev/md2' on '/dev/sda3 ', errno=" + szCode};
 }
 
-TEST(NewvolFails, AtTheFirstDiskOrWithTheArray)
+const STEPS MADE = Renewed("sda");
+const TOOL_ANSWER FAILED = {.status = 1};
+
+RUN_AND_STEPS ArrayFails(const char *szName, const TOOL_ANSWER &answer, const std::string &szCode)
 {
-    const STEPS made = Cleaned("sda") + STEPS{Created("sda")};
-    MACHINE killed = BlankDisks({"sda"});
-    ShellKill(killed);
-    const FAILURE_CASE cases[] = {
-        {"the second disk", BlankDisks({"sda", "sdb", "sdc"}, ONE_HEAD),
-         made + Cleaned("sdb") +
-             STEPS{Created("sdb", {.szErr = "does not fit\n", .status = 1}),
-                   CreateFailed("sdb"),
-                   {"<11>arrayctl.cpp:# Failed to create data partition of /dev/sdb, errno=0x0"}}},
-        // The lookup of the second head found no such key.
-        {"the code that stands", BlankDisks({"sda"}),
-         Cleaned("sda") + STEPS{Created("sda", {.status = 1}),
-                                CreateFailed("sda"),
-                                {"<11>arrayctl.cpp:# Failed to create data partition of /dev/sda, "
-                                 "errno=0x2000"}}},
-        {"no array tool", WithTool(BlankDisks({"sda"}), "/sbin/mdadm", TOOL_KIND::MISSING),
-         made + STEPS{ArrayFailed("127")}, CREATING_1},
-        {"no shell", WithFault(BlankDisks({"sda"}), {.szFunction = "system", .error = EAGAIN}),
-         made + STEPS{{"fault system 1"}, ArrayFailed("255")}, CREATING_1},
-        {"status 1", BlankDisks({"sda"}),
-         made + STEPS{{ARRAY_OF_ONE, {.szOut = "noise\n", .szErr = "noise\n", .status = 1}},
-                      ArrayFailed("1")},
-         CREATING_1},
-        {"status 2", BlankDisks({"sda"}),
-         made + STEPS{{ARRAY_OF_ONE, {.status = 2}}, ArrayFailed("2")}, CREATING_1},
-        {"status 127", BlankDisks({"sda"}),
-         made + STEPS{{ARRAY_OF_ONE, {.status = 127}}, ArrayFailed("127")}, CREATING_1},
-        {"status 255", BlankDisks({"sda"}),
-         made + STEPS{{ARRAY_OF_ONE, {.status = 255}}, ArrayFailed("255")}, CREATING_1},
-        // Its exit status is that of the bits 8 to 15, and a signal stands below them.
-        {"not when the shell is killed", killed, made, CREATING_1, 0},
-        {"not when partitions cannot be deleted", BlankDisks({"sda", "sdb"}),
-         CleaningFailed("sda") + STEPS{Created("sda")} + CleaningFailed("sdb") +
-             STEPS{Created("sdb"), {"/sbin/mdadm -C /dev/md2 -amd -R -l1 -n2 /dev/sda3 /dev/sdb3"}},
-         CREATING_1, 0},
-    };
-    for (const FAILURE_CASE &row : cases) {
-        (void)ExpectRun({.szName = row.szName,
-                         .machine = row.machine,
-                         .arguments = {"newvol"},
-                         .szOut = row.szOut,
-                         .status = row.status,
-                         .steps = row.steps});
-    }
+    return {szName, BlankDisks({"sda"}), MADE + STEPS{{ARRAY_OF_ONE, answer}, ArrayFailed(szCode)},
+            CREATING_1, 1};
 }
+
+const RUN_AND_STEPS FAILURE_CASES[] = {
+    {"AtTheSecondDisk", BlankDisks({"sda", "sdb", "sdc"}, CONF_ONE_HEAD),
+     MADE + Renewed("sdb", DATA_8, {.szErr = "does not fit\n", .status = 1}) +
+         STEPS{CreateFailed("sdb"),
+               {"<11>arrayctl.cpp:# Failed to create data partition of /dev/sdb, errno=0x0"}},
+     "", 1},
+    // The lookup of the second head found no such key.
+    {"WithTheCodeThatStands", BlankDisks({"sda"}),
+     Renewed("sda", DATA_8, FAILED) +
+         STEPS{CreateFailed("sda"),
+               {"<11>arrayctl.cpp:# Failed to create data partition of /dev/sda, errno=0x2000"}},
+     "", 1},
+    {"WithoutAnArrayTool", WithTool(BlankDisks({"sda"}), "/sbin/mdadm", TOOL_KIND::MISSING),
+     MADE + STEPS{ArrayFailed("127")}, CREATING_1, 1},
+    {"WithoutAShell", WithFault(BlankDisks({"sda"}), {.szFunction = "system", .error = EAGAIN}),
+     MADE + STEPS{{"fault system 1"}, ArrayFailed("255")}, CREATING_1, 1},
+    ArrayFails("WithTheArraysStatus", {.szOut = "noise\n", .szErr = "noise\n", .status = 1}, "1"),
+    ArrayFails("WithTheArraysStatus2", {.status = 2}, "2"),
+    ArrayFails("WithTheArraysStatus127", {.status = 127}, "127"),
+    ArrayFails("WithTheArraysStatus255", {.status = 255}, "255"),
+    // Its exit status is that of the bits 8 to 15, and a signal stands below them.
+    {"NotWhenTheShellIsKilled", With(BlankDisks({"sda"}), ShellKill), MADE},
+    {"NotWhenPartitionsCannotBeDeleted", BlankDisks({"sda", "sdb"}),
+     CleaningFailed("sda") + STEPS{MADE[2]} + CleaningFailed("sdb") +
+         STEPS{Renewed("sdb")[2], {"/sbin/mdadm -C /dev/md2 -amd -R -l1 -n2 /dev/sda3 /dev/sdb3"}}},
+};
+
+INSTANTIATE_TEST_SUITE_P(Fails, NewvolRuns, testing::ValuesIn(FAILURE_CASES), ROW_NAME());
 
 TEST(NewvolFails, WithoutARowForTheModel)
 {
@@ -370,7 +290,7 @@ TEST(NewvolFails, WithoutARowForTheModel)
                                       "support_dual_head=no\nusbportcfg=0x30\n"
                                       "internalportcfg=0xf\n");
     MachineDiskAdd(machine, "sda");
-    CleanExpect(machine, "sda");
+    StepsExpect(machine, StepsOn("sda", Cleaned(RANGE_DATA)));
     const RUN_RESULT result = RunEnds(machine, {"newvol"}, 1);
     EXPECT_EQ(LogErrors(result).substr(0, LogErrors(result).find('\n') + 1),
               "<11>partition_edit.cpp:# Failed to get partition layout: version=0\n");
@@ -378,36 +298,35 @@ TEST(NewvolFails, WithoutARowForTheModel)
 
 // ---- dual-head machines ------------------------------------------------------------------------
 
-constexpr char LETTERS[] = "abcdefghijklmnopqrstuvwxyz";
-
-// Disks behind the port of sdg, in their order.
+// The first disks behind the port of sdg, in their order.
 std::vector<std::string> UnitDisks(size_t nDisk)
 {
     std::vector<std::string> disks;
     for (size_t i = 0; i < nDisk; i++) {
-        disks.push_back(std::string("sdg") + LETTERS[i]);
+        disks.push_back(std::string("sdg") + static_cast<char>('a' + i));
     }
     return disks;
 }
 
-MACHINE MachineWithUnit(const std::string &szConf, size_t nDisk, size_t nTaken)
+MACHINE MachineWithUnit(const std::string &szConf, size_t nDisk)
 {
-    MACHINE machine = MachineWithConf(CONF_DUAL_HEAD + szConf);
+    MACHINE machine = BlankDisks(UnitDisks(nDisk), CONF_DUAL_HEAD + szConf);
     MachineDiskAdd(machine, "sda"); // internal: left alone
     std::string szDevices;
     for (const std::string &szDisk : UnitDisks(nDisk)) {
-        MachineDiskAdd(machine, szDisk);
         szDevices += (szDevices.empty() ? "/dev/" : ",/dev/") + szDisk;
     }
     ExpansionUnitAdd(machine, "host6", szDevices);
-    for (const std::string &szDisk : UnitDisks(nTaken)) {
-        CleanExpect(machine, szDisk);
-        CreateExpect(machine, szDisk);
-    }
     return machine;
 }
 
-void UnitArrayExpect(MACHINE &machine, size_t nTaken)
+STEPS OverLimit(size_t nTaken)
+{
+    return {{"<11>arrayctl.cpp:# Get " + std::to_string(nTaken) +
+             " disks, more than raid group split unit"}};
+}
+
+STEPS UnitArray(size_t nTaken)
 {
     std::string szCommand = std::string("/sbin/mdadm -C /dev/md2 -amd -R -l") +
                             (nTaken > 2 ? "5 " : "1 ") + (nTaken == 1 ? "-f " : "") + "-n" +
@@ -415,13 +334,7 @@ void UnitArrayExpect(MACHINE &machine, size_t nTaken)
     for (const std::string &szDisk : UnitDisks(nTaken)) {
         szCommand += " /dev/" + szDisk + "3";
     }
-    MachineTool(machine, szCommand);
-}
-
-std::string OverLimit(size_t nTaken)
-{
-    return "<11>arrayctl.cpp:# Get " + std::to_string(nTaken) +
-           " disks, more than raid group split unit\n";
+    return {{szCommand}};
 }
 
 struct LIMIT_CASE {
@@ -447,66 +360,67 @@ const LIMIT_CASE LIMIT_CASES[] = {
 TEST(NewvolDualHead, TakesTheDisksOfAnExpansionUnitUpToItsLimit)
 {
     for (const LIMIT_CASE &row : LIMIT_CASES) {
-        SCOPED_TRACE(testing::Message() << row.szConf << row.nDisk);
-        MACHINE machine = MachineWithUnit(row.szConf, row.nDisk, row.nTaken);
-        UnitArrayExpect(machine, row.nTaken);
-        const RUN_RESULT result = RunEnds(machine, {"newvol"}, 0,
-                                          row.nTaken > 2 ? "Creating RAID 5 volume... \n"
-                                                         : "Creating RAID 1 volume... \n");
-        EXPECT_EQ(LogText(result), row.nDisk > row.nTaken ? OverLimit(row.nTaken) : "");
+        SCOPED_TRACE(row.nDisk);
+        ExpectRun({.szName = row.szConf.c_str(),
+                   .machine = MachineWithUnit(row.szConf, row.nDisk),
+                   .arguments = {"newvol"},
+                   .szOut = row.nTaken > 2 ? CREATING_5 : CREATING_1,
+                   .steps = RenewedAll(UnitDisks(row.nTaken)) +
+                            (row.nDisk > row.nTaken ? OverLimit(row.nTaken) : STEPS{}) +
+                            UnitArray(row.nTaken)});
     }
 }
 
 TEST(NewvolDualHead, SaysThatThereIsNoDiskWithinItsLimit)
 {
     for (const char *const szLimit : {"0", "-1", "none", "   "}) {
-        SCOPED_TRACE(szLimit);
-        const MACHINE machine =
-            MachineWithUnit("raidgroup_split_units=" + std::string(szLimit) + "\n", 3, 0);
-        const RUN_RESULT result = RunEnds(machine, {"newvol"}, 1, NO_DISK);
-        EXPECT_EQ(LogText(result), OverLimit(0));
-        EXPECT_EQ(TranscriptText(result), "");
+        ExpectRun(
+            {.szName = szLimit,
+             .machine = MachineWithUnit("raidgroup_split_units=" + std::string(szLimit) + "\n", 3),
+             .arguments = {"newvol"},
+             .szOut = NO_DISK,
+             .status = 1,
+             .steps = OverLimit(0)});
     }
 }
 
-// The limit is looked up before each disk.
-TEST(NewvolDualHead, ReadsItsLimitOnEveryTurn)
+STEPS RenewedWithLimit1()
 {
-    MACHINE machine = MachineWithUnit("raidgroup_split_units=2\n", 4, 2);
-    machine.rows[0].answer.writes = {
+    STEPS steps = Renewed("sdga");
+    steps[0].answer.writes = {
         {"/etc.defaults/nuroinfo.conf", CONF_DUAL_HEAD + "raidgroup_split_units=1\n"}};
-    machine.rows.erase(machine.rows.begin() + 3, machine.rows.end());
-    UnitArrayExpect(machine, 1);
-    const RUN_RESULT result = RunEnds(machine, {"newvol"}, 0);
-    EXPECT_EQ(LogText(result), OverLimit(1));
+    return steps;
 }
+
+const RUN_AND_STEPS HEAD_CASES[] = {
+    // It is looked up before each disk.
+    {"ReadsItsLimitOnEveryTurn", MachineWithUnit("raidgroup_split_units=2\n", 4),
+     RenewedWithLimit1() + OverLimit(1) + UnitArray(1)},
+    {"IsToldByTheMarkerFirst",
+     With(MachineWithUnit("", 2),
+          [](MACHINE &machine) {
+              MachineConf(machine, CONF_RAID);
+              MachineFile(machine, "/tmp/.dualhead", "");
+          }),
+     RenewedAll(UnitDisks(2)) + UnitArray(2)},
+    {"IsDeniedByTheMarkerFirst", WithFile(MachineWithUnit("", 2), "/tmp/.not.dualhead", ""),
+     Renewed("sda") + STEPS{{ARRAY_OF_ONE}}},
+};
+
+INSTANTIATE_TEST_SUITE_P(DualHead, NewvolRuns, testing::ValuesIn(HEAD_CASES), ROW_NAME());
 
 TEST(NewvolDualHead, AloneHasALimit)
 {
     for (const char *const szLimit : {"1", "0", "-1"}) {
-        MACHINE machine = MachineWithDisks(
-            CONF_RAID + "raidgroup_split_units=" + szLimit + "\n", FirstDisks(4));
-        MachineTool(machine, "/sbin/mdadm -C /dev/md2 -amd -R -l5 -n4 /dev/sda3 /dev/sdb3 "
-                             "/dev/sdc3 /dev/sdd3");
-        const RUN_RESULT result = RunEnds(machine, {"newvol"}, 0);
-        EXPECT_EQ(LogText(result), "");
+        ExpectRun(
+            {.szName = szLimit,
+             .machine = BlankDisks(ABCD, CONF_RAID + "raidgroup_split_units=" + szLimit + "\n"),
+             .arguments = {"newvol"},
+             .szOut = CREATING_5,
+             .steps = RenewedAll(ABCD) +
+                      STEPS{{"/sbin/mdadm -C /dev/md2 -amd -R -l5 -n4 /dev/sda3 /dev/sdb3 "
+                             "/dev/sdc3 /dev/sdd3"}}});
     }
-}
-
-TEST(NewvolDualHead, IsToldByTheMarkersFirst)
-{
-    MACHINE machine = MachineWithUnit("", 2, 2);
-    MachineConf(machine, CONF_RAID);
-    MachineFile(machine, "/tmp/.dualhead", "");
-    UnitArrayExpect(machine, 2);
-    RunEnds(machine, {"newvol"}, 0);
-
-    MACHINE machineNot = MachineWithUnit("", 2, 0);
-    MachineFile(machineNot, "/tmp/.not.dualhead", "");
-    CleanExpect(machineNot, "sda");
-    CreateExpect(machineNot, "sda");
-    MachineTool(machineNot, "/sbin/mdadm -C /dev/md2 -amd -R -l1 -f -n1 /dev/sda3");
-    RunEnds(machineNot, {"newvol"}, 0);
 }
 
 // ---- in turn -----------------------------------------------------------------------------------
@@ -514,14 +428,15 @@ TEST(NewvolDualHead, IsToldByTheMarkersFirst)
 // One disk after the other, in this process: nothing runs side by side.
 TEST(Newvol, HandlesOneDiskAfterTheOther)
 {
-    MACHINE machine = MachineWithDisks(CONF_RAID, FirstDisks(3));
-    for (TOOL_ROW &row : machine.rows) {
-        row.answer.msDelay = row.argv[1] == "-N3" ? 300 : 0;
-    }
-    MachineTool(machine, "/sbin/mdadm -C /dev/md2 ...");
-    const RUN_RESULT result = RunEnds(machine, {"newvol"}, 0);
-    EXPECT_EQ(CommandsBeside(result, {}).substr(0, RenewAllText(FirstDisks(3)).size()),
-              RenewAllText(FirstDisks(3)));
+    const TOOL_ANSWER late = {.msDelay = 300};
+    ExpectRun({.szName = "three",
+               .machine = BlankDisks({"sda", "sdb", "sdc"}),
+               .arguments = {"newvol"},
+               .szOut = CREATING_5,
+               .steps = Renewed("sda", DATA_8, late) + Renewed("sdb", DATA_8, late) +
+                        Renewed("sdc", DATA_8, late) +
+                        STEPS{{"/sbin/mdadm -C /dev/md2 -amd -R -l5 -n3 /dev/sda3 /dev/sdb3 "
+                               "/dev/sdc3"}}});
 }
 
 } // namespace

@@ -4,6 +4,8 @@
 #include "removal_machine.h"
 
 #include <gtest/gtest.h>
+#include <optional>
+#include <ostream>
 #include <string>
 #include <vector>
 
@@ -41,171 +43,171 @@ std::string ListText(const NLIBSZLIST *pList)
     return szText;
 }
 
-struct ENUM_CASE {
-    const PARTITION_ENUM_FILTER *pFilter;
-    int result;
-    std::string szList;
-    std::string szLog = "";
-};
-
-// `before` stands in the list when the call is made.
-void EnumGives(const MACHINE &machine, const ENUM_CASE &row,
-               const std::vector<std::string> &before = {})
-{
-    const RUN_RESULT result = MachineCall(machine, [&] {
-        PNLIBSZLIST pList = NLIBCSzListAlloc(512);
-        for (const std::string &szItem : before) {
-            (void)NLIBCSzListPush(&pList, szItem.c_str());
-        }
-        EXPECT_EQ(PartitionPathEnum(row.pFilter, &pList), row.result);
-        EXPECT_EQ(ListText(pList), row.szList);
-        EXPECT_EQ(pList->fMode, 1);
-        NLIBCSzListFree(pList);
-    });
-    EXPECT_EQ(LogText(result), row.szLog);
-    EXPECT_EQ(TranscriptText(result), "");
-}
-
-TEST(PartitionPathEnum, ListsEveryDeviceInByteOrder)
-{
-    EnumGives(MachineWithNames({"sdb", "sdb1", "sda", "sda2", "sda10", "md2", "mmcblk0p1"}),
-              {nullptr, 8,
-               "/dev/md2\n/dev/mmcblk0p1\n/dev/name\n/dev/sda\n/dev/sda10\n/dev/sda2\n/dev/sdb\n"
-               "/dev/sdb1\n"});
-}
-
-TEST(PartitionPathEnum, TheHeadingIsALineLikeAnyOther)
-{
-    EnumGives(MachineWithNames({}), {nullptr, 1, "/dev/name\n"});
-    constexpr PARTITION_ENUM_FILTER SD = {"sd", 0};
-    EnumGives(MachineWithNames({}), {&SD, 0, ""});
-}
-
-TEST(PartitionPathEnum, TheCountIsThatOfTheWholeList)
-{
-    constexpr PARTITION_ENUM_FILTER SD = {"sd", 0};
-    EnumGives(MachineWithNames({"sda", "sda1", "sda2"}),
-              {&SD, 5, "/dev/md0\n/dev/sda\n/dev/sda1\n/dev/sda2\n/dev/sdz\n"},
-              {"/dev/sdz", "/dev/md0"});
-}
-
-TEST(PartitionPathEnum, KeepsADeviceThatIsListedTwice)
-{
-    constexpr PARTITION_ENUM_FILTER SD = {"sd", 0};
-    EnumGives(MachineWithNames({"sda", "sda"}), {&SD, 3, "/dev/sda\n/dev/sda\n/dev/sda\n"},
-              {"/dev/sda"});
-}
-
-TEST(PartitionPathEnum, TakesTheNamesThatBeginWithThePrefix)
-{
-    const MACHINE machine = MachineWithNames({"sda", "sda1", "isda1", "sd", "s", "Sda", "md~5"});
-    constexpr PARTITION_ENUM_FILTER SD = {"sd", 0};
-    EnumGives(machine, {&SD, 3, "/dev/sd\n/dev/sda\n/dev/sda1\n"});
-    constexpr PARTITION_ENUM_FILTER ALL = {"", 0};
-    EnumGives(machine, {&ALL, 8,
-                        "/dev/Sda\n/dev/isda1\n/dev/md~5\n/dev/name\n/dev/s\n/dev/sd\n/dev/sda\n"
-                        "/dev/sda1\n"});
-    constexpr PARTITION_ENUM_FILTER NO_PREFIX = {nullptr, 0};
-    EnumGives(machine, {&NO_PREFIX, 8,
-                        "/dev/Sda\n/dev/isda1\n/dev/md~5\n/dev/name\n/dev/s\n/dev/sd\n/dev/sda\n"
-                        "/dev/sda1\n"});
-}
-
-TEST(PartitionPathEnum, TakesTheContainersOfTheMask)
-{
-    const MACHINE machine = MachineWithNames(
-        {"sda", "sda1", "sda5", "sdb", "sdb5", "sde", "sde1", "sdg1", "sdi1", "sdq"});
-    constexpr PARTITION_ENUM_FILTER INTERNAL = {"sd", 1};
-    EnumGives(machine, {&INTERNAL, 5, "/dev/sda\n/dev/sda1\n/dev/sda5\n/dev/sdb\n/dev/sdb5\n"});
-    constexpr PARTITION_ENUM_FILTER USB = {"sd", 4};
-    EnumGives(machine, {&USB, 3, "/dev/sde\n/dev/sde1\n/dev/sdq\n"});
-    constexpr PARTITION_ENUM_FILTER ESATA_OR_CACHE = {"sd", 8 | 32};
-    EnumGives(machine, {&ESATA_OR_CACHE, 2, "/dev/sdg1\n/dev/sdi1\n"});
-    constexpr PARTITION_ENUM_FILTER EUNIT = {"sd", 2};
-    EnumGives(machine, {&EUNIT, 0, ""});
-}
-
-TEST(PartitionPathEnum, ADeviceWithoutAContainerIsTold)
-{
-    const MACHINE machine = MachineWithNames({"sda1", "mmcblk0", "mmcblk0p1"});
-    constexpr PARTITION_ENUM_FILTER SD = {"sd", 1};
-    EnumGives(machine, {&SD, 1, "/dev/sda1\n"}); // the prefix comes first
-    constexpr PARTITION_ENUM_FILTER MMC = {"mmcblk", 0xFFFFFFFF};
-    EnumGives(machine, {&MMC, 0, "",
-                        "<15>partition_enum.cpp:# Failed to parsing device: mmcblk0\n"
-                        "<15>partition_enum.cpp:# Failed to parsing device: mmcblk0p1\n"});
-    constexpr PARTITION_ENUM_FILTER MMC_NO_MASK = {"mmcblk", 0};
-    EnumGives(machine, {&MMC_NO_MASK, 2, "/dev/mmcblk0\n/dev/mmcblk0p1\n"});
-}
-
-TEST(PartitionPathEnum, TakesLinesOfFourFieldsAlone)
-{
-    MACHINE machine = MachineMake();
-    MachineFile(machine, "/proc/partitions",
-                "8 0 1\n"
-                "8 0 1 sda\n"
-                "\t8\t1 \t 1  sda1\n"
-                "8 0 1 sdb 5\n"
-                "8 0 1 sdc \n" // the line end is a fifth field
-                "sdd\n"
-                "\n");
-    EnumGives(machine, {nullptr, 2, "/dev/sda\n/dev/sda1\n"});
-}
-
-TEST(PartitionPathEnum, TheLastCharacterIsTakenForTheLineEnd)
-{
-    MACHINE machine = MachineMake();
-    MachineFile(machine, "/proc/partitions", "8 0 1 sda\n8 1 1 sda12");
-    EnumGives(machine, {nullptr, 2, "/dev/sda\n/dev/sda1\n"});
-}
-
-TEST(PartitionPathEnum, CutsAPathToSixtyThreeCharacters)
-{
-    const std::string szLong(100, 'x');
-    EnumGives(MachineWithNames({szLong.substr(0, 57)}),
-              {nullptr, 2, "/dev/name\n/dev/" + szLong.substr(0, 57) + "\n"});
-    EnumGives(MachineWithNames({szLong.substr(0, 58)}),
-              {nullptr, 2, "/dev/name\n/dev/" + szLong.substr(0, 58) + "\n"});
-    EnumGives(MachineWithNames({szLong}),
-              {nullptr, 2, "/dev/name\n/dev/" + szLong.substr(0, 58) + "\n"});
-}
-
-TEST(PartitionPathEnum, ManyDevices)
+// Sixteen partitions on each of 26 disks.
+std::vector<std::string> ManyNames()
 {
     std::vector<std::string> names;
-    std::string szExpected = "/dev/name\n";
     for (char ch = 'a'; ch <= 'z'; ch++) {
         for (int i = 10; i < 26; i++) {
             names.push_back(std::string("sd") + ch + std::to_string(i));
-            szExpected += "/dev/" + names.back() + "\n";
         }
     }
-    EnumGives(MachineWithNames(names), {nullptr, 417, szExpected});
+    return names;
 }
 
-TEST(PartitionPathEnum, WithoutAListFails)
+std::string ManyPaths()
 {
-    const RUN_RESULT result = MachineCall(MachineWithNames({"sda"}), [] {
-        RecordReset();
-        EXPECT_EQ(PartitionPathEnum(nullptr, nullptr), -1);
-        PNLIBSZLIST pNone = nullptr;
-        EXPECT_EQ(PartitionPathEnum(nullptr, &pNone), -1);
-        EXPECT_EQ(pNone, nullptr);
-        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
+    std::string szPaths = "/dev/name\n";
+    for (const std::string &szName : ManyNames()) {
+        szPaths += "/dev/" + szName + "\n";
+    }
+    return szPaths;
+}
+
+struct ENUM_CASE {
+    const char *szName;
+    MACHINE machine;
+    std::optional<PARTITION_ENUM_FILTER> filter;
+    int result;
+    std::string szList;
+    STEPS steps = {};
+    std::vector<std::string> before = {}; // stands in the list when the call is made
+    u32 code = OLD_CODE;
+    int fMode = 1;
+};
+
+void PrintTo(const ENUM_CASE &row, std::ostream *pStream)
+{
+    *pStream << row.szName;
+}
+
+struct PartitionPathEnumRows : testing::TestWithParam<ENUM_CASE> {
+};
+
+TEST_P(PartitionPathEnumRows, Lists)
+{
+    const ENUM_CASE &row = GetParam();
+    const RUN_RESULT result = MachineCall(row.machine, [&row] {
+        PNLIBSZLIST pList = NLIBCSzListAlloc(512);
+        for (const std::string &szItem : row.before) {
+            (void)NLIBCSzListPush(&pList, szItem.c_str());
+        }
+        EXPECT_FAILS(PartitionPathEnum(row.filter ? &*row.filter : nullptr, &pList), row.result,
+                     row.code);
+        EXPECT_EQ(ListText(pList), row.szList);
+        EXPECT_EQ(pList->fMode, row.fMode);
+        NLIBCSzListFree(pList);
     });
-    EXPECT_EQ(LogText(result), "<11>partition_enum.cpp:# bad parameters\n"
-                               "<11>partition_enum.cpp:# bad parameters\n");
+    ExpectSteps(result, row.steps);
 }
 
-TEST(PartitionPathEnum, WithoutTheKernelsListFails)
+constexpr PARTITION_ENUM_FILTER SD = {"sd", 0};
+const std::vector<std::string> PREFIXED = {"sda", "sda1", "isda1", "sd", "s", "Sda", "md~5"};
+constexpr char ALL_PREFIXED[] = "/dev/Sda\n/dev/isda1\n/dev/md~5\n/dev/name\n/dev/s\n/dev/sd\n"
+                                "/dev/sda\n/dev/sda1\n";
+const std::vector<std::string> ON_PORTS = {"sda", "sda1", "sda5", "sdb",  "sdb5",
+                                           "sde", "sde1", "sdg1", "sdi1", "sdq"};
+const std::vector<std::string> MMC = {"sda1", "mmcblk0", "mmcblk0p1"};
+const std::string LONG_NAME(58, 'x');
+
+// A list of the kernel with this text.
+MACHINE MachineOfText(const std::string &szText)
 {
-    MACHINE machine = MachineMake();
-    MachineRemove(machine, "/proc/partitions");
-    EnumGives(machine,
-              {nullptr, -1, "/dev/sda\n/dev/sdb\n",
-               "<11>partition_enum.cpp:# Failed to read line of /proc/partitions, errno=0x900\n"},
-              {"/dev/sdb", "/dev/sda"});
+    return WithFile(MachineMake(), "/proc/partitions", szText);
 }
+
+const ENUM_CASE ENUM_CASES[] = {
+    {"EveryDeviceInByteOrder",
+     MachineWithNames({"sdb", "sdb1", "sda", "sda2", "sda10", "md2", "mmcblk0p1"}),
+     {},
+     8,
+     "/dev/md2\n/dev/mmcblk0p1\n/dev/name\n/dev/sda\n/dev/sda10\n/dev/sda2\n/dev/sdb\n"
+     "/dev/sdb1\n"},
+    {"TheHeadingAsALineLikeAnyOther", MachineWithNames({}), {}, 1, "/dev/name\n"},
+    {"NoHeadingOfAnotherPrefix", MachineWithNames({}), SD, 0, ""},
+    // The count is that of the whole list.
+    {"WhatIsThereToo",
+     MachineWithNames({"sda", "sda1", "sda2"}),
+     SD,
+     5,
+     "/dev/md0\n/dev/sda\n/dev/sda1\n/dev/sda2\n/dev/sdz\n",
+     {},
+     {"/dev/sdz", "/dev/md0"}},
+    {"ADeviceThatIsListedTwice",
+     MachineWithNames({"sda", "sda"}),
+     SD,
+     3,
+     "/dev/sda\n/dev/sda\n/dev/sda\n",
+     {},
+     {"/dev/sda"}},
+    {"NamesThatBeginWithThePrefix", MachineWithNames(PREFIXED), SD, 3,
+     "/dev/sd\n/dev/sda\n/dev/sda1\n"},
+    {"AllOfAnEmptyPrefix", MachineWithNames(PREFIXED), {{"", 0}}, 8, ALL_PREFIXED},
+    {"AllOfNoPrefix", MachineWithNames(PREFIXED), {{nullptr, 0}}, 8, ALL_PREFIXED},
+    {"Internal",
+     MachineWithNames(ON_PORTS),
+     {{"sd", 1}},
+     5,
+     "/dev/sda\n/dev/sda1\n/dev/sda5\n/dev/sdb\n/dev/sdb5\n"},
+    {"Usb", MachineWithNames(ON_PORTS), {{"sd", 4}}, 3, "/dev/sde\n/dev/sde1\n/dev/sdq\n"},
+    {"EsataOrCache", MachineWithNames(ON_PORTS), {{"sd", 8 | 32}}, 2, "/dev/sdg1\n/dev/sdi1\n"},
+    {"Eunit", MachineWithNames(ON_PORTS), {{"sd", 2}}, 0, ""},
+    {"ThePrefixFirst", MachineWithNames(MMC), {{"sd", 1}}, 1, "/dev/sda1\n"},
+    {"NoDeviceWithoutAContainer",
+     MachineWithNames(MMC),
+     {{"mmcblk", 0xFFFFFFFF}},
+     0,
+     "",
+     {{"<15>partition_enum.cpp:# Failed to parsing device: mmcblk0"},
+      {"<15>partition_enum.cpp:# Failed to parsing device: mmcblk0p1"}}},
+    {"DevicesWithoutAContainerWhereNoneIsAsked",
+     MachineWithNames(MMC),
+     {{"mmcblk", 0}},
+     2,
+     "/dev/mmcblk0\n/dev/mmcblk0p1\n"},
+    {"LinesOfFourFieldsAlone", // behind a blank the line end is a fifth one
+     MachineOfText("8 0 1\n8 0 1 sda\n\t8\t1 \t 1  sda1\n8 0 1 sdb 5\n8 0 1 sdc \nsdd\n\n"),
+     {},
+     2,
+     "/dev/sda\n/dev/sda1\n"},
+    {"TheLastCharacterAsTheLineEnd",
+     MachineOfText("8 0 1 sda\n8 1 1 sda12"),
+     {},
+     2,
+     "/dev/sda\n/dev/sda1\n"},
+    {"PathsOf62Characters",
+     MachineWithNames({LONG_NAME.substr(1)}),
+     {},
+     2,
+     "/dev/name\n/dev/" + LONG_NAME.substr(1) + "\n"},
+    {"PathsOf63Characters",
+     MachineWithNames({LONG_NAME}),
+     {},
+     2,
+     "/dev/name\n/dev/" + LONG_NAME + "\n"},
+    {"NoMoreThan63Characters",
+     MachineWithNames({LONG_NAME + std::string(42, 'x')}),
+     {},
+     2,
+     "/dev/name\n/dev/" + LONG_NAME + "\n"},
+    {"ManyDevices", MachineWithNames(ManyNames()), {}, 417, ManyPaths()},
+    {"NothingWithoutTheKernelsList",
+     Without(MachineMake(), "/proc/partitions"),
+     {},
+     -1,
+     "/dev/sda\n/dev/sdb\n",
+     {{"<11>partition_enum.cpp:# Failed to read line of /proc/partitions, errno=0x900"}},
+     {"/dev/sdb", "/dev/sda"},
+     ERR_OPEN_FAILED},
+    {"NothingOfAnEmptyList",
+     MachineOfText(""),
+     {},
+     -1,
+     "",
+     {{"<11>partition_enum.cpp:# There's no line in /proc/partitions"}}},
+};
+
+INSTANTIATE_TEST_SUITE_P(, PartitionPathEnumRows, testing::ValuesIn(ENUM_CASES), ROW_NAME());
 
 TEST(PartitionPathEnum, AListThatCannotBeReadToItsEndFails)
 {
@@ -221,20 +223,6 @@ TEST(PartitionPathEnum, AListThatCannotBeReadToItsEndFails)
     });
     EXPECT_EQ(LogText(result),
               "<11>partition_enum.cpp:# Failed to read line of /proc/partitions, errno=0x6100\n");
-}
-
-TEST(PartitionPathEnum, AnEmptyListFails)
-{
-    MACHINE machine = MachineMake();
-    MachineFile(machine, "/proc/partitions", "");
-    const RUN_RESULT result = MachineCall(machine, [] {
-        PNLIBSZLIST pList = NLIBCSzListAlloc(512);
-        EXPECT_QUIET(PartitionPathEnum(nullptr, &pList), -1);
-        EXPECT_EQ(pList->nItem, 0);
-        EXPECT_EQ(pList->fMode, 1);
-        NLIBCSzListFree(pList);
-    });
-    EXPECT_EQ(LogText(result), "<11>partition_enum.cpp:# There's no line in /proc/partitions\n");
 }
 
 // Both work lists, and the result in its old order.

@@ -1,7 +1,6 @@
 // SPDX-License-Identifier: MIT
 #include "nurostoragecore/partition_layout.h"
 
-#include "last_error.h"
 #include "nurocore/error.h"
 #include "storage_machine.h"
 
@@ -59,12 +58,15 @@ void TextRewrite(const std::string &szPath, const std::string &szText)
     std::ofstream(szPath) << szText;
 }
 
-void PartitionRewrite(int partNum, u64 start, u64 size)
+void DiskRewrite(const DISK_PLACES &places)
 {
-    const std::string szFolder = "/sys/block/sda/sda" + std::to_string(partNum);
-    std::filesystem::create_directories(szFolder);
-    TextRewrite(szFolder + "/start", std::to_string(start) + "\n");
-    TextRewrite(szFolder + "/size", std::to_string(size) + "\n");
+    const u64 numbers[2][2] = {{places.start, places.size}, {places.swapStart, places.swapSize}};
+    for (const int partNum : {1, 2}) {
+        const std::string szFolder = "/sys/block/sda/sda" + std::to_string(partNum);
+        std::filesystem::create_directories(szFolder);
+        TextRewrite(szFolder + "/start", std::to_string(numbers[partNum - 1][0]) + "\n");
+        TextRewrite(szFolder + "/size", std::to_string(numbers[partNum - 1][1]) + "\n");
+    }
 }
 
 TEST(PartitionLayoutTable, HoldsItsRowsInTheirOrder)
@@ -167,24 +169,22 @@ TEST(SupportRaid, IsNoWithoutTheKey)
 
 // ---- where a partition lies --------------------------------------------------------------------
 
+// The partition lies there and no code is left; or there is none, or it cannot be told.
 void ExpectPlace(const char *szDisk, int partNum, u64 startExpected, u64 sizeExpected)
 {
     u64 start = UNTOUCHED;
     u64 size = UNTOUCHED;
-    RecordReset();
-    EXPECT_EQ(PartitionStartSizeGet(szDisk, partNum, &start, &size), 1) << szDisk;
+    EXPECT_QUIET(PartitionStartSizeGet(szDisk, partNum, &start, &size), 1);
     EXPECT_EQ(start, startExpected) << szDisk;
     EXPECT_EQ(size, sizeExpected) << szDisk;
-    EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
 }
 
 void ExpectNoPlace(const char *szDisk, int partNum, int result, u32 code)
 {
+    SCOPED_TRACE(szDisk + std::to_string(partNum));
     u64 start = UNTOUCHED;
     u64 size = UNTOUCHED;
-    RecordReset();
-    EXPECT_EQ(PartitionStartSizeGet(szDisk, partNum, &start, &size), result) << szDisk << partNum;
-    EXPECT_EQ(NLIBCErrGet(), code) << szDisk << partNum;
+    EXPECT_FAILS(PartitionStartSizeGet(szDisk, partNum, &start, &size), result, code);
 }
 
 TEST(PartitionStartSize, TakesTheDiskWithAndWithoutItsFolder)
@@ -219,18 +219,17 @@ TEST(PartitionStartSize, ReadsNoFurtherThan128Bytes)
 
 TEST(PartitionStartSize, TellsAnAbsentPartitionFromAFailure)
 {
-    MACHINE machine = MachineMake();
-    MachineDiskAdd(machine, "sda");
-    MachineFile(machine, "/sys/block/sda/sda2/size", "1\n");
-    MachineFile(machine, "/sys/block/sda/sda3/start", "1\n");
-    MachineFile(machine, "/sys/block/sda/sda5/start", "");
-    MachineFile(machine, "/sys/block/sda/sda5/size", "1\n");
-    MachineFile(machine, "/sys/block/sda/sda6/start", "1\n");
-    MachineFile(machine, "/sys/block/sda/sda6/size", "");
-    MachineFile(machine, "/sys/block/sda/sda7/start", "none\n");
-    MachineFile(machine, "/sys/block/sda/sda7/size", "1\n");
-    MachineFile(machine, "/sys/block/sda/sda8/start", "1\n");
-    MachineFile(machine, "/sys/block/sda/sda8/size", "\n");
+    MACHINE machine = MachineOfDisks({{"sda", BLANK}});
+    const struct {
+        const char *szFile;
+        const char *szText;
+    } files[] = {{"sda2/size", "1\n"}, {"sda3/start", "1\n"},    {"sda5/start", ""},
+                 {"sda5/size", "1\n"}, {"sda6/start", "1\n"},    {"sda6/size", ""},
+                 {"sda7/size", "1\n"}, {"sda7/start", "none\n"}, {"sda8/start", "1\n"},
+                 {"sda8/size", "\n"}};
+    for (const auto &file : files) {
+        MachineFile(machine, std::string("/sys/block/sda/") + file.szFile, file.szText);
+    }
     QuietCall(machine, [] {
         ExpectNoPlace("sda", 1, 0, OLD_CODE);
         ExpectNoPlace("sdb", 1, 0, OLD_CODE);
@@ -255,31 +254,6 @@ TEST(PartitionStartSize, AsksForTheStartFirst)
     EXPECT_EQ(TranscriptText(result), "fault open \"1 0 /sys/block/sda/sda2/start\"\n");
 }
 
-TEST(PartitionStartSize, RefusesNull)
-{
-    MachineCall(MachineMake(), [] {
-        u64 sectors = UNTOUCHED;
-        ExpectNoPlace(nullptr, 1, -1, ERR_BAD_PARAMETER);
-        EXPECT_FAILS(PartitionStartSizeGet("sda", 1, nullptr, &sectors), -1, ERR_BAD_PARAMETER);
-        EXPECT_FAILS(PartitionStartSizeGet("sda", 1, &sectors, nullptr), -1, ERR_BAD_PARAMETER);
-        EXPECT_EQ(sectors, UNTOUCHED);
-    });
-}
-
-TEST(PartitionStartSize, FailsWhereThePartitionHasNoName)
-{
-    const RUN_RESULT result = MachineCall(MachineMake(), [] {
-        ExpectNoPlace("sda", 0, -1, OLD_CODE);
-        ExpectNoPlace("sda", -1, -1, OLD_CODE);
-        ExpectNoPlace("/dev/nuroboot", 1, -1, OLD_CODE);
-    });
-    const std::string szRefused = "<11>disk_name.cpp:# out put szPartitionPath can not be NULL and "
-                                  "path length can't be zero\n";
-    EXPECT_EQ(LogText(result),
-              szRefused + szRefused +
-                  "<11>disk_name.cpp:# we don't generate nuroboot partition name here\n");
-}
-
 // ---- the layout of a disk ----------------------------------------------------------------------
 
 void ExpectLayout(int raid, u32 versionExpected)
@@ -300,8 +274,7 @@ TEST(PartitionCheck, FindsEveryRowByItsFourNumbers)
                     continue;
                 }
                 SCOPED_TRACE(testing::Message() << row.version << " raid " << row.raid);
-                PartitionRewrite(1, row.start[0], row.size[0]);
-                PartitionRewrite(2, row.start[1], row.size[1]);
+                DiskRewrite({row.start[0], row.size[0], row.start[1], row.size[1]});
                 ExpectLayout(static_cast<int>(row.raid), VersionRead(row));
             }
         });
@@ -320,8 +293,7 @@ TEST(PartitionCheck, TakesNoNumberThatIsOneOff)
                     SCOPED_TRACE(testing::Message() << row.version << ' ' << iNumber << ' ' << off);
                     u64 numbers[] = {row.start[0], row.size[0], row.start[1], row.size[1]};
                     numbers[iNumber] += static_cast<u64>(off);
-                    PartitionRewrite(1, numbers[0], numbers[1]);
-                    PartitionRewrite(2, numbers[2], numbers[3]);
+                    DiskRewrite({numbers[0], numbers[1], numbers[2], numbers[3]});
                     ExpectLayout(static_cast<int>(row.raid), UNTOUCHED);
                 }
             }
@@ -331,17 +303,13 @@ TEST(PartitionCheck, TakesNoNumberThatIsOneOff)
 
 TEST(PartitionCheck, KeepsTheTwoKindsOfMachinesApart)
 {
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    PartitionedDiskAdd(machine, "sda", PLACES_3_NO_RAID);
-    QuietCall(machine, [] {
+    QuietCall(MachineOfDisks({{"sda", PLACES_3_NO_RAID}}), [] {
         ExpectLayout(0, 3);
         ExpectLayout(1, UNTOUCHED);
-        PartitionRewrite(1, PLACES_8.start, PLACES_8.size);
-        PartitionRewrite(2, PLACES_8.swapStart, PLACES_8.swapSize);
+        DiskRewrite(PLACES_8);
         ExpectLayout(0, 8);
         ExpectLayout(1, 8);
-        PartitionRewrite(1, PLACES_BUILDIN.start, PLACES_BUILDIN.size);
-        PartitionRewrite(2, PLACES_BUILDIN.swapStart, PLACES_BUILDIN.swapSize);
+        DiskRewrite(PLACES_BUILDIN);
         ExpectLayout(0, UNTOUCHED);
         ExpectLayout(1, UNTOUCHED);
     });
@@ -349,13 +317,10 @@ TEST(PartitionCheck, KeepsTheTwoKindsOfMachinesApart)
 
 TEST(PartitionCheck, KnowsOneGeometryAloneWithBuiltInStorage)
 {
-    MACHINE machine = MachineWithConf(CONF_BUILDIN);
-    PartitionedDiskAdd(machine, "sda", PLACES_8);
-    MachineCall(machine, [] {
+    MachineCall(MachineOfDisks({{"sda", PLACES_8}}, CONF_BUILDIN), [] {
         ExpectLayout(0, UNTOUCHED);
         ExpectLayout(1, UNTOUCHED);
-        PartitionRewrite(1, PLACES_BUILDIN.start, PLACES_BUILDIN.size);
-        PartitionRewrite(2, PLACES_BUILDIN.swapStart, PLACES_BUILDIN.swapSize);
+        DiskRewrite(PLACES_BUILDIN);
         ExpectLayout(0, 7);
         ExpectLayout(1, UNTOUCHED);
     });
@@ -363,8 +328,7 @@ TEST(PartitionCheck, KnowsOneGeometryAloneWithBuiltInStorage)
 
 TEST(PartitionCheck, LooksAtNoFurtherPartition)
 {
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    PartitionedDiskAdd(machine, "sda", PLACES_7);
+    MACHINE machine = MachineOfDisks({{"sda", PLACES_7}});
     MachinePartitionAdd(machine, "sda", 3, 1, 1);
     MachinePartitionAdd(machine, "sda", 4, 2, 2);
     MachineCall(machine, [] { ExpectLayout(1, 7); });
@@ -384,29 +348,43 @@ TEST(PartitionCheck, AsksForTheBuiltInStorageFirst)
     });
 }
 
+struct ABSENT_CASE {
+    const char *szDisk;
+    DISK_PLACES places;
+    const char *szLog;
+};
+
+constexpr ABSENT_CASE ABSENT_CASES[] = {
+    {"/dev/sda", BLANK, "<15>partition_layout.cpp:# /dev/sda: dont contain partition [1]"},
+    {"sda", {2048, 4980480, 0, 0}, "<15>partition_layout.cpp:# sda: dont contain partition [2]"},
+    {"/dev/sda",
+     {0, 0, 4982528, 4194304},
+     "<15>partition_layout.cpp:# /dev/sda: dont contain partition [1]"},
+};
+
 TEST(PartitionCheck, TellsWhichPartitionIsNotThere)
 {
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    MachineDiskAdd(machine, "sda");
-    MachineDiskAdd(machine, "sdb");
-    MachinePartitionAdd(machine, "sdb", 1, 2048, 4980480);
-    MachineDiskAdd(machine, "sdc");
-    MachinePartitionAdd(machine, "sdc", 2, 4982528, 4194304);
-    PartitionedDiskAdd(machine, "sdd", PLACES_8);
-    MachineFile(machine, "/sys/block/sdd/sdd2/size", "");
-    const RUN_RESULT result = MachineCall(machine, [] {
+    const auto check = [](const char *szDisk) {
         u32 version = UNTOUCHED;
-        EXPECT_EQ(PartitionCheckLayout("/dev/sda", 1, &version), 0);
-        EXPECT_EQ(PartitionCheckLayout("sdb", 1, &version), 0);
-        EXPECT_EQ(PartitionCheckLayout("/dev/sdc", 1, &version), 0);
-        EXPECT_EQ(PartitionCheckLayout("/dev/sdd", 1, &version), 0);
-        EXPECT_EQ(PartitionCheckLayout(nullptr, 1, &version), 0);
+        const long long result = PartitionCheckLayout(szDisk, 1, &version);
         EXPECT_EQ(version, UNTOUCHED);
-    });
-    EXPECT_EQ(LogText(result), "<15>partition_layout.cpp:# /dev/sda: dont contain partition [1]\n"
-                               "<15>partition_layout.cpp:# sdb: dont contain partition [2]\n"
-                               "<15>partition_layout.cpp:# /dev/sdc: dont contain partition [1]\n"
-                               "<15>partition_layout.cpp:# /dev/sdd: dont contain partition [2]\n");
+        return result;
+    };
+    for (const ABSENT_CASE &row : ABSENT_CASES) {
+        ExpectCalls({{.szName = row.szLog,
+                      .machine = MachineOfDisks({{"sda", row.places}}),
+                      .call = [&] { return check(row.szDisk); },
+                      .steps = {{row.szLog}}}});
+    }
+    ExpectCalls(
+        {{.szName = "size unread",
+          .machine = WithFile(MachineOfDisks({{"sda", PLACES_8}}), "/sys/block/sda/sda2/size", ""),
+          .call = [&] { return check("/dev/sda"); },
+          .code = ERR_READ_FAILED,
+          .steps = {{"<15>partition_layout.cpp:# /dev/sda: dont contain partition [2]"}}},
+         {.szName = "no disk", .machine = MachineWithConf(CONF_RAID), .call = [&] {
+              return check(nullptr);
+          }}});
 }
 
 } // namespace

@@ -1,7 +1,6 @@
 // SPDX-License-Identifier: MIT
 #include "nurostoragecore/partition_version.h"
 
-#include "last_error.h"
 #include "nurocore/error.h"
 #include "nurostoragecore/partition_layout.h"
 #include "storage_machine.h"
@@ -9,77 +8,242 @@
 #include <cerrno>
 #include <filesystem>
 #include <gtest/gtest.h>
+#include <map>
+#include <ostream>
 #include <string>
 #include <vector>
 
 namespace
 {
 
-std::string NotThere(const std::string &szDisk, int partNum)
+STEP NotThere(const std::string &szDisk, int partNum)
 {
-    return "<15>partition_layout.cpp:# " + szDisk + ": dont contain partition [" +
-           std::to_string(partNum) + "]\n";
+    return {"<15>partition_layout.cpp:# " + szDisk + ": dont contain partition [" +
+            std::to_string(partNum) + "]"};
 }
 
-std::string Biggest(int version)
+STEPS Biggest(int version)
 {
-    return "<11>partition_version.cpp:# Choose biggest partition layout version " +
-           std::to_string(version) + ".\n";
+    return {{"<11>partition_version.cpp:# Choose biggest partition layout version " +
+             std::to_string(version) + "."}};
 }
 
-// Asks in a process of its own, because what the model says is asked once in a process.
-RUN_RESULT ExpectVersion(const MACHINE &machine, int fChooseBiggest, u32 versionExpected)
+// The superblock of partition 3 names md2.
+STEP Member(const std::string &szDisk)
 {
-    return MachineCall(machine, [fChooseBiggest, versionExpected] {
-        u32 version = 0;
-        EXPECT_EQ(PartitionLayoutGetMax(&version, fChooseBiggest), 0);
-        EXPECT_EQ(version, versionExpected);
-    });
+    return {"/sbin/mdadm -E /dev/" + szDisk + "3", {.szOut = Examination(2)}};
 }
 
-RUN_RESULT ExpectFirst(const MACHINE &machine, u32 versionExpected)
+STEPS NoMember(const std::string &szDisk)
 {
-    return MachineCall(machine, [versionExpected] {
-        u32 version = 0;
-        EXPECT_EQ(PartitionLayoutGet(&version), 0);
-        EXPECT_EQ(version, versionExpected);
-    });
+    return {{"/sbin/mdadm -E /dev/" + szDisk + "3", {.status = 1}},
+            {"/sbin/mdadm -E /dev/" + szDisk + "5", {.status = 1}}};
 }
 
-TEST(PartitionVersion, RefusesNull)
+MACHINE MachineOfArray(const std::map<std::string, DISK_PLACES> &disks,
+                       const std::vector<MACHINE_MEMBER> &members,
+                       const std::string &szConf = CONF_RAID)
 {
-    QuietCall(MachineMake(), [] {
-        RecordReset();
-        EXPECT_EQ(PartitionLayoutGetMax(nullptr, 0), -1);
-        EXPECT_EQ(PartitionLayoutGetMax(nullptr, 1), -1);
-        EXPECT_EQ(PartitionLayoutGet(nullptr), -1);
-        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
-    });
+    MACHINE machine = MachineOfDisks(disks, szConf);
+    SystemArrayAdd(machine, members);
+    return machine;
 }
 
-// ---- a running system array --------------------------------------------------------------------
+enum WANTED { FIRST, BIGGEST, EITHER };
 
-TEST(PartitionVersion, IsThatOfTheRunningSystemArray)
+// Each is asked in a process of its own, because what the model says is asked once in a process.
+struct VERSION_CASE {
+    const char *szName;
+    MACHINE machine;
+    WANTED wanted;
+    u32 version;
+    STEPS steps = {};
+    int result = 0;
+    u32 before = 0; // what the caller has
+};
+
+void PrintTo(const VERSION_CASE &row, std::ostream *pStream)
 {
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    PartitionedDiskAdd(machine, "sda", PLACES_2);
-    PartitionedDiskAdd(machine, "sdb", PLACES_2);
-    PartitionedDiskAdd(machine, "sdc", PLACES_7); // not looked at
-    SystemArrayAdd(machine, {{"sda1"}, {"sdb1"}});
-    for (const int fChooseBiggest : {0, 1}) {
-        const RUN_RESULT result = ExpectVersion(machine, fChooseBiggest, 2);
-        EXPECT_EQ(OrderText(result), "");
+    *pStream << row.szName;
+}
+
+void ExpectVersion(const VERSION_CASE &row, int (*pAsk)(u32 *))
+{
+    MACHINE machine = row.machine;
+    StepsExpect(machine, row.steps);
+    ExpectSteps(MachineCall(machine,
+                            [&row, pAsk] {
+                                u32 version = row.before;
+                                EXPECT_EQ(pAsk(&version), row.result);
+                                EXPECT_EQ(version, row.version);
+                            }),
+                row.steps);
+}
+
+int BiggestGet(u32 *pVersion)
+{
+    return PartitionLayoutGetMax(pVersion, 1);
+}
+
+struct PartitionVersion : testing::TestWithParam<VERSION_CASE> {
+};
+
+TEST_P(PartitionVersion, Row)
+{
+    const VERSION_CASE &row = GetParam();
+    if (row.wanted == FIRST) {
+        ExpectVersion(row, PartitionLayoutGet);
+        return;
+    }
+    if (row.wanted == EITHER) {
+        ExpectVersion(row, [](u32 *pVersion) { return PartitionLayoutGetMax(pVersion, 0); });
+    }
+    ExpectVersion(row, BiggestGet);
+}
+
+const std::map<std::string, DISK_PLACES> THREE_WITHOUT_RAID = {
+    {"sda", PLACES_6}, {"sdb", PLACES_7}, {"sdc", PLACES_3_NO_RAID}};
+const std::string CONF_HEADS_NO_RAID = CONF_NO_RAID + "support_dual_head=yes\n";
+
+MACHINE MachineWithUnit()
+{
+    MACHINE machine = MachineOfDisks({{"sda", PLACES_8}, {"sdga", PLACES_6}, {"sdgb", PLACES_7}},
+                                     CONF_HEADS_NO_RAID);
+    ExpansionUnitAdd(machine, "host6", "/dev/sdga,/dev/sdgb");
+    return machine;
+}
+
+MACHINE WithGlobFault(const MACHINE &machine, int nCall)
+{
+    return WithFault(machine, {.szFunction = "glob", .nCall = nCall, .error = EIO});
+}
+
+const VERSION_CASE ARRAY_CASES[] = {
+    {"IsThatOfTheRunningSystemArray", // sdc is not looked at
+     MachineOfArray({{"sda", PLACES_2}, {"sdb", PLACES_2}, {"sdc", PLACES_7}},
+                    {{"sda1"}, {"sdb1"}}),
+     EITHER, 2},
+    {"OfTheSystemArrayIsAlwaysThatOfARaidMachine",
+     MachineOfArray({{"sda", PLACES_3_NO_RAID}}, {{"sda1"}}, CONF_NO_RAID), BIGGEST, 8},
+    {"OfTheSystemArrayIsThatOfARaidMachineWithoutRaidToo",
+     MachineOfArray({{"sda", PLACES_1}}, {{"sda1"}}, CONF_NO_RAID), BIGGEST, 1},
+    {"IsTheNewestWhenNoMemberIsKnown", // sdb is no member
+     MachineOfArray({{"sda", PLACES_FOREIGN}, {"sdb", PLACES_7}}, {{"sda1"}}), BIGGEST, 8},
+    {"TakesAMembersNameWithoutItsLastCharacter",
+     MachineOfArray({}, {{"sda10"}}),
+     BIGGEST,
+     8,
+     {NotThere("sda1", 1)}},
+    {"TakesAMembersNameBehindTheLastDash",
+     MachineOfArray({}, {{"dm-01"}}),
+     BIGGEST,
+     8,
+     {NotThere("0", 1)}},
+    {"AMemberWithoutANameIsNoDisk",
+     With(MachineWithConf(CONF_RAID),
+          [](MACHINE &machine) { MachineFolder(machine, "/sys/block/md0/md/dev-"); }),
+     BIGGEST,
+     8,
+     {NotThere("", 1)}},
+    // Only a version that is still none becomes the newest.
+    {"AVersionThatTheCallerHasStaysWhereNoMemberIsKnown",
+     MachineOfArray({{"sda", PLACES_FOREIGN}}, {{"sda1"}}),
+     BIGGEST,
+     5,
+     {},
+     0,
+     5},
+    {"LooksAtTheDisksWhenTheSystemArrayHasNoMember",
+     MachineOfArray({{"sda", PLACES_7}}, {}, CONF_NO_RAID), FIRST, 7},
+    {"FailsWhenTheMembersCannotBeRead",
+     WithGlobFault(MachineOfDisks({{"sda", PLACES_7}}, CONF_NO_RAID), 1),
+     BIGGEST,
+     0,
+     {{"fault glob 1"}},
+     -1},
+};
+
+const VERSION_CASE DISK_CASES[] = {
+    {"IsTheNewestWithoutADisk", MachineWithConf(CONF_RAID), EITHER, 8},
+    {"IsTheNewestWithoutAKnownDisk",
+     MachineOfDisks(
+         {{"sda", BLANK}, {"sdb", {PLACES_7.start, PLACES_7.size, 0, 0}}, {"sdc", PLACES_FOREIGN}}),
+     EITHER,
+     8,
+     {NotThere("/dev/sda", 1), NotThere("/dev/sdb", 2)}},
+    {"IsThatOfTheFirstDisk", MachineOfDisks(THREE_WITHOUT_RAID, CONF_NO_RAID), FIRST, 6},
+    {"IsTheBiggest", MachineOfDisks(THREE_WITHOUT_RAID, CONF_NO_RAID), BIGGEST, 7, Biggest(7)},
+    {"LogsTheBiggestOfOneDiskToo", MachineOfDisks({{"sdb", PLACES_2}}, CONF_NO_RAID), BIGGEST, 2,
+     Biggest(2)},
+    {"LeavesOtherPortsOut", // USB and eSATA
+     MachineOfDisks({{"sdb", PLACES_6}, {"sde", PLACES_7}, {"sdg", PLACES_7}}, CONF_NO_RAID),
+     BIGGEST, 6, Biggest(6)},
+    {"KnowsABuiltInStorageAsSeven", MachineOfDisks({{"sda", PLACES_BUILDIN}}, CONF_BUILDIN),
+     BIGGEST, 7, Biggest(7)},
+    {"KnowsTheFirstBuiltInStorageAsSeven", MachineOfDisks({{"sda", PLACES_BUILDIN}}, CONF_BUILDIN),
+     FIRST, 7},
+    {"OfADualHeadMachineIsThatOfItsFirstUnit", MachineWithUnit(), FIRST, 6},
+    {"OfADualHeadMachineIsTheBiggestOfItsUnits", MachineWithUnit(), BIGGEST, 7, Biggest(7)},
+    {"FailsWhenTheDisksCannotBeEnumerated",
+     WithGlobFault(MachineOfDisks({{"sda", PLACES_7}}, CONF_NO_RAID), 2),
+     BIGGEST,
+     0,
+     {{"fault glob 2"}, {"<11>disk_port.cpp:# read error :/sys/block/sd*"}},
+     -1},
+};
+
+// On a RAID machine the disk has to hold data.
+const VERSION_CASE DATA_CASES[] = {
+    {"CountsADiskWithItsArrayOnPartitionFive",
+     MachineOfDisks({{"sda", PLACES_7}}),
+     FIRST,
+     7,
+     {NoMember("sda")[0], {"/sbin/mdadm -E /dev/sda5", {.szOut = Examination(3)}}}},
+    {"ForgetsADiskThatDoesNotCount", MachineOfDisks({{"sda", PLACES_6}}), EITHER, 8,
+     NoMember("sda")},
+    {"ForgetsADiskThatDoesNotCountBeforeTheFirst",
+     MachineOfDisks({{"sda", PLACES_6}, {"sdb", PLACES_7}}), FIRST, 7,
+     NoMember("sda") + STEPS{Member("sdb")}},
+    {"ForgetsADiskThatDoesNotCountBeforeTheBiggest",
+     MachineOfDisks({{"sda", PLACES_6}, {"sdb", PLACES_7}}), BIGGEST, 7,
+     NoMember("sda") + STEPS{Member("sdb")} + Biggest(7)},
+    {"KeepsTheBiggestWhateverTheOrder",
+     MachineOfDisks({{"sda", PLACES_2}, {"sdb", PLACES_8}, {"sdc", PLACES_6}}), BIGGEST, 8,
+     STEPS{Member("sda"), Member("sdb"), Member("sdc")} + Biggest(8)},
+    {"StopsAtTheFirstDiskUnlessTheBiggestIsWanted",
+     MachineOfDisks({{"sda", PLACES_2}, {"sdb", PLACES_8}}),
+     FIRST,
+     2,
+     {Member("sda")}},
+};
+
+INSTANTIATE_TEST_SUITE_P(Array, PartitionVersion, testing::ValuesIn(ARRAY_CASES), ROW_NAME());
+INSTANTIATE_TEST_SUITE_P(Disks, PartitionVersion, testing::ValuesIn(DISK_CASES), ROW_NAME());
+INSTANTIATE_TEST_SUITE_P(Data, PartitionVersion, testing::ValuesIn(DATA_CASES), ROW_NAME());
+
+TEST(PartitionVersionData, CountsMembersOfArraysUpToNinetyNine)
+{
+    const struct {
+        int nMd;
+        u32 version;
+    } rows[] = {{0, 6}, {2, 6}, {99, 6}, {100, 8}, {101, 8}, {127, 8}};
+    for (const auto &row : rows) {
+        SCOPED_TRACE(row.nMd);
+        const STEPS asked = {{"/sbin/mdadm -E /dev/sda3", {.szOut = Examination(row.nMd)}}};
+        const MACHINE machine = MachineOfDisks({{"sda", PLACES_6}});
+        ExpectVersion({"first", machine, FIRST, row.version, asked}, PartitionLayoutGet);
+        ExpectVersion({"biggest", machine, BIGGEST, row.version,
+                       asked + (row.version == 6 ? Biggest(6) : STEPS{})},
+                      BiggestGet);
     }
 }
 
-TEST(PartitionVersion, OfTheSystemArrayIsThatOfTheFirstKnownMember)
+// Asks for the first known one alone.
+u32 VersionFirst()
 {
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    MachineDiskAdd(machine, "sda");
-    PartitionedDiskAdd(machine, "sdb", PLACES_6);
-    MachineDiskAdd(machine, "sdc");
-    SystemArrayAdd(machine, {{"sda1"}, {"sdb1"}, {"sdc1"}});
-    ExpectVersion(machine, 1, 6);
+    u32 version = 0;
+    EXPECT_EQ(PartitionLayoutGet(&version), 0);
+    return version;
 }
 
 // The first member of a folder as it is read.
@@ -96,12 +260,10 @@ std::string FirstMember(const char *szFolder)
 
 // A folder has them in the order of making them or the other way round, so made in both orders the
 // later name is the first once.
-TEST(PartitionVersion, OfTheSystemArrayIsThatOfTheMemberThatTheFolderHasFirst)
+TEST(PartitionVersionArray, IsThatOfTheMemberThatTheFolderHasFirst)
 {
     constexpr char FOLDER[] = "/sys/block/md0/md";
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    PartitionedDiskAdd(machine, "sda", PLACES_6);
-    PartitionedDiskAdd(machine, "sdb", PLACES_7);
+    MACHINE machine = MachineOfDisks({{"sda", PLACES_6}, {"sdb", PLACES_7}});
     MachineFolder(machine, FOLDER);
     const std::vector<std::string> orders[] = {{"dev-sda1", "dev-sdb1"}, {"dev-sdb1", "dev-sda1"}};
     std::string szFirsts;
@@ -110,10 +272,8 @@ TEST(PartitionVersion, OfTheSystemArrayIsThatOfTheMemberThatTheFolderHasFirst)
             for (const std::string &szName : order) {
                 std::filesystem::create_directory(FOLDER + ("/" + szName));
             }
-            u32 version = 0;
-            EXPECT_EQ(PartitionLayoutGet(&version), 0);
             const std::string szFirst = FirstMember(FOLDER);
-            EXPECT_EQ(version, szFirst == "dev-sda1" ? 6U : 7U);
+            EXPECT_EQ(VersionFirst(), szFirst == "dev-sda1" ? 6U : 7U);
             printf("%s ", szFirst.c_str());
         });
         szFirsts += result.szOut;
@@ -121,119 +281,20 @@ TEST(PartitionVersion, OfTheSystemArrayIsThatOfTheMemberThatTheFolderHasFirst)
     EXPECT_NE(szFirsts.find("dev-sdb1"), std::string::npos) << szFirsts;
 }
 
-TEST(PartitionVersion, OfTheSystemArrayIsAlwaysThatOfARaidMachine)
+// One known member among blank ones, whichever comes first.
+TEST(PartitionVersionArray, IsThatOfTheFirstKnownMember)
 {
-    MACHINE machine = MachineWithConf(CONF_NO_RAID);
-    PartitionedDiskAdd(machine, "sda", PLACES_3_NO_RAID);
-    SystemArrayAdd(machine, {{"sda1"}});
-    EXPECT_EQ(LogText(ExpectVersion(machine, 1, 8)), "");
-
-    MACHINE machineKnown = MachineWithConf(CONF_NO_RAID);
-    PartitionedDiskAdd(machineKnown, "sda", PLACES_1);
-    SystemArrayAdd(machineKnown, {{"sda1"}});
-    EXPECT_EQ(LogText(ExpectVersion(machineKnown, 1, 1)), "");
-}
-
-TEST(PartitionVersion, IsTheNewestWhenNoMemberIsKnown)
-{
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    PartitionedDiskAdd(machine, "sda", PLACES_FOREIGN);
-    PartitionedDiskAdd(machine, "sdb", PLACES_7); // no member
-    SystemArrayAdd(machine, {{"sda1"}});
-    const RUN_RESULT result = ExpectVersion(machine, 1, 8);
-    EXPECT_EQ(OrderText(result), "");
-}
-
-TEST(PartitionVersion, TakesAMembersNameWithoutItsLastCharacter)
-{
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    SystemArrayAdd(machine, {{"sda10"}});
-    EXPECT_EQ(LogText(ExpectVersion(machine, 1, 8)), NotThere("sda1", 1));
-
-    MACHINE machineDash = MachineWithConf(CONF_RAID);
-    SystemArrayAdd(machineDash, {{"dm-01"}});
-    EXPECT_EQ(LogText(ExpectVersion(machineDash, 1, 8)), NotThere("0", 1));
-}
-
-TEST(PartitionVersion, LooksAtTheDisksWhenTheSystemArrayHasNoMember)
-{
-    MACHINE machine = MachineWithConf(CONF_NO_RAID);
-    PartitionedDiskAdd(machine, "sda", PLACES_7);
-    SystemArrayAdd(machine, {});
-    ExpectFirst(machine, 7);
-}
-
-TEST(PartitionVersion, FailsWhenTheMembersCannotBeRead)
-{
-    MACHINE machine = MachineWithConf(CONF_NO_RAID);
-    PartitionedDiskAdd(machine, "sda", PLACES_7);
-    machine.faults = {{.szFunction = "glob", .nCall = 1, .error = EIO}};
-    const RUN_RESULT result = QuietCall(machine, [] {
-        u32 version = 0;
-        EXPECT_EQ(PartitionLayoutGetMax(&version, 1), -1);
-        EXPECT_EQ(version, 0U);
-    });
-    EXPECT_EQ(TranscriptText(result), "fault glob 1\n");
-}
-
-// ---- no system array ---------------------------------------------------------------------------
-
-TEST(PartitionVersion, IsTheNewestOnABlankMachine)
-{
-    for (const int fChooseBiggest : {0, 1}) {
-        const MACHINE machine = MachineWithConf(CONF_RAID);
-        EXPECT_EQ(LogText(ExpectVersion(machine, fChooseBiggest, 8)), "");
-
-        MACHINE machineDisks = machine;
-        MachineDiskAdd(machineDisks, "sda");
-        MachineDiskAdd(machineDisks, "sdb");
-        MachinePartitionAdd(machineDisks, "sdb", 1, PLACES_7.start, PLACES_7.size);
-        PartitionedDiskAdd(machineDisks, "sdc", PLACES_FOREIGN);
-        const RUN_RESULT result = ExpectVersion(machineDisks, fChooseBiggest, 8);
-        EXPECT_EQ(LogText(result), NotThere("/dev/sda", 1) + NotThere("/dev/sdb", 2));
-        EXPECT_EQ(TranscriptText(result), "");
-    }
-}
-
-TEST(PartitionVersion, IsThatOfTheFirstDiskOrTheBiggest)
-{
-    MACHINE machine = MachineWithConf(CONF_NO_RAID);
-    PartitionedDiskAdd(machine, "sda", PLACES_6);
-    PartitionedDiskAdd(machine, "sdb", PLACES_7);
-    PartitionedDiskAdd(machine, "sdc", PLACES_3_NO_RAID);
-    const RUN_RESULT first = ExpectFirst(machine, 6);
-    EXPECT_EQ(OrderText(first), "");
-    const RUN_RESULT biggest = ExpectVersion(machine, 1, 7);
-    EXPECT_EQ(LogText(biggest), Biggest(7));
-    EXPECT_EQ(TranscriptText(biggest), "");
-}
-
-TEST(PartitionVersion, LogsTheBiggestOfOneDiskToo)
-{
-    MACHINE machine = MachineWithConf(CONF_NO_RAID);
-    PartitionedDiskAdd(machine, "sdb", PLACES_2);
-    EXPECT_EQ(LogText(ExpectVersion(machine, 1, 2)), Biggest(2));
-}
-
-TEST(PartitionVersion, LeavesOtherPortsOut)
-{
-    MACHINE machine = MachineWithConf(CONF_NO_RAID);
-    PartitionedDiskAdd(machine, "sdb", PLACES_6);
-    PartitionedDiskAdd(machine, "sde", PLACES_7); // USB
-    PartitionedDiskAdd(machine, "sdg", PLACES_7); // eSATA
-    EXPECT_EQ(LogText(ExpectVersion(machine, 1, 6)), Biggest(6));
-}
-
-TEST(PartitionVersion, KnowsABuiltInStorageAsSeven)
-{
-    MACHINE machine = MachineWithConf(CONF_BUILDIN);
-    PartitionedDiskAdd(machine, "sda", PLACES_BUILDIN);
-    EXPECT_EQ(LogText(ExpectVersion(machine, 1, 7)), Biggest(7));
-    ExpectFirst(machine, 7);
+    MachineCall(MachineOfArray({{"sda", BLANK}, {"sdb", PLACES_6}, {"sdc", BLANK}},
+                               {{"sda1"}, {"sdb1"}, {"sdc1"}}),
+                [] {
+                    u32 version = 0;
+                    EXPECT_EQ(PartitionLayoutGetMax(&version, 1), 0);
+                    EXPECT_EQ(version, 6U);
+                });
 }
 
 // Before the disks are looked for: the code that stands in the end is that of a port's key.
-TEST(PartitionVersion, AsksForRaidBeforeTheDisks)
+TEST(PartitionVersionDisks, AreLookedForBehindRaid)
 {
     // Such a value is no yes, and too long to be looked at.
     MACHINE machine = MachineWithConf("supportraid=perhaps\nsupport_dual_head=no\n"
@@ -241,9 +302,7 @@ TEST(PartitionVersion, AsksForRaidBeforeTheDisks)
                                       "internalportcfg=0xf\n");
     MachineDiskAdd(machine, "sda");
     MachineCall(machine, [] {
-        u32 version = 0;
-        EXPECT_EQ(PartitionLayoutGet(&version), 0);
-        EXPECT_EQ(version, 8U);
+        EXPECT_EQ(VersionFirst(), 8U);
         EXPECT_EQ(NLIBCErrGet(), ERR_KEY_NOT_FOUND);
         EXPECT_QUIET(IsSupportRaid(), 0); // it was asked above
     });
@@ -253,119 +312,14 @@ TEST(PartitionVersion, AsksForRaidBeforeTheDisks)
     });
 }
 
-// ---- on a RAID machine the disk has to hold data -----------------------------------------------
-
-struct ARRAY_CASE {
-    int nMd;
-    u32 version;
-};
-
-TEST(PartitionVersion, CountsMembersOfArraysUpToNinetyNine)
-{
-    constexpr ARRAY_CASE CASES[] = {{0, 6}, {2, 6}, {99, 6}, {100, 8}, {101, 8}, {127, 8}};
-    for (const ARRAY_CASE &row : CASES) {
-        SCOPED_TRACE(row.nMd);
-        MACHINE machine = MachineWithConf(CONF_RAID);
-        PartitionedDiskAdd(machine, "sda", PLACES_6);
-        SuperblockExpect(machine, "sda3", row.nMd);
-        const RUN_RESULT first = ExpectFirst(machine, row.version);
-        EXPECT_EQ(LogText(first), "");
-        EXPECT_EQ(TranscriptText(first), "/sbin/mdadm -E /dev/sda3\n");
-        const RUN_RESULT biggest = ExpectVersion(machine, 1, row.version);
-        EXPECT_EQ(LogText(biggest), row.version == 6 ? Biggest(6) : "");
-    }
-}
-
-TEST(PartitionVersion, CountsADiskWithItsArrayOnPartitionFive)
-{
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    PartitionedDiskAdd(machine, "sda", PLACES_7);
-    NoSuperblockExpect(machine, "sda3");
-    SuperblockExpect(machine, "sda5", 3);
-    const RUN_RESULT result = ExpectFirst(machine, 7);
-    EXPECT_EQ(TranscriptText(result), "/sbin/mdadm -E /dev/sda3\n/sbin/mdadm -E /dev/sda5\n");
-}
-
-TEST(PartitionVersion, ForgetsADiskThatDoesNotCount)
-{
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    PartitionedDiskAdd(machine, "sda", PLACES_6);
-    NoSuperblockExpect(machine, "sda3");
-    NoSuperblockExpect(machine, "sda5");
-    for (const int fChooseBiggest : {0, 1}) {
-        const RUN_RESULT result = ExpectVersion(machine, fChooseBiggest, 8);
-        EXPECT_EQ(LogText(result), "");
-        EXPECT_EQ(TranscriptText(result), "/sbin/mdadm -E /dev/sda3\n/sbin/mdadm -E /dev/sda5\n");
-    }
-
-    PartitionedDiskAdd(machine, "sdb", PLACES_7);
-    SuperblockExpect(machine, "sdb3", 2);
-    EXPECT_EQ(TranscriptText(ExpectFirst(machine, 7)),
-              "/sbin/mdadm -E /dev/sda3\n/sbin/mdadm -E /dev/sda5\n/sbin/mdadm -E /dev/sdb3\n");
-    EXPECT_EQ(LogText(ExpectVersion(machine, 1, 7)), Biggest(7));
-}
-
-TEST(PartitionVersion, KeepsTheBiggestWhateverTheOrder)
-{
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    PartitionedDiskAdd(machine, "sda", PLACES_2);
-    PartitionedDiskAdd(machine, "sdb", PLACES_8);
-    PartitionedDiskAdd(machine, "sdc", PLACES_6);
-    for (const char *const szDevice : {"sda3", "sdb3", "sdc3"}) {
-        SuperblockExpect(machine, szDevice, 2);
-    }
-    const RUN_RESULT result = ExpectVersion(machine, 1, 8);
-    EXPECT_EQ(LogText(result), Biggest(8));
-    EXPECT_EQ(TranscriptText(result), "/sbin/mdadm -E /dev/sda3\n/sbin/mdadm -E /dev/sdb3\n"
-                                      "/sbin/mdadm -E /dev/sdc3\n");
-}
-
-TEST(PartitionVersion, StopsAtTheFirstDiskUnlessTheBiggestIsWanted)
-{
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    PartitionedDiskAdd(machine, "sda", PLACES_2);
-    PartitionedDiskAdd(machine, "sdb", PLACES_8);
-    SuperblockExpect(machine, "sda3", 2);
-    EXPECT_EQ(TranscriptText(ExpectFirst(machine, 2)), "/sbin/mdadm -E /dev/sda3\n");
-}
-
-// ---- dual-head machines ------------------------------------------------------------------------
-
-TEST(PartitionVersion, OfADualHeadMachineIsThatOfItsExpansionUnits)
-{
-    MACHINE machine = MachineWithConf(CONF_NO_RAID + "support_dual_head=yes\n");
-    PartitionedDiskAdd(machine, "sda", PLACES_8);
-    PartitionedDiskAdd(machine, "sdga", PLACES_6);
-    PartitionedDiskAdd(machine, "sdgb", PLACES_7);
-    ExpansionUnitAdd(machine, "host6", "/dev/sdga,/dev/sdgb");
-    ExpectFirst(machine, 6);
-    EXPECT_EQ(LogText(ExpectVersion(machine, 1, 7)), Biggest(7));
-}
-
-// ---- failures ----------------------------------------------------------------------------------
-
-TEST(PartitionVersion, FailsWhenTheDisksCannotBeEnumerated)
-{
-    MACHINE machine = MachineWithConf(CONF_NO_RAID);
-    PartitionedDiskAdd(machine, "sda", PLACES_7);
-    machine.faults = {{.szFunction = "glob", .nCall = 2, .error = EIO}};
-    const RUN_RESULT result = MachineCall(machine, [] {
-        u32 version = 0;
-        EXPECT_EQ(PartitionLayoutGetMax(&version, 1), -1);
-        EXPECT_EQ(version, 0U);
-    });
-    EXPECT_EQ(LogText(result), "<11>disk_port.cpp:# read error :/sys/block/sd*\n");
-}
-
 // Whichever call it is that asks for the list's memory.
-TEST(PartitionVersion, FailsWithoutMemoryForTheList)
+TEST(PartitionVersionDisks, FailWithoutMemoryForTheList)
 {
     bool fSeen = false;
     for (const char *const szFunction : {"malloc", "calloc"}) {
         for (int nCall = 1; nCall <= 12 && !fSeen; nCall++) {
-            MACHINE machine = MachineWithConf(CONF_NO_RAID);
-            MachineDiskAdd(machine, "sda");
-            machine.faults = {{.szFunction = szFunction, .nCall = nCall}};
+            const MACHINE machine = WithFault(MachineOfDisks({{"sda", BLANK}}, CONF_NO_RAID),
+                                              {.szFunction = szFunction, .nCall = nCall});
             const RUN_RESULT result = MachineCall(machine, [] {
                 u32 version = 0;
                 RecordReset();
@@ -376,31 +330,6 @@ TEST(PartitionVersion, FailsWithoutMemoryForTheList)
         }
     }
     EXPECT_TRUE(fSeen);
-}
-
-TEST(PartitionVersion, AMemberWithoutANameIsNoDisk)
-{
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    MachineFolder(machine, "/sys/block/md0/md/dev-");
-    const RUN_RESULT result = MachineCall(machine, [] {
-        u32 version = 0;
-        EXPECT_EQ(PartitionLayoutGetMax(&version, 1), 0);
-        EXPECT_EQ(version, 8U);
-    });
-    EXPECT_EQ(LogText(result), "<15>partition_layout.cpp:# : dont contain partition [1]\n");
-}
-
-// Only a version that is still none becomes the newest.
-TEST(PartitionVersion, AVersionThatTheCallerHasStaysWhereNoMemberIsKnown)
-{
-    MACHINE machine = MachineWithConf(CONF_RAID);
-    PartitionedDiskAdd(machine, "sda", PLACES_FOREIGN);
-    SystemArrayAdd(machine, {{"sda1"}});
-    MachineCall(machine, [] {
-        u32 version = 5;
-        EXPECT_EQ(PartitionLayoutGetMax(&version, 1), 0);
-        EXPECT_EQ(version, 5U);
-    });
 }
 
 } // namespace

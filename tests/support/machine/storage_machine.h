@@ -291,7 +291,7 @@ struct DISKS_CASE {
     STEPS beside = {}; // all the rest: sleeps, arrays, the duplication tool, faults
     STEPS errors = {}; // the lines of error priority, with process numbers masked
     MACHINE machine = MachineWithConf(CONF_RAID);
-    std::vector<std::string> arguments = {"initsys"};
+    std::vector<std::string> arguments = {}; // none: the preparing command
     std::string szOut = {};
     int status = 0;
     std::string szShell = {}; // the texts given to the shell; none: not compared
@@ -316,6 +316,8 @@ inline std::map<std::string, STEPS> OnEach(const std::vector<std::string> &disks
 inline RUN_RESULT ExpectDisks(const DISKS_CASE &row)
 {
     SCOPED_TRACE(row.szName);
+    const std::vector<std::string> arguments =
+        row.arguments.empty() ? std::vector<std::string>{"initsys"} : row.arguments;
     MACHINE machine = row.machine;
     std::vector<std::string> names;
     for (const auto &[szDisk, steps] : row.disks) {
@@ -329,7 +331,7 @@ inline RUN_RESULT ExpectDisks(const DISKS_CASE &row)
     if (!row.szShell.empty()) {
         ShellWatch(machine);
     }
-    RUN_RESULT result = RunEnds(machine, row.arguments, row.status, row.szOut);
+    RUN_RESULT result = RunEnds(machine, arguments, row.status, row.szOut);
     for (const auto &[szDisk, steps] : row.disks) {
         EXPECT_EQ(CommandsOn(result, szDisk), StepsText(StepsOn(szDisk, steps)));
     }
