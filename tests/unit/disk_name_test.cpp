@@ -7,6 +7,7 @@
 #include <climits>
 #include <cstring>
 #include <string>
+#include <utility>
 
 namespace
 {
@@ -41,6 +42,48 @@ std::string Letters(size_t n)
     std::string name = "sd";
     name.append(n - name.size(), 'x');
     return name;
+}
+
+// What a call leaves of the record and of the bytes that it is not told of: nothing has changed.
+template <typename CALL>
+std::pair<int, std::string> ResultAndText(size_t cb, CALL call)
+{
+    GUARDED_BUFFER out(cb);
+    RecordReset();
+    const int result = call(out.text.data());
+    EXPECT_TRUE(IsRestKept(out));
+    EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
+    return {result, TextOf(out)};
+}
+
+using TOLD = std::pair<int, std::string>;
+
+TOLD NumberGet(const std::string &name, size_t cb = 32)
+{
+    return ResultAndText(cb, [&](char *szDisk) {
+        return DiskPartitionNumGet(name.c_str(), szDisk, static_cast<int>(cb));
+    });
+}
+
+TOLD NumberRemove(const std::string &part, size_t cb = 32)
+{
+    return ResultAndText(cb, [&](char *szDisk) {
+        return DiskPartitionNumRemove(part.c_str(), szDisk, static_cast<int>(cb));
+    });
+}
+
+TOLD NameGet(const std::string &disk, int partNum, size_t cb = 64)
+{
+    return ResultAndText(cb, [&](char *szName) {
+        return DiskDevicePartitionNameGet(disk.c_str(), partNum, szName, cb);
+    });
+}
+
+TOLD PathGet(const std::string &disk, int partNum, size_t cb = 64)
+{
+    return ResultAndText(cb, [&](char *szPath) {
+        return DiskDevicePartitionPathGet(disk.c_str(), partNum, szPath, cb);
+    });
 }
 
 struct INDEX_CASE {
@@ -199,28 +242,17 @@ constexpr NUMBER_CASE NUMBER_CASES[] = {
 TEST(DiskPartitionNumGet, SplitsNameIntoDiskAndNumber)
 {
     for (const NUMBER_CASE &row : NUMBER_CASES) {
-        SCOPED_TRACE(testing::Message() << '"' << row.szName << "\" into " << row.cbDisk);
-        GUARDED_BUFFER disk(row.cbDisk);
-        RecordReset();
-        EXPECT_EQ(DiskPartitionNumGet(row.szName, disk.text.data(), static_cast<int>(disk.cb)),
-                  row.number);
-        EXPECT_EQ(TextOf(disk), row.szDisk);
-        EXPECT_TRUE(IsRestKept(disk));
-        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
+        EXPECT_EQ(NumberGet(row.szName, row.cbDisk), TOLD(row.number, row.szDisk))
+            << '"' << row.szName << "\" into " << row.cbDisk;
     }
 }
 
 TEST(DiskPartitionNumGet, TakesDisksOfUpTo31LettersIntoTheUsualBuffer)
 {
-    GUARDED_BUFFER disk(32);
-    EXPECT_EQ(DiskPartitionNumGet((Letters(31) + "7").c_str(), disk.text.data(), 32), 7);
-    EXPECT_EQ(TextOf(disk), Letters(31));
-    EXPECT_EQ(DiskPartitionNumGet(Letters(31).c_str(), disk.text.data(), 32), 0);
-    EXPECT_EQ(TextOf(disk), Letters(31));
-    EXPECT_EQ(DiskPartitionNumGet(Letters(32).c_str(), disk.text.data(), 32), -1);
-    EXPECT_EQ(TextOf(disk), Letters(31));
-    EXPECT_EQ(DiskPartitionNumGet((Letters(32) + "7").c_str(), disk.text.data(), 32), -1);
-    EXPECT_TRUE(IsRestKept(disk));
+    EXPECT_EQ(NumberGet(Letters(31) + "7"), TOLD(7, Letters(31)));
+    EXPECT_EQ(NumberGet(Letters(31)), TOLD(0, Letters(31)));
+    EXPECT_EQ(NumberGet(Letters(32)), TOLD(-1, Letters(31)));
+    EXPECT_EQ(NumberGet(Letters(32) + "7"), TOLD(-1, Letters(31)));
 }
 
 struct REMOVE_CASE {
@@ -264,44 +296,27 @@ constexpr REMOVE_CASE REMOVE_CASES[] = {
 TEST(DiskPartitionNumRemove, CutsTheNumber)
 {
     for (const REMOVE_CASE &row : REMOVE_CASES) {
-        SCOPED_TRACE(row.szPart);
-        GUARDED_BUFFER disk(32);
-        RecordReset();
-        EXPECT_EQ(DiskPartitionNumRemove(row.szPart, disk.text.data(), 32), 0);
-        EXPECT_EQ(TextOf(disk), row.szDisk);
-        EXPECT_TRUE(IsRestKept(disk));
-        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
+        EXPECT_EQ(NumberRemove(row.szPart), TOLD(0, row.szDisk)) << row.szPart;
     }
 }
 
 TEST(DiskPartitionNumRemove, NeedsRoomForTheWholeNameNotForTheDiskAlone)
 {
+    const std::string untouched(128, UNTOUCHED);
     for (const REMOVE_CASE &row : REMOVE_CASES) {
         SCOPED_TRACE(row.szPart);
-        GUARDED_BUFFER exact(strlen(row.szPart) + 1);
-        EXPECT_EQ(DiskPartitionNumRemove(row.szPart, exact.text.data(), static_cast<int>(exact.cb)),
-                  0);
-        EXPECT_EQ(TextOf(exact), row.szDisk);
-        EXPECT_TRUE(IsRestKept(exact));
-
-        const GUARDED_BUFFER untouched(0);
-        GUARDED_BUFFER small(strlen(row.szPart));
-        EXPECT_EQ(DiskPartitionNumRemove(row.szPart, small.text.data(), static_cast<int>(small.cb)),
-                  -1);
-        EXPECT_EQ(small.text, untouched.text);
+        EXPECT_EQ(NumberRemove(row.szPart, strlen(row.szPart) + 1), TOLD(0, row.szDisk));
+        EXPECT_EQ(NumberRemove(row.szPart, strlen(row.szPart)), TOLD(-1, untouched));
     }
 }
 
 TEST(DiskPartitionNumRemove, TakesUpTo31CharactersIntoTheUsualBuffer)
 {
-    GUARDED_BUFFER disk(32);
-    EXPECT_EQ(DiskPartitionNumRemove(Letters(31).c_str(), disk.text.data(), 32), 0);
-    EXPECT_EQ(TextOf(disk), Letters(31));
-    EXPECT_EQ(DiskPartitionNumRemove((Letters(30) + "1").c_str(), disk.text.data(), 32), 0);
-    EXPECT_EQ(TextOf(disk), Letters(30));
-    EXPECT_EQ(DiskPartitionNumRemove(Letters(32).c_str(), disk.text.data(), 32), -1);
-    EXPECT_EQ(DiskPartitionNumRemove((Letters(31) + "1").c_str(), disk.text.data(), 32), -1);
-    EXPECT_TRUE(IsRestKept(disk));
+    const std::string untouched(128, UNTOUCHED);
+    EXPECT_EQ(NumberRemove(Letters(31)), TOLD(0, Letters(31)));
+    EXPECT_EQ(NumberRemove(Letters(30) + "1"), TOLD(0, Letters(30)));
+    EXPECT_EQ(NumberRemove(Letters(32)), TOLD(-1, untouched));
+    EXPECT_EQ(NumberRemove(Letters(31) + "1"), TOLD(-1, untouched));
 }
 
 struct PARTITION_CASE {
@@ -336,28 +351,15 @@ constexpr PARTITION_CASE PARTITION_CASES[] = {
 TEST(DiskDevicePartitionNameGet, PutsTheNumberBehindTheName)
 {
     for (const PARTITION_CASE &row : PARTITION_CASES) {
-        SCOPED_TRACE(row.szDisk);
-        GUARDED_BUFFER name(32);
-        RecordReset();
-        EXPECT_EQ(DiskDevicePartitionNameGet(row.szDisk, row.partNum, name.text.data(), name.cb),
-                  0);
-        EXPECT_EQ(TextOf(name), row.szName);
-        EXPECT_TRUE(IsRestKept(name));
-        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
+        EXPECT_EQ(NameGet(row.szDisk, row.partNum, 32), TOLD(0, row.szName)) << row.szDisk;
     }
 }
 
 TEST(DiskDevicePartitionPathGet, PutsDevInFront)
 {
     for (const PARTITION_CASE &row : PARTITION_CASES) {
-        SCOPED_TRACE(row.szDisk);
-        GUARDED_BUFFER path(64);
-        RecordReset();
-        EXPECT_EQ(DiskDevicePartitionPathGet(row.szDisk, row.partNum, path.text.data(), path.cb),
-                  0);
-        EXPECT_EQ(TextOf(path), std::string("/dev/") + row.szName);
-        EXPECT_TRUE(IsRestKept(path));
-        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
+        EXPECT_EQ(PathGet(row.szDisk, row.partNum), TOLD(0, std::string("/dev/") + row.szName))
+            << row.szDisk;
     }
 }
 
@@ -365,10 +367,7 @@ TEST(DiskDevicePartitionNameGet, CutsToTheCallersBuffer)
 {
     const std::string whole = "mmcblk0p12";
     for (size_t cb = 1; cb <= whole.size() + 1; cb++) {
-        GUARDED_BUFFER name(cb);
-        EXPECT_EQ(DiskDevicePartitionNameGet("/dev/mmcblk0", 12, name.text.data(), cb), 0);
-        EXPECT_EQ(TextOf(name), whole.substr(0, cb - 1));
-        EXPECT_TRUE(IsRestKept(name));
+        EXPECT_EQ(NameGet("/dev/mmcblk0", 12, cb), TOLD(0, whole.substr(0, cb - 1)));
     }
 }
 
@@ -376,10 +375,7 @@ TEST(DiskDevicePartitionPathGet, CutsToTheCallersBuffer)
 {
     const std::string whole = "/dev/sda12";
     for (size_t cb = 1; cb <= whole.size() + 1; cb++) {
-        GUARDED_BUFFER path(cb);
-        EXPECT_EQ(DiskDevicePartitionPathGet("sda", 12, path.text.data(), cb), 0);
-        EXPECT_EQ(TextOf(path), whole.substr(0, cb - 1));
-        EXPECT_TRUE(IsRestKept(path));
+        EXPECT_EQ(PathGet("sda", 12, cb), TOLD(0, whole.substr(0, cb - 1)));
     }
 }
 
@@ -404,12 +400,8 @@ TEST(DiskDevicePartitionNameGet, CutsLongNames)
     };
     for (const auto &row : rows) {
         SCOPED_TRACE(row.disk);
-        GUARDED_BUFFER name(64);
-        EXPECT_EQ(DiskDevicePartitionNameGet(row.disk.c_str(), 4, name.text.data(), name.cb), 0);
-        EXPECT_EQ(TextOf(name), row.name);
-        GUARDED_BUFFER path(64);
-        EXPECT_EQ(DiskDevicePartitionPathGet(row.disk.c_str(), 4, path.text.data(), path.cb), 0);
-        EXPECT_EQ(TextOf(path), row.path);
+        EXPECT_EQ(NameGet(row.disk, 4), TOLD(0, row.name));
+        EXPECT_EQ(PathGet(row.disk, 4), TOLD(0, row.path));
     }
 }
 

@@ -2,12 +2,10 @@
 #include "md_answer.h"
 #include "md_health.h"
 #include "table.h"
+#include "test_files.h"
 
 #include <array>
 #include <cstdio>
-#include <cstdlib>
-#include <filesystem>
-#include <fstream>
 #include <gtest/gtest.h>
 #include <map>
 #include <string>
@@ -183,16 +181,6 @@ TEST(MdSyncStatusGet, ALevelWithoutRedundancyHasNothingPending)
 
 // A folder laid out as the driver lays it out below /sys/block/mdN/md.
 struct MdFolder : testing::Test {
-    void SetUp() override
-    {
-        char szTemplate[] = "/tmp/mdrequests.XXXXXX";
-        ASSERT_NE(mkdtemp(szTemplate), nullptr);
-        root = szTemplate;
-    }
-    void TearDown() override
-    {
-        std::filesystem::remove_all(root);
-    }
     // Each with its line end.
     void Write(const std::map<std::string, std::string> &files) const
     {
@@ -201,7 +189,8 @@ struct MdFolder : testing::Test {
             std::ofstream(root / name) << text << "\n";
         }
     }
-    std::filesystem::path root;
+    const TEST_FOLDER folder;
+    const std::filesystem::path &root = folder.root;
 };
 
 TEST_F(MdFolder, WithoutAStateThereIsNoArray)
@@ -270,7 +259,6 @@ TEST_F(MdFolder, MoreSlotsThanAnyFormatAllowsAreNotRead)
 struct MdFolderThatChanges : MdFolder {
     void SetUp() override
     {
-        MdFolder::SetUp();
         Write({{"array_state", "clean"},
                {"raid_disks", "2"},
                {"rd0/state", "in_sync"},

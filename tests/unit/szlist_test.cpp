@@ -2,9 +2,9 @@
 #include "nurocore/szlist.h"
 
 #include "last_error.h"
+#include "szlist_walk.h"
 #include "table.h"
 #include "test_files.h"
-#include "test_szlist.h"
 
 #include <climits>
 #include <cstdio>
@@ -408,6 +408,15 @@ TEST(SzListDump, PrintsAddressesAndCounts)
     int result = 0;
     EXPECT_EQ(StdoutOf([&] { result = NLIBCSzListDump(list.p); }), expected + szLast);
     EXPECT_EQ(result, cchLast);
+}
+
+// Thousands of random operations on a list and on a plain vector.
+TEST(SzListRandom, TellsTheSameAsAVector)
+{
+    std::mt19937 random(20080516);
+    for (int nRound = 0; nRound < 20; nRound++) {
+        ASSERT_EQ(SzListWalk(RandomBytes(random, 2600)), "") << "round " << nRound;
+    }
 }
 
 } // namespace
