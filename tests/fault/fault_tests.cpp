@@ -19,7 +19,6 @@
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
-#include <fstream>
 #include <sstream>
 
 namespace
@@ -31,15 +30,12 @@ using STRINGS = std::vector<string>;
 
 constexpr int CALLS_MAX = 2000; // a call that fails for ever ends the loop here
 constexpr char EVERY_CALL[] = "*";
-constexpr char MINIMUM_OF[] = "minimum of ";
 
 struct OPTIONS {
     bool fAll = false;
     bool fShow = false;
     std::uint64_t every = 8;
     std::uint64_t thin = 1;
-    string szFilter = {};
-    string szMinimum = {};
 };
 
 // ---- what can fail how -------------------------------------------------------------------------
@@ -229,6 +225,9 @@ TALLY SituationSweep(const OPTIONS &options, const SITUATION &situation, size_t 
     machine.fCallsTold = true;
     SWEEP sweep = {options, situation, MachineTry(machine, situation.words), {}, worker, 0, 0, {}};
     sweep.counts = CallsCount(MachineCalls());
+    for (size_t row = 0; row < AllowanceCount(); row++) {
+        sweep.tally.allowed[AllowanceText(row)] = 0; // one that nothing needs is told, too
+    }
     const VERDICT verdict = Judge(situation, sweep.clean, sweep.clean);
     for (const string &szWrong : verdict.wrong) {
         sweep.tally.wrong.push_back(situation.szName + ", undisturbed: " + szWrong + "\n");
@@ -245,81 +244,28 @@ TALLY SituationSweep(const OPTIONS &options, const SITUATION &situation, size_t 
     return sweep.tally;
 }
 
-// ---- the suite ---------------------------------------------------------------------------------
+} // namespace
 
-// A minimum is about all situations.
-bool IsWhole(const OPTIONS &options)
+int main(int argc, char *argv[])
 {
-    return options.szFilter.empty() || options.szFilter.starts_with(MINIMUM_OF);
-}
-
-// Lines "COMMAND NUMBER": no fewer injections than were once reached.
-void MinimumCheck(const OPTIONS &options, std::map<string, std::uint64_t> &byCommand)
-{
-    std::ifstream file(options.szMinimum);
-    string szCommand;
-    std::uint64_t minimum = 0;
-    VerdictTell(string(MINIMUM_OF) + "all", file.good() ? "" : "cannot read " + options.szMinimum);
-    while (file >> szCommand >> minimum) {
-        const string szReached = to_string(byCommand[szCommand]) + " injections";
-        VerdictTell(string(MINIMUM_OF) + szCommand,
-                    byCommand[szCommand] >= minimum ? ""
-                                                    : szReached + ", it had " + to_string(minimum),
-                    szReached);
-    }
-}
-
-void TotalsTell(const OPTIONS &options, const std::vector<SITUATION> &situations,
-                const std::vector<TEST_TOTAL> &totals)
-{
-    std::map<string, std::uint64_t> allowed;
-    std::map<string, std::uint64_t> byCommand;
-    std::uint64_t injections = 0;
-    for (size_t i = 0; i < totals.size(); i++) {
-        const string &szName = situations[i].szName;
-        byCommand[szName.substr(0, szName.find(':'))] += totals[i].done;
-        injections += totals[i].done;
-        for (const auto &[szReason, n] : totals[i].allowed) {
-            allowed[szReason] += n;
-        }
-    }
-    for (size_t row = 0; row < AllowanceCount(); row++) {
-        const string szReason = AllowanceText(row);
-        printf("allowed %s times: %s\n", to_string(allowed[szReason]).c_str(), szReason.c_str());
-    }
-    if (!options.szMinimum.empty() && IsWhole(options)) {
-        MinimumCheck(options, byCommand);
-    }
-    printf("fault: %s injections\n", to_string(injections).c_str());
-}
-
-int SituationsTry(const OPTIONS &options)
-{
-    std::vector<SITUATION> situations = SituationsMake();
-    std::erase_if(situations, [&](const SITUATION &situation) {
-        return !IsWhole(options) && !VerdictWanted(situation.szName, options.szFilter);
-    });
+    OPTIONS options;
+    const std::vector<SITUATION> situations = SituationsMake();
     SUITE suite = {.szDone = "injections", .work = [&](size_t test, size_t worker) {
                        return SituationSweep(options, situations[test], worker);
                    }};
     for (const SITUATION &situation : situations) {
         suite.names.push_back(situation.szName);
     }
-    TotalsTell(options, situations, SuiteRun(suite));
-    return EXIT_SUCCESS;
-}
-
-} // namespace
-
-int main(int argc, char *argv[])
-{
-    OPTIONS options;
     const bool fTaken = OptionsTake(argc, argv,
                                     {{"--all", &options.fAll},
                                      {"--every", &options.every},
                                      {"--thin", &options.thin},
-                                     {"", &options.szFilter},
-                                     {"--minimum", &options.szMinimum},
+                                     {"", &suite.szFilter},
+                                     {"--minimum", &suite.szMinimum},
                                      {"--show", &options.fShow}});
-    return fTaken ? SituationsTry(options) : EXIT_FAILURE;
+    if (!fTaken) {
+        return EXIT_FAILURE;
+    }
+    SuiteRun(suite);
+    return EXIT_SUCCESS;
 }

@@ -3,7 +3,7 @@
 // Kills the tool at every system call of every command that changes something, runs the command
 // again, and compares what the machine is like with what an undisturbed run makes of it.
 //
-//     kill_tests [--all] [--every N] [FILTER]
+//     kill_tests [--all] [--every N] [--minimum FILE] [FILTER]
 //
 // The tool is killed alone, so that what it has started comes to its own end, or with all of that
 // at any system call of its own processes. Without --all, one in N points is tried.
@@ -14,13 +14,13 @@
 #include "storage_machine.h"
 #include "suite.h"
 #include "verdict.h"
+#include "words.h"
 
 #include <algorithm>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
 #include <filesystem>
-#include <fstream>
 #include <map>
 #include <set>
 #include <sstream>
@@ -34,25 +34,14 @@ using std::to_string;
 using STRINGS = std::vector<string>;
 namespace fs = std::filesystem;
 
-constexpr std::uint64_t MINIMUM = 1000;
-constexpr char MINIMUM_NAME[] = "minimum of kills";
 constexpr char RUNNER[] = "ARRAYCTL_RUNNER";
 
 struct OPTIONS {
     bool fAll = false;
     std::uint64_t every = 3; // odd, so that both kinds of killing get their turn
-    string szFilter = {};
 };
 
 // ---- machines that remember --------------------------------------------------------------------
-
-string FileText(const char *szPath)
-{
-    std::ifstream file(szPath, std::ios::binary);
-    std::ostringstream text;
-    text << file.rdbuf();
-    return text.str();
-}
 
 string Superblock(const string &szPartition)
 {
@@ -173,7 +162,7 @@ void VolumeRemembers(MACHINE &machine)
 
 MACHINE Remembering(MACHINE machine)
 {
-    static const string szStepper = FileText(KILL_STEPPER);
+    static const string szStepper = FileText(KILL_STEPPER).value_or("");
     MachineFile(machine, "/stepper", szStepper, 0755);
     MachineFolder(machine, "/state/superblock");
     DiskRemembers(machine, "sda");
@@ -278,7 +267,7 @@ STRINGS StateTake()
     for (const char *const szFolder : {"sys/block", "state"}) {
         for (const fs::directory_entry &entry : fs::recursive_directory_iterator(root / szFolder)) {
             const string szPath = "/" + fs::relative(entry.path(), root).string();
-            const string szText = entry.is_regular_file() ? FileText(entry.path().c_str()) : "\n";
+            const string szText = FileText(entry.path().string()).value_or("");
             lines.push_back(szPath + " " + szText.substr(0, szText.find('\n')));
         }
     }
@@ -367,7 +356,7 @@ void StateCompare(const KILL_CASE &subject, const POINT &point, const STRINGS &e
     rest.insert(rest.end(), instead.begin(), instead.end());
     if (rest.empty()) {
         for (const string &szReason : reasons) {
-            tally.allowed[szReason]++;
+            tally.allowed[subject.szName + ": " + szReason]++;
         }
         return;
     }
@@ -413,36 +402,12 @@ TALLY CaseRun(const OPTIONS &options, const KILL_CASE &subject, size_t worker)
     return tally;
 }
 
-// ---- the suite ---------------------------------------------------------------------------------
+} // namespace
 
-// The minimum is about all cases.
-bool IsWhole(const OPTIONS &options)
+int main(int argc, char *argv[])
 {
-    return options.szFilter.empty() || options.szFilter == MINIMUM_NAME;
-}
-
-void TotalsTell(const OPTIONS &options, const SUITE &suite, const std::vector<TEST_TOTAL> &totals)
-{
-    std::uint64_t kills = 0;
-    for (size_t i = 0; i < totals.size(); i++) {
-        kills += totals[i].done;
-        for (const auto &[szReason, n] : totals[i].allowed) {
-            printf("allowed %s times: %s: %s\n", to_string(n).c_str(), suite.names[i].c_str(),
-                   szReason.c_str());
-        }
-    }
-    if (IsWhole(options)) {
-        VerdictTell(MINIMUM_NAME, kills >= MINIMUM ? "" : "it was " + to_string(MINIMUM),
-                    to_string(kills) + " kills");
-    }
-}
-
-int CasesTry(const OPTIONS &options)
-{
+    OPTIONS options;
     std::vector<KILL_CASE> cases = CasesMake();
-    std::erase_if(cases, [&](const KILL_CASE &subject) {
-        return !IsWhole(options) && !VerdictWanted(subject.szName, options.szFilter);
-    });
     SUITE suite = {.szDone = "kills", .work = [&](size_t test, size_t worker) {
                        return CaseRun(options, cases[test], worker);
                    }};
@@ -450,17 +415,14 @@ int CasesTry(const OPTIONS &options)
         suite.names.push_back(subject.szName);
         subject.machine = Remembering(std::move(subject.machine));
     }
-    TotalsTell(options, suite, SuiteRun(suite));
+    const bool fTaken = OptionsTake(argc, argv,
+                                    {{"--all", &options.fAll},
+                                     {"--every", &options.every},
+                                     {"", &suite.szFilter},
+                                     {"--minimum", &suite.szMinimum}});
+    if (!fTaken) {
+        return EXIT_FAILURE;
+    }
+    SuiteRun(suite);
     return EXIT_SUCCESS;
-}
-
-} // namespace
-
-int main(int argc, char *argv[])
-{
-    OPTIONS options;
-    const bool fTaken = OptionsTake(
-        argc, argv,
-        {{"--all", &options.fAll}, {"--every", &options.every}, {"", &options.szFilter}});
-    return fTaken ? CasesTry(options) : EXIT_FAILURE;
 }

@@ -2,13 +2,12 @@
 #include "oracle_machine.h"
 
 #include "oracle_dice.h"
+#include "words.h"
 
 #include <algorithm>
 #include <cctype>
 #include <cstdio>
 #include <cstdlib>
-#include <fstream>
-#include <iterator>
 
 namespace
 {
@@ -249,8 +248,7 @@ const string &FixtureRead(const string &szName)
     static std::map<string, string> texts;
     string &text = texts[szName];
     if (text.empty()) {
-        std::ifstream file(ORACLE_FIXTURES "/examine/" + szName + ".txt", std::ios::binary);
-        text.assign(std::istreambuf_iterator<char>(file), {});
+        text = FileText(ORACLE_FIXTURES "/examine/" + szName + ".txt").value_or("");
     }
     if (text.empty()) {
         fprintf(stderr, "no fixture %s\n", szName.c_str());
@@ -595,7 +593,7 @@ string Quoted(const string &szText)
     return text + "\"";
 }
 
-string FileText(const string &szPath, const std::optional<string> &szFile)
+string ShownFile(const string &szPath, const std::optional<string> &szFile)
 {
     return "  " + szPath + ": " + (szFile ? Quoted(*szFile) : "missing") + "\n";
 }
@@ -635,20 +633,20 @@ std::string OracleCaseText(const ORACLE_CASE &subject)
     for (const string &szWord : subject.words) {
         text += " " + szWord;
     }
-    text += "\n" + FileText(ORACLE_CONF_PATH, machine.szConf);
+    text += "\n" + ShownFile(ORACLE_CONF_PATH, machine.szConf);
     for (const auto &[szName, table] : machine.disks) {
         text += "  disk " + szName + "\n";
         for (const auto &[number, partition] : table) {
             const string szPath = "/sys/block/" + szName + "/" + szName + to_string(number);
-            text += FileText(szPath + "/start", partition.szStart);
-            text += FileText(szPath + "/size", partition.szSize);
+            text += ShownFile(szPath + "/start", partition.szStart);
+            text += ShownFile(szPath + "/size", partition.szSize);
         }
     }
     for (const string &szMember : machine.md0Members) {
         text += "  member of md0: " + szMember + "\n";
     }
     for (const auto &[szHost, szInfo] : machine.hosts) {
-        text += FileText("/sys/class/scsi_host/" + szHost + "/nuro_pm_info", szInfo);
+        text += ShownFile("/sys/class/scsi_host/" + szHost + "/nuro_pm_info", szInfo);
     }
     text += machine.fScsiHostFolder ? "" : "  no folder /sys/class/scsi_host\n";
     for (const string &szMarker : machine.markers) {

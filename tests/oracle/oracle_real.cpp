@@ -9,14 +9,12 @@
 #include "oracle_plan.h"
 #include "suite.h"
 #include "verdict.h"
+#include "words.h"
 
 #include <algorithm>
 #include <cstdio>
 #include <cstdlib>
-#include <fstream>
-#include <iterator>
 #include <regex>
-#include <sstream>
 
 namespace
 {
@@ -33,29 +31,10 @@ struct RECORD {
     ORACLE_SEEN seen{};
 };
 
-optional<string> FileRead(const string &szPath)
-{
-    std::ifstream file(szPath, std::ios::binary);
-    if (!file) {
-        return std::nullopt;
-    }
-    return string(std::istreambuf_iterator<char>(file), {});
-}
-
-vector<string> Split(const string &szText, char separator)
-{
-    vector<string> parts;
-    std::istringstream stream(szText);
-    for (string part; std::getline(stream, part, separator);) {
-        parts.push_back(part);
-    }
-    return parts;
-}
-
 // A file of a record that must be there.
 string PartRead(const string &szFolder, const string &szPart, ORACLE_SEEN &seen)
 {
-    const optional<string> szText = FileRead(szFolder + "/" + szPart);
+    const optional<string> szText = FileText(szFolder + "/" + szPart);
     if (!szText) {
         seen.problems.push_back("no record of " + szPart);
     }
@@ -66,7 +45,7 @@ void MachineTake(const string &szFolder, RECORD &record)
 {
     record.machine.disks.clear();
     record.machine.md0Members.clear();
-    for (const string &szLine : Split(PartRead(szFolder, "machine", record.seen), '\n')) {
+    for (const string &szLine : SplitLines(PartRead(szFolder, "machine", record.seen))) {
         const vector<string> words = Split(szLine, ' ');
         if (words[0] == "disk") {
             record.machine.disks[words[1]];
@@ -96,7 +75,7 @@ void ReplyTake(const string &szFolder, const string &szReply, const ORACLE_WORDS
 void CallsTake(const string &szFolder, RECORD &record)
 {
     static const std::regex pause(R"(^clock_nanosleep\(.*\{tv_sec=([0-9]+), tv_nsec=0\}.*\) = 0)");
-    for (string szLine : Split(PartRead(szFolder, "calls", record.seen), '\n')) {
+    for (string szLine : SplitLines(PartRead(szFolder, "calls", record.seen))) {
         szLine.erase(0, szLine.find_first_not_of('\037'));
         std::smatch match;
         if (std::regex_search(szLine, match, pause)) {
@@ -121,7 +100,7 @@ void LogTake(const string &szFolder, ORACLE_SEEN &seen)
                                                      {"err", 3},   {"warn", 4},  {"notice", 5},
                                                      {"info", 6},  {"debug", 7}};
     static const std::regex own("^.{15} [^ ]+ user\\.([a-z]+) arrayctl: (.*)$");
-    for (const string &szLine : Split(PartRead(szFolder, "log", seen), '\n')) {
+    for (const string &szLine : SplitLines(PartRead(szFolder, "log", seen))) {
         std::smatch match;
         if (std::regex_match(szLine, match, own)) {
             seen.lines.emplace_back(priorities.at(match[1]), match[2]);
@@ -133,7 +112,7 @@ void LogTake(const string &szFolder, ORACLE_SEEN &seen)
 
 void ErrorLogTake(const string &szFolder, ORACLE_SEEN &seen)
 {
-    for (const string &szLine : Split(FileRead(szFolder + "/errors").value_or(""), '\n')) {
+    for (const string &szLine : SplitLines(FileText(szFolder + "/errors").value_or(""))) {
         seen.errorLog.push_back(OracleErrorLineMask(szLine));
     }
 }
@@ -152,7 +131,7 @@ RECORD RecordTake(const PLAN &plan, const string &szFolder)
     record.seen.szOut = PartRead(szFolder, "out", record.seen);
     record.seen.szErr = PartRead(szFolder, "err", record.seen);
     record.seen.nStatus = atoi(PartRead(szFolder, "status", record.seen).c_str());
-    for (const string &szMarker : Split(PartRead(szFolder, "markers", record.seen), '\n')) {
+    for (const string &szMarker : SplitLines(PartRead(szFolder, "markers", record.seen))) {
         record.seen.markers.insert(szMarker);
     }
     return record;

@@ -13,6 +13,7 @@
 #include "sandbox.h"
 #include "suite.h"
 #include "verdict.h"
+#include "words.h"
 
 #include <algorithm>
 #include <cstdio>
@@ -39,13 +40,8 @@ struct OPTIONS {
 // A line of the operation error log without its time stamp.
 vector<string> ErrorLogTake()
 {
-    vector<string> lines;
-    const string szAll = MachineFileRead(ORACLE_ERROR_LOG_PATH).value_or("");
-    for (size_t at = 0; at < szAll.size();) {
-        const size_t end = std::min(szAll.find('\n', at), szAll.size());
-        lines.push_back(OracleErrorLineMask(szAll.substr(at, end - at)));
-        at = end + 1;
-    }
+    vector<string> lines = SplitLines(MachineFileRead(ORACLE_ERROR_LOG_PATH).value_or(""));
+    std::transform(lines.begin(), lines.end(), lines.begin(), OracleErrorLineMask);
     return lines;
 }
 
@@ -122,7 +118,7 @@ void MachinesTry(const OPTIONS &options)
     for (u64 i = 0; i < options.machines; i++) {
         suite.names.push_back(SEED_OF + to_string(options.seed + i));
     }
-    (void)SuiteRun(suite);
+    SuiteRun(suite);
 }
 
 // One seed is one machine.

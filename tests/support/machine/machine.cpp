@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: MIT
 #include "sandbox.h"
 
+#include "words.h"
+
 #include <algorithm>
 #include <cctype>
 
@@ -39,17 +41,6 @@ void BelowErase(MAP &map, const std::string &szFolder)
             return IsBelow(entry, szFolder);
         }
     });
-}
-
-std::vector<std::string> WordsSplit(std::string_view szCommand)
-{
-    std::vector<std::string> words;
-    for (size_t iStart = 0; iStart <= szCommand.size();) {
-        const size_t iEnd = std::min(szCommand.find(' ', iStart), szCommand.size());
-        words.emplace_back(szCommand.substr(iStart, iEnd - iStart));
-        iStart = iEnd + 1;
-    }
-    return words;
 }
 
 } // namespace
@@ -141,7 +132,7 @@ void MachineMdAdd(MACHINE &machine, const MACHINE_MD &md)
 
 void MachineTool(MACHINE &machine, std::string_view szCommand, const TOOL_ANSWER &answer)
 {
-    MachineTool(machine, WordsSplit(szCommand), answer);
+    MachineTool(machine, Split(szCommand, ' '), answer);
 }
 
 void MachineTool(MACHINE &machine, const std::vector<std::string> &argv, const TOOL_ANSWER &answer)

@@ -2,6 +2,7 @@
 #include "private_root.h"
 
 #include "wire.h"
+#include "words.h"
 
 #include <cerrno>
 #include <cstdio>
@@ -202,17 +203,11 @@ std::string CoverageBind()
 
 std::string FileCopy(const std::string &szFrom, const std::string &szTo)
 {
-    FILE *const p = fopen(szFrom.c_str(), "re");
-    if (p == nullptr) {
+    const std::optional<std::string> bytes = FileText(szFrom);
+    if (!bytes) {
         return "cannot read " + szFrom + ": " + strerror(errno);
     }
-    std::string szBytes;
-    char ach[65536];
-    for (size_t cb = 0; (cb = fread(ach, 1, sizeof(ach), p)) > 0;) {
-        szBytes.append(ach, cb);
-    }
-    (void)fclose(p);
-    TextWrite(Inside(szTo), szBytes, 0755);
+    TextWrite(Inside(szTo), *bytes, 0755);
     return "";
 }
 

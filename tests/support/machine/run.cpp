@@ -7,6 +7,7 @@
 #include "transcript.h"
 #include "verdict.h"
 #include "wire.h"
+#include "words.h"
 
 #include <gtest/gtest-spi.h>
 #include <gtest/gtest.h>
@@ -108,17 +109,6 @@ std::vector<char *> Pointers(std::vector<std::string> &strings)
     return pointers;
 }
 
-std::vector<std::string> WordsOf(const char *szText)
-{
-    std::vector<std::string> words;
-    for (const char *pch = szText; pch != nullptr && *pch != '\0';) {
-        const size_t cb = strcspn(pch, " ");
-        words.emplace_back(pch, cb);
-        pch += cb + strspn(pch + cb, " ");
-    }
-    return words;
-}
-
 std::vector<std::string> EnvironmentOf(const MACHINE &machine)
 {
     std::vector<std::string> environment;
@@ -139,11 +129,11 @@ std::vector<std::string> EnvironmentOf(const MACHINE &machine)
                                std::vector<std::string> environment,
                                const std::function<void()> &prepare = {})
 {
-    std::vector<std::string> argv = WordsOf(getenv("ARRAYCTL_RUNNER"));
-    const std::string szExecuted = argv.empty() ? szProgram : argv[0];
-    if (argv.empty()) {
-        argv.push_back(szName);
-    } else {
+    std::vector<std::string> argv = {szName};
+    std::string szExecuted = szProgram;
+    if (const char *const szRunner = getenv("ARRAYCTL_RUNNER")) {
+        argv = Split(szRunner, ' ');
+        szExecuted = argv[0];
         argv.insert(argv.end(), {"-0", szName, szProgram});
     }
     argv.insert(argv.end(), arguments.begin(), arguments.end());
@@ -582,21 +572,10 @@ RUN_RESULT IdleCall(const MACHINE &machine, const std::function<void()> &body)
 
 std::vector<std::string> MachineCalls()
 {
-    std::vector<std::string> calls;
-    const std::string szAll = MachineFileRead(WIRE_CALLS).value_or("");
-    for (size_t iStart = 0; iStart < szAll.size();) {
-        const size_t iEnd = std::min(szAll.find('\n', iStart), szAll.size());
-        calls.push_back(szAll.substr(iStart, iEnd - iStart));
-        iStart = iEnd + 1;
-    }
-    return calls;
+    return SplitLines(MachineFileRead(WIRE_CALLS).value_or(""));
 }
 
 std::optional<std::string> MachineFileRead(const std::string &szPath)
 {
-    const int fd = open((PrivateRootFolder() + szPath).c_str(), O_RDONLY | O_CLOEXEC);
-    if (fd < 0) {
-        return std::nullopt;
-    }
-    return MemoryFileTake(fd);
+    return FileText(PrivateRootFolder() + szPath);
 }

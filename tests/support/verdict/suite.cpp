@@ -8,6 +8,7 @@
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <fstream>
 #include <sstream>
 #include <sys/socket.h>
 #include <sys/wait.h>
@@ -20,8 +21,17 @@ constexpr size_t WRONG_SHOWN = 5; // texts of one worker in one test
 constexpr size_t WRONG_SIZE = 32768;
 constexpr size_t REPORT_SIZE = 65536;
 
+constexpr char MINIMUM_OF[] = "minimum of ";
+
 using std::string;
 using std::to_string;
+
+struct TEST_TOTAL {
+    std::uint64_t reports = 0; // workers that have told of it
+    std::uint64_t done = 0;
+    std::map<string, std::uint64_t> allowed = {};
+    string szWrong = {};
+};
 
 // ---- options -----------------------------------------------------------------------------------
 
@@ -42,6 +52,57 @@ void UsageTell(const std::vector<OPTION> &options)
         szUsage += string(" [") + option.szName + VALUES[option.pTo.index()] + "]";
     }
     fprintf(stderr, "%s\n", szUsage.c_str());
+}
+
+// ---- the whole ---------------------------------------------------------------------------------
+
+// A minimum is about all tests.
+bool IsWhole(const SUITE &suite)
+{
+    return suite.szFilter.empty() || suite.szFilter.starts_with(MINIMUM_OF);
+}
+
+bool IsWanted(const SUITE &suite, size_t test)
+{
+    return IsWhole(suite) || VerdictWanted(suite.names[test], suite.szFilter);
+}
+
+void MinimumCheck(const SUITE &suite, std::map<string, std::uint64_t> &byCommand)
+{
+    std::ifstream file(suite.szMinimum);
+    string szCommand;
+    std::uint64_t minimum = 0;
+    VerdictTell(string(MINIMUM_OF) + "all", file.good() ? "" : "cannot read " + suite.szMinimum);
+    while (file >> szCommand >> minimum) {
+        const string szReached = to_string(byCommand[szCommand]) + " " + suite.szDone;
+        VerdictTell(string(MINIMUM_OF) + szCommand,
+                    byCommand[szCommand] >= minimum ? ""
+                                                    : szReached + ", it had " + to_string(minimum),
+                    szReached);
+    }
+}
+
+void TotalsTell(const SUITE &suite, const std::vector<TEST_TOTAL> &totals)
+{
+    std::map<string, std::uint64_t> allowed;
+    std::map<string, std::uint64_t> byCommand;
+    std::uint64_t done = 0;
+    for (size_t test = 0; test < totals.size(); test++) {
+        byCommand[suite.names[test].substr(0, suite.names[test].find(':'))] += totals[test].done;
+        done += totals[test].done;
+        for (const auto &[szReason, n] : totals[test].allowed) {
+            allowed[szReason] += n;
+        }
+    }
+    for (const auto &[szReason, n] : allowed) {
+        printf("allowed %s times: %s\n", to_string(n).c_str(), szReason.c_str());
+    }
+    if (!suite.szMinimum.empty() && IsWhole(suite)) {
+        MinimumCheck(suite, byCommand);
+    }
+    if (*suite.szDone != '\0') {
+        printf("%s %s in all\n", to_string(done).c_str(), suite.szDone);
+    }
 }
 
 // ---- workers -----------------------------------------------------------------------------------
@@ -78,7 +139,9 @@ void WorkerStart(const SUITE &suite, size_t worker, const int (&fds)[2])
     }
     close(fds[0]);
     for (size_t test = 0; test < suite.names.size(); test++) {
-        TallySend(fds[1], test, suite.work(test, worker));
+        if (IsWanted(suite, test)) {
+            TallySend(fds[1], test, suite.work(test, worker));
+        }
     }
     exit(EXIT_SUCCESS);
 }
@@ -138,7 +201,7 @@ bool OptionsTake(int argc, char *argv[], const std::vector<OPTION> &options)
     return true;
 }
 
-std::vector<TEST_TOTAL> SuiteRun(const SUITE &suite)
+void SuiteRun(const SUITE &suite)
 {
     int fds[2] = {-1, -1};
     if (socketpair(AF_UNIX, SOCK_SEQPACKET, 0, fds) != 0) {
@@ -162,9 +225,9 @@ std::vector<TEST_TOTAL> SuiteRun(const SUITE &suite)
     while (wait(nullptr) > 0) {
     }
     for (size_t test = 0; test < totals.size(); test++) {
-        if (totals[test].reports < VerdictWorkers()) {
+        if (IsWanted(suite, test) && totals[test].reports < VerdictWorkers()) {
             TestTell(suite, test, totals[test]);
         }
     }
-    return totals;
+    TotalsTell(suite, totals);
 }

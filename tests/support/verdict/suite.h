@@ -34,17 +34,13 @@ struct TALLY {
 };
 
 struct SUITE {
-    std::vector<std::string> names = {};
-    const char *szDone; // what is counted in each test; may be empty
+    std::vector<std::string> names = {}; // "COMMAND: what is special", where there is a minimum
+    const char *szDone;                  // what is counted in each test; may be empty
     std::function<TALLY(size_t test, size_t worker)> work;
+    std::string szFilter = {};  // of the tests that are run
+    std::string szMinimum = {}; // a file of lines "COMMAND NUMBER": no fewer than once reached
 };
 
 // Every worker, one for each processor, does its share of every test, in a process of its own.
-// Tells of each test as soon as all have done theirs, and returns what was counted.
-struct TEST_TOTAL {
-    std::uint64_t reports = 0; // workers that have told of it
-    std::uint64_t done = 0;
-    std::map<std::string, std::uint64_t> allowed = {};
-    std::string szWrong = {};
-};
-std::vector<TEST_TOTAL> SuiteRun(const SUITE &suite);
+// Tells of each test as soon as all have done theirs, and at last how often what was allowed.
+void SuiteRun(const SUITE &suite);

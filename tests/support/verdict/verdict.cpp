@@ -13,13 +13,6 @@ namespace
 
 constexpr double MILLISECONDS = 1000;
 
-// In one piece, as workers share the output.
-void Say(const std::string &szText)
-{
-    (void)fwrite(szText.data(), 1, szText.size(), stdout);
-    (void)fflush(stdout);
-}
-
 } // namespace
 
 void VerdictTell(const std::string &szName, const std::string &szWrong, const std::string &szNote)
@@ -30,12 +23,8 @@ void VerdictTell(const std::string &szName, const std::string &szWrong, const st
     for (std::string szLine; std::getline(lines, szLine);) {
         szText += "    " + szLine + "\n";
     }
-    Say(szText);
-}
-
-void VerdictProgress(const std::string &szText)
-{
-    Say("... " + szText + "\n");
+    (void)fwrite(szText.data(), 1, szText.size(), stdout); // in one piece: workers share the output
+    (void)fflush(stdout);
 }
 
 bool VerdictWanted(const std::string &szName, const std::string &szFilter)

@@ -10,9 +10,6 @@
 void VerdictTell(const std::string &szName, const std::string &szWrong,
                  const std::string &szNote = {});
 
-// Prints a sign of life: a program that says nothing for too long counts as one that hangs.
-void VerdictProgress(const std::string &szText);
-
 // Whether a test of that name was asked for: the filter is a part of the name, or a pattern as of
 // files; an empty one takes everything.
 bool VerdictWanted(const std::string &szName, const std::string &szFilter);
