@@ -16,18 +16,13 @@ import tempfile
 sys.path.insert(0, os.path.join(os.path.dirname(__file__), "../support/verdict"))
 import calls  # noqa: E402
 import verdict  # noqa: E402
+from verdict import ROOT, read  # noqa: E402
 
-ROOT = os.path.abspath(os.path.join(os.path.dirname(__file__), "../.."))
 PROGRAM = os.path.join(os.path.abspath(sys.argv[1]), "tool/arrayctl")
 COMMANDS = ("status", "destroy", "newvol", "initsys", "initsys-dd", "enumformatalldisks",
             "enumformatalldisks_indualhead_install")
 MODEL = "maxdisks=4\nsupportraid=yes\nusbportcfg=0xf0\ninternalportcfg=0xf\n"
 LITERAL = r'((?:"(?:[^"\\]|\\.)*"\s*)+)'
-
-
-def read(path):
-    with open(os.path.join(ROOT, path), encoding="utf-8") as file:
-        return file.read()
 
 
 def sources():

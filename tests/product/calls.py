@@ -3,19 +3,17 @@
 import glob
 import os
 import re
+import sys
 
-ROOT = os.path.abspath(os.path.join(os.path.dirname(__file__), "../.."))
+sys.path.insert(0, os.path.join(os.path.dirname(__file__), "../support/verdict"))
+from verdict import ROOT, read  # noqa: E402
+
 ENTRY = ("tool/arrayctl.cpp", "main")
 NO_CODE = re.compile(r'//[^\n]*|"(?:[^"\\\n]|\\.)*"')
 NAME = re.compile(r"[A-Za-z_]\w*")
 # What a definition is called: a macro, a type, or the word in front of its arguments, size or value.
 HEAD = re.compile(r"#define\s+(\w+)|(?:struct|enum(?: class)?)\s+(\w+)\s*(?::\s*\w+\s*)?\{|using\s+(\w+)"
                   r"|[\w:<>,&*\s\[\]]*?(?<![\w:])(\w+)(?:\[\w*\])*\s*(?:\(|=|\{|;)")
-
-
-def read(path):
-    with open(os.path.join(ROOT, path), encoding="utf-8") as file:
-        return file.read()
 
 
 def files():

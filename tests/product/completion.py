@@ -12,8 +12,8 @@ import sys
 
 sys.path.insert(0, os.path.join(os.path.dirname(__file__), "../support/verdict"))
 import verdict  # noqa: E402
+from verdict import ROOT  # noqa: E402
 
-ROOT = os.path.abspath(os.path.join(os.path.dirname(__file__), "../.."))
 ARRAYS = "mount -t tmpfs none /sys/block && mkdir /sys/block/md0 /sys/block/md12 /sys/block/md127 " \
          "/sys/block/md_d0 /sys/block/sda"
 PROMPT = "ready> "

@@ -18,15 +18,10 @@ import tempfile
 
 sys.path.insert(0, os.path.join(os.path.dirname(__file__), "../support/verdict"))
 import verdict  # noqa: E402
+from verdict import ROOT, read  # noqa: E402
 
-ROOT = os.path.abspath(os.path.join(os.path.dirname(__file__), "../.."))
 PROMPT = "appliance# "
 ESCAPE = re.compile(r"\x1b\[\d*m")
-
-
-def read(path):
-    with open(os.path.join(ROOT, path), encoding="utf-8") as file:
-        return file.read()
 
 
 def run(*command, status=0):

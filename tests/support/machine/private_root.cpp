@@ -8,8 +8,9 @@
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
-#include <dirent.h>
 #include <fcntl.h>
+#include <filesystem>
+#include <ftw.h>
 #include <linux/mount.h>
 #include <sched.h>
 #include <sstream>
@@ -56,14 +57,23 @@ std::string Inside(const std::string &szPath)
     return g_szRoot + szPath;
 }
 
+// Opened as the flags say. False when it could not be written, as a whole.
+bool BytesWrite(const std::string &szPath, std::string_view szText, int flags)
+{
+    const int fd = open(szPath.c_str(), O_WRONLY | O_CLOEXEC | flags, 0600);
+    const bool fDone =
+        fd >= 0 && write(fd, szText.data(), szText.size()) == static_cast<ssize_t>(szText.size());
+    if (fd >= 0) {
+        close(fd);
+    }
+    return fDone;
+}
+
 void TextWrite(const std::string &szPath, std::string_view szText, mode_t mode)
 {
-    const int fd = open(szPath.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, 0600);
-    if (fd < 0 || write(fd, szText.data(), szText.size()) != static_cast<ssize_t>(szText.size()) ||
-        fchmod(fd, mode) != 0) {
+    if (!BytesWrite(szPath, szText, O_CREAT | O_TRUNC) || chmod(szPath.c_str(), mode) != 0) {
         Die("write " + szPath);
     }
-    close(fd);
 }
 
 void FoldersMake(const std::string &szFolder)
@@ -88,17 +98,6 @@ std::string Refused(const std::string &szWhat)
     return szWhat + ": " + strerror(errno) + HINT;
 }
 
-bool MapWrite(const char *szPath, const std::string &szText)
-{
-    const int fd = open(szPath, O_WRONLY | O_CLOEXEC);
-    const bool fDone =
-        fd >= 0 && write(fd, szText.data(), szText.size()) == static_cast<ssize_t>(szText.size());
-    if (fd >= 0) {
-        close(fd);
-    }
-    return fDone;
-}
-
 std::string NamespacesEnter()
 {
     const std::string szUser = std::to_string(getuid());
@@ -106,9 +105,9 @@ std::string NamespacesEnter()
     if (unshare(CLONE_NEWUSER | CLONE_NEWNS) != 0) {
         return Refused("unshare of the user and mount namespaces");
     }
-    (void)MapWrite("/proc/self/setgroups", "deny");
-    if (!MapWrite("/proc/self/uid_map", "0 " + szUser + " 1") ||
-        !MapWrite("/proc/self/gid_map", "0 " + szGroup + " 1")) {
+    (void)BytesWrite("/proc/self/setgroups", "deny", 0);
+    if (!BytesWrite("/proc/self/uid_map", "0 " + szUser + " 1", 0) ||
+        !BytesWrite("/proc/self/gid_map", "0 " + szGroup + " 1", 0)) {
         return Refused("map of the user namespace");
     }
     if (mount(nullptr, "/", nullptr, MS_REC | MS_PRIVATE, nullptr) != 0) {
@@ -134,20 +133,24 @@ std::string RootMount()
     return "";
 }
 
+std::string Bind(const std::string &szPath)
+{
+    return mount(szPath.c_str(), Inside(szPath).c_str(), nullptr, MS_BIND | MS_REC, nullptr) == 0
+               ? ""
+               : Refused("bind of " + szPath);
+}
+
 std::string ReadOnlyBind(const std::string &szFolder)
 {
     FoldersMake(szFolder);
-    const std::string szTarget = Inside(szFolder);
-    if (mount(szFolder.c_str(), szTarget.c_str(), nullptr, MS_BIND | MS_REC, nullptr) != 0) {
-        return Refused("bind of " + szFolder);
-    }
+    const std::string szRefused = Bind(szFolder);
     struct mount_attr attributes = {};
     attributes.attr_set = MOUNT_ATTR_RDONLY;
-    if (syscall(SYS_mount_setattr, -1, szTarget.c_str(), AT_RECURSIVE, &attributes,
-                sizeof(attributes)) != 0) {
+    if (szRefused.empty() && syscall(SYS_mount_setattr, -1, Inside(szFolder).c_str(), AT_RECURSIVE,
+                                     &attributes, sizeof(attributes)) != 0) {
         return Refused("read-only bind of " + szFolder);
     }
-    return "";
+    return szRefused;
 }
 
 // The host's libraries and programs; a folder that is a link on the host is the same link inside.
@@ -175,10 +178,7 @@ std::string HostFoldersBind()
 std::string NullBind()
 {
     TextWrite(Inside("/dev/null"), "", 0666);
-    if (mount("/dev/null", Inside("/dev/null").c_str(), nullptr, MS_BIND, nullptr) != 0) {
-        return Refused("bind of /dev/null");
-    }
-    return "";
+    return Bind("/dev/null");
 }
 
 std::string FromEnvironment(const char *szName, const char *szDefault)
@@ -195,10 +195,7 @@ std::string CoverageBind()
         return "";
     }
     FoldersMake(szFolder);
-    if (mount(szFolder.c_str(), Inside(szFolder).c_str(), nullptr, MS_BIND, nullptr) != 0) {
-        return Refused("bind of " + szFolder);
-    }
-    return "";
+    return Bind(szFolder);
 }
 
 std::string FileCopy(const std::string &szFrom, const std::string &szTo)
@@ -267,52 +264,32 @@ std::string PrivateRootMake()
 
 // ---- emptying ----------------------------------------------------------------------------------
 
-const std::set<std::string> &KeptNothing()
+int EntryRemove(const char *szPath, const struct stat *, int, struct FTW *)
 {
-    static const std::set<std::string> none;
-    return none;
+    (void)remove(szPath);
+    return 0;
 }
 
 // Removes what is in the folder, never leaving its file system, so that nothing that is bound into
 // the private root can be reached.
-void FolderEmpty(int fdParent, const char *szName, dev_t device, const std::set<std::string> &kept)
+void FolderEmpty(const std::string &szFolder, const std::set<std::string> &kept)
 {
-    const int fd = openat(fdParent, szName, O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
-    struct stat info = {};
-    if (fd < 0 || fstat(fd, &info) != 0 || info.st_dev != device) {
-        if (fd >= 0) {
-            close(fd);
-        }
-        return;
-    }
-    DIR *const pFolder = fdopendir(fd);
-    for (struct dirent *pEntry = readdir(pFolder); pEntry != nullptr; pEntry = readdir(pFolder)) {
-        const std::string szEntry = pEntry->d_name;
-        if (szEntry == "." || szEntry == ".." || kept.contains(szEntry)) {
-            continue;
-        }
-        if (pEntry->d_type == DT_DIR) {
-            FolderEmpty(dirfd(pFolder), pEntry->d_name, device, KeptNothing());
-            (void)unlinkat(dirfd(pFolder), pEntry->d_name, AT_REMOVEDIR);
-        } else {
-            (void)unlinkat(dirfd(pFolder), pEntry->d_name, 0);
+    constexpr int DESCRIPTORS = 16;
+    for (const std::filesystem::directory_entry &entry :
+         std::filesystem::directory_iterator(Inside(szFolder))) {
+        if (!kept.contains(entry.path().filename())) {
+            (void)nftw(entry.path().c_str(), EntryRemove, DESCRIPTORS,
+                       FTW_DEPTH | FTW_MOUNT | FTW_PHYS);
         }
     }
-    (void)closedir(pFolder);
 }
 
 void PrivateRootEmpty()
 {
-    const int fdRoot = open(g_szRoot.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-    struct stat info = {};
-    if (fdRoot < 0 || fstat(fdRoot, &info) != 0) {
-        Die("open " + g_szRoot);
-    }
-    FolderEmpty(fdRoot, ".", info.st_dev, KEPT_TOP);
-    FolderEmpty(fdRoot, "bin", info.st_dev, KeptNothing());
-    FolderEmpty(fdRoot, "sbin", info.st_dev, KeptNothing());
-    FolderEmpty(fdRoot, "dev", info.st_dev, KEPT_DEV);
-    close(fdRoot);
+    FolderEmpty("/", KEPT_TOP);
+    FolderEmpty("/bin", {});
+    FolderEmpty("/sbin", {});
+    FolderEmpty("/dev", KEPT_DEV);
 }
 
 // ---- laying out --------------------------------------------------------------------------------

@@ -24,10 +24,16 @@ GRACE_SECONDS = 10  # for what is ended to clean up behind itself
 lock = threading.Lock()
 
 
+def read(path):
+    """The text of a file of the tree."""
+    with open(os.path.join(ROOT, path), encoding="utf-8") as file:
+        return file.read()
+
+
 def silence(times=1):
     """Seconds; see silence.sh."""
-    with open(os.path.join(ROOT, "tests/support/verdict/silence.sh"), encoding="utf-8") as file:
-        number = re.search(r"^SILENCE_SECONDS=\$\{ARRAYCTL_SILENCE:-(\d+)\}$", file.read(), re.M).group(1)
+    text = read("tests/support/verdict/silence.sh")
+    number = re.search(r"^SILENCE_SECONDS=\$\{ARRAYCTL_SILENCE:-(\d+)\}$", text, re.M).group(1)
     return times * float(os.environ.get("ARRAYCTL_SILENCE") or number)
 
 
