@@ -268,7 +268,8 @@ carry() {
 
 # --- the tool ----------------------------------------------------------------------------------
 
-# report MD HEALTH REBUILD LEVEL BYTES MEMBER:WORD...: the report that the tool is to print.
+# report MD HEALTH REBUILD LEVEL BYTES MEMBER[:WORD]...: the report that the tool is to print. Behind a
+# member without a word stands "Normal".
 report() {
     printf '/dev/md%s is running, status: %s, rebuilding: %s\n' "$1" "$2" "$3"
     printf 'Device level: %s\n' "$4"
@@ -276,7 +277,9 @@ report() {
     printf 'Disk: \n'
     shift 5
     for member in "$@"; do
-        printf '\t [/dev/%s: %s]\n' "${member%%:*}" "${member#*:}"
+        word=${member#"${member%%:*}"}
+        word=${word#:}
+        printf '\t [/dev/%s: %s]\n' "${member%%:*}" "${word:-Normal}"
     done
     printf '\n'
 }
@@ -295,7 +298,7 @@ answers() {
     return 1
 }
 
-# check_report NAME MD HEALTH REBUILD LEVEL MEMBER:WORD...
+# check_report NAME MD HEALTH REBUILD LEVEL MEMBER[:WORD]...
 check_report() {
     name=$1
     number=$2
@@ -319,7 +322,7 @@ clean, checking|NORMAL|Progressing...[
 clean, degraded, recovering|DEGRADE|Progressing...[
 clean, degraded, resyncing (DELAYED)|DEGRADE|Waiting...'
 
-# check_status NAME MD STATE LEVEL MEMBER:WORD...: mdadm must see the array in the state that the test
+# check_status NAME MD STATE LEVEL MEMBER[:WORD]...: mdadm must see the array in the state that the test
 # meant to make, and the tool must report it.
 check_status() {
     name=$1

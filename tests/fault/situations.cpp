@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: MIT
 #include "situations.h"
 
+#include "removal_machine.h"
 #include "storage_machine.h"
 
 #include <cerrno>
@@ -11,10 +12,7 @@ namespace
 
 using STRINGS = std::vector<std::string>;
 
-constexpr char UUID_OURS[] = "5b1f2c3d:4e5f6071:8293a4b5:00000002";
-constexpr char UUID_THEIRS[] = "5b1f2c3d:4e5f6071:8293a4b5:00000003";
 constexpr char NO_COMMAND[] = "help";
-constexpr char STOP_MD2[] = "/sbin/mdadm -S /dev/md2";
 
 constexpr const char *TOOLS[] = {"/sbin/mdadm",    "/sbin/sfdisk",   "/sbin/pvs",
                                  "/sbin/lvremove", "/sbin/vgremove", "/sbin/pvremove",
@@ -115,23 +113,13 @@ void Examined(MACHINE &machine, const std::string &szName, const std::string &sz
     MachineTool(machine, "/sbin/mdadm -E /dev/" + szName, {.szOut = Report(szUuid)});
 }
 
-void DiskWithPartitions(MACHINE &machine, const std::string &szDisk, int nPartition)
-{
-    constexpr std::uint64_t SECTORS = 1048576;
-    MachineDiskAdd(machine, szDisk);
-    for (int i = 1; i <= nPartition; i++) {
-        MachinePartitionAdd(machine, szDisk, i, 2048 + SECTORS * static_cast<std::uint64_t>(i),
-                            SECTORS);
-    }
-}
-
 // md2 on the third partition of so many disks.
 MACHINE WithDataArray(int nDisk)
 {
     MACHINE machine = MachineMake();
     for (const MACHINE_MEMBER &member : Members(nDisk)) {
-        DiskWithPartitions(machine, member.szName.substr(0, 3), 3);
-        Examined(machine, member.szName, UUID_OURS);
+        DiskWithPartitionsAdd(machine, member.szName.substr(0, 3), 3);
+        Examined(machine, member.szName, UUID_MD2);
     }
     MachineMdAdd(machine, {.nMd = 2, .level = nDisk > 2 ? 5 : 1, .members = Members(nDisk)});
     return machine;
@@ -193,8 +181,8 @@ void DestroySituations(std::vector<SITUATION> &all)
     machine = WithDataArray(2);
     MachinePartitionAdd(machine, "sda", 4, 9000000, 1048576);
     MachinePartitionAdd(machine, "sdb", 4, 9000000, 1048576);
-    Examined(machine, "sda4", UUID_THEIRS);
-    Examined(machine, "sdb4", UUID_THEIRS);
+    Examined(machine, "sda4", UUID_MD3);
+    Examined(machine, "sdb4", UUID_MD3);
     Add(all, "another array on the same disks", machine, {"destroy", "2"});
 
     machine = WithDataArray(2);

@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: MIT
 #include "oracle_compare.h"
 
+#include "words.h"
+
 #include <algorithm>
 #include <cctype>
 
@@ -11,16 +13,6 @@ using std::string;
 using std::to_string;
 using std::vector;
 using TEXTS = vector<string>;
-
-string WordsText(const ORACLE_WORDS &words)
-{
-    string text;
-    for (const string &szWord : words) {
-        const bool fPlain = !szWord.empty() && szWord.find(' ') == string::npos;
-        text += (text.empty() ? "" : " ") + (fPlain ? szWord : "\"" + szWord + "\"");
-    }
-    return text;
-}
 
 string LineText(int priority, const string &szLine)
 {

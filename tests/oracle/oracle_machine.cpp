@@ -571,28 +571,6 @@ ORACLE_WORDS WordsMake(DICE &dice)
     return words;
 }
 
-string Quoted(const string &szText)
-{
-    string text = "\"";
-    for (const char letter : szText) {
-        switch (letter) {
-        case '\n':
-            text += "\\n";
-            break;
-        case '\r':
-            text += "\\r";
-            break;
-        case '\t':
-            text += "\\t";
-            break;
-        default:
-            text += letter;
-            break;
-        }
-    }
-    return text + "\"";
-}
-
 string ShownFile(const string &szPath, const std::optional<string> &szFile)
 {
     return "  " + szPath + ": " + (szFile ? Quoted(*szFile) : "missing") + "\n";

@@ -30,6 +30,30 @@ inline std::vector<std::string> SplitLines(std::string_view text)
     return lines;
 }
 
+// In double quotes, with what cannot stand in them as it is escaped.
+inline std::string Quoted(std::string_view text)
+{
+    constexpr std::string_view ESCAPED = "\n\r\t\"\\";
+    constexpr std::string_view LETTERS = "nrt\"\\";
+    std::string quoted = "\"";
+    for (const char ch : text) {
+        const size_t i = ESCAPED.find(ch);
+        quoted += i == std::string_view::npos ? std::string(1, ch) : std::string{'\\', LETTERS[i]};
+    }
+    return quoted + "\"";
+}
+
+// An argument list with blanks between; an argument is quoted that would not be seen as one.
+inline std::string WordsText(const std::vector<std::string> &words)
+{
+    std::string text;
+    for (const std::string &szWord : words) {
+        const bool fPlain = szWord.find_first_of(" \t\n\"\\") == std::string::npos;
+        text += (text.empty() ? "" : " ") + (fPlain && !szWord.empty() ? szWord : Quoted(szWord));
+    }
+    return text;
+}
+
 // None when it cannot be opened; a folder has no text.
 inline std::optional<std::string> FileText(const std::string &szPath)
 {

@@ -19,7 +19,7 @@ level_case() {
     shift 4
     lines=
     for member in "$@"; do
-        lines="$member:Normal $lines"
+        lines="$member $lines"
     done
     array 2 "-e $format -l $level" "$@"
     check_status "$name" 2 clean "$word" $lines
@@ -40,18 +40,17 @@ level_case 'linear with a 0.90 superblock' linear JBOD 0.90 sda1 sdb1 sdc1
 
 # A 64 MiB partition under a 0.90 superblock gives its last 64 KiB, and no more.
 array 0 '-e 0.90 -l 1' sda2 sdb2
-report 0 NORMAL None 'RAID 1' 67043328 sdb2:Normal sda2:Normal >"$EXPECTED"
+report 0 NORMAL None 'RAID 1' 67043328 sdb2 sda2 >"$EXPECTED"
 check 'report' answers 0 arrayctl status 0
 verdict 'the size of a small mirror to the byte'
 drop_arrays 0
 
 array 12 '-l 1' sdc4 sdd4
-check_status 'a mirror of more than 4 GiB' 12 clean 'RAID 1' sdd4:Normal sdc4:Normal
+check_status 'a mirror of more than 4 GiB' 12 clean 'RAID 1' sdd4 sdc4
 drop_arrays 12
 
 array 3 '-l 0' sda4 sdb4 sdc4 sdd4
-check_status 'a stripe of more than 16 GiB' 3 clean 'RAID 0' \
-    sdd4:Normal sdc4:Normal sdb4:Normal sda4:Normal
+check_status 'a stripe of more than 16 GiB' 3 clean 'RAID 0' sdd4 sdc4 sdb4 sda4
 drop_arrays 3
 
 check_not_found 'an array without a node' 7

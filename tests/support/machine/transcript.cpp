@@ -2,6 +2,7 @@
 #include "transcript.h"
 
 #include "wire.h"
+#include "words.h"
 
 #include <gtest/gtest.h>
 
@@ -86,34 +87,6 @@ void EventParse(std::string_view &szRecord, RUN_EVENT &event)
             event.argv.emplace_back(szField);
         }
     }
-}
-
-std::string WordQuoted(const std::string &szWord)
-{
-    if (!szWord.empty() && szWord.find_first_of(" \t\n\"\\") == std::string::npos) {
-        return szWord;
-    }
-    std::string szQuoted = "\"";
-    for (const char ch : szWord) {
-        if (ch == '\n') {
-            szQuoted += "\\n";
-            continue;
-        }
-        if (ch == '"' || ch == '\\') {
-            szQuoted += '\\';
-        }
-        szQuoted += ch;
-    }
-    return szQuoted + "\"";
-}
-
-std::string WordsText(const std::vector<std::string> &words)
-{
-    std::string szText;
-    for (const std::string &szWord : words) {
-        szText += (szText.empty() ? "" : " ") + WordQuoted(szWord);
-    }
-    return szText;
 }
 
 void EventProblemsAdd(const RUN_EVENT &event, RUN_RESULT &result)
