@@ -7,6 +7,7 @@
 #include <gtest/gtest.h>
 
 #include <set>
+#include <sstream>
 #include <string>
 #include <vector>
 
@@ -54,41 +55,31 @@ MANY_DISKS InternalDisks(int nDisk)
     return many;
 }
 
-// Disks of expansion units: {"f", true, "abc"} is sdf, sdfa, sdfb and sdfc, all of them reported.
-struct UNIT {
-    const char *szPort;
-    bool fPortItself;
-    const char *szBays;
-};
-
-std::vector<std::string> NamesOf(const std::vector<UNIT> &units)
+// The disks behind the ports, "f+" with the port's own: "f+abc gd" is sdf, sdfa, sdfb, sdfc, sdgd.
+std::vector<std::string> NamesOf(const std::string &szUnits)
 {
     std::vector<std::string> names;
-    for (const UNIT &unit : units) {
-        const std::string szPort = std::string("sd") + unit.szPort;
-        if (unit.fPortItself) {
-            names.push_back(szPort);
-        }
-        for (const char *pch = unit.szBays; *pch != '\0'; pch++) {
-            names.push_back(szPort + *pch);
+    std::istringstream units(szUnits);
+    for (std::string szUnit; units >> szUnit;) {
+        const std::string szPort = "sd" + szUnit.substr(0, 1);
+        for (const char chBay : szUnit.substr(1)) {
+            names.push_back(chBay == '+' ? szPort : szPort + chBay);
         }
     }
     return names;
 }
 
 // Each host tells of one disk.
-MANY_DISKS UnitDisks(const std::vector<UNIT> &units)
+MANY_DISKS UnitDisks(const std::string &szUnits)
 {
     MANY_DISKS many = ManyDisks("max_sys_raid_disks=60\nraidgroup_split_units=60\nsupportraid=yes\n"
                                 "support_dual_head=yes\nusbportcfg=0x0\nesataportcfg=0x3ffffff\n");
-    for (const std::string &szDisk : NamesOf(units)) {
+    for (const std::string &szDisk : NamesOf(szUnits)) {
         DiskAdd(many, szDisk);
         ExpansionUnitAdd(many.machine, "host" + szDisk, "/dev/" + szDisk);
     }
     return many;
 }
-
-constexpr char ALL_BAYS[] = "abcdefghijklmnopqrstuvwxyz";
 
 // What nurodd and mdadm -C are given to work on.
 std::vector<std::string> NamedDevices(const RUN_EVENT &event)
@@ -188,7 +179,7 @@ TEST(MemberList, OfTheDuplicationToolHoldsWholePartitionsAndKeepsTheRedirection)
 
 struct UNITS_CASE {
     const char *szName;
-    std::vector<UNIT> units;
+    const char *szUnits;
     size_t nDisk;
     size_t nNamed;
     const char *szLast; // the list's last disk
@@ -196,53 +187,20 @@ struct UNITS_CASE {
     const char *szNoteDuplicate;
 };
 
-const UNITS_CASE UNITS_CASES[] = {
-    {"40 names of four letters",
-     {{"f", false, ALL_BAYS}, {"g", false, "abcdefghijklmn"}},
-     40,
-     40,
-     "sdgn",
-     "",
+constexpr UNITS_CASE UNITS_CASES[] = {
+    {"40 names of four letters", "fabcdefghijklmnopqrstuvwxyz gabcdefghijklmn", 40, 40, "sdgn", "",
      "37 of 80"},
     {"46 names of four letters, the last that fit",
-     {{"f", false, ALL_BAYS}, {"g", false, "abcdefghijklmnopqrst"}},
-     46,
-     46,
-     "sdgt",
-     "",
-     "49 of 92"},
-    {"48 names of four letters",
-     {{"f", false, ALL_BAYS}, {"g", false, "abcdefghijklmnopqrstuv"}},
-     48,
-     46,
-     "sdgt",
-     "2 of 48",
-     "53 of 96"},
+     "fabcdefghijklmnopqrstuvwxyz gabcdefghijklmnopqrst", 46, 46, "sdgt", "", "49 of 92"},
+    {"48 names of four letters", "fabcdefghijklmnopqrstuvwxyz gabcdefghijklmnopqrstuv", 48, 46,
+     "sdgt", "2 of 48", "53 of 96"},
     {"60 names of four letters",
-     {{"f", false, ALL_BAYS}, {"g", false, ALL_BAYS}, {"h", false, "abcdefgh"}},
-     60,
-     46,
-     "sdgt",
-     "14 of 60",
-     "77 of 120"},
-    {"50 names of three and four letters",
-     {{"f", true, ALL_BAYS}, {"g", true, "abcdefghijklmnopqrstuv"}},
-     50,
-     46,
-     "sdgr",
-     "4 of 50",
-     "56 of 100"},
+     "fabcdefghijklmnopqrstuvwxyz gabcdefghijklmnopqrstuvwxyz habcdefgh", 60, 46, "sdgt",
+     "14 of 60", "77 of 120"},
+    {"50 names of three and four letters", "f+abcdefghijklmnopqrstuvwxyz g+abcdefghijklmnopqrstuv",
+     50, 46, "sdgr", "4 of 50", "56 of 100"},
     {"48 names: where a long one has no room, a short one may still fit, to the last character",
-     {{"e", true, ""},
-      {"f", true, ALL_BAYS},
-      {"g", true, "abcdefghijklmno"},
-      {"h", true, ""},
-      {"i", true, "a"},
-      {"j", true, ""}},
-     48,
-     47,
-     "sdj",
-     "1 of 48",
+     "e+ f+abcdefghijklmnopqrstuvwxyz g+abcdefghijklmno h+ i+a j+", 48, 47, "sdj", "1 of 48",
      "52 of 96"},
 };
 
@@ -250,7 +208,7 @@ TEST(MemberList, OfTheSystemArraysHoldsWholePartitions)
 {
     for (const UNITS_CASE &row : UNITS_CASES) {
         SCOPED_TRACE(row.szName);
-        MANY_DISKS many = UnitDisks(row.units);
+        MANY_DISKS many = UnitDisks(row.szUnits);
         ASSERT_EQ(many.disks.size(), row.nDisk);
         const RUN_RESULT result = RunEnds(many.machine, {"initsys"}, 0);
         ExpectPartitionsOnly(result, many);
@@ -270,7 +228,7 @@ TEST(MemberList, OfTheDuplicationToolIsMadeOfTheListsOfTheArrays)
 {
     for (const UNITS_CASE &row : UNITS_CASES) {
         SCOPED_TRACE(row.szName);
-        MANY_DISKS many = UnitDisks(row.units);
+        MANY_DISKS many = UnitDisks(row.szUnits);
         const RUN_RESULT result = RunEnds(many.machine, {"initsys-dd"}, 0);
         ExpectPartitionsOnly(result, many);
         const std::string szNote = NOTE + std::string(row.szNote) + NO_ROOM;
@@ -283,7 +241,7 @@ TEST(MemberList, OfTheDataArrayHoldsWholePartitions)
 {
     for (const UNITS_CASE &row : UNITS_CASES) {
         SCOPED_TRACE(row.szName);
-        MANY_DISKS many = UnitDisks(row.units);
+        MANY_DISKS many = UnitDisks(row.szUnits);
         const RUN_RESULT result =
             RunEnds(many.machine, {"newvol"}, 0, "Creating RAID 5 volume... \n");
         ExpectPartitionsOnly(result, many);

@@ -1,11 +1,10 @@
 // SPDX-License-Identifier: MIT
-#include "last_error.h"
 #include "nurocore/error.h"
 #include "nurocore/pipe.h"
 #include "nurocore/process.h"
 #include "nurocore/szlist.h"
 #include "nurocore/types.h"
-#include "sandbox.h"
+#include "steps.h"
 #include "streams.h"
 
 #include <cerrno>
@@ -25,38 +24,28 @@ namespace
 
 MACHINE MachineWithFault(const MACHINE_FAULT &fault)
 {
-    MACHINE machine = MachineMake();
-    machine.faults = {fault};
-    return machine;
+    return WithFault(MachineMake(), fault);
 }
 
 // ---- fork --------------------------------------------------------------------------------------
 
 TEST(ForkCloseIo, LogsAFailedFork)
 {
-    const MACHINE machine = MachineWithFault({.szFunction = "fork", .error = EAGAIN});
-    const RUN_RESULT result = MachineCall(machine, [] { EXPECT_QUIET(NLIBCForkCloseIo(), -1); });
-    EXPECT_EQ(LogText(result),
-              "<11>process.cpp:# fork error, errno=Resource temporarily unavailable\n");
+    (void)ExpectCall(
+        {.szName = "no process",
+         .machine = MachineWithFault({.szFunction = "fork", .error = EAGAIN}),
+         .call = NLIBCForkCloseIo,
+         .result = -1,
+         .steps = {{"fault fork 1"},
+                   {"<11>process.cpp:# fork error, errno=Resource temporarily unavailable"}}});
 }
 
 TEST(Fork, SetsACodeAndLogsNothing)
 {
-    const MACHINE machine = MachineWithFault({.szFunction = "fork", .error = ENOMEM});
-    QuietCall(machine, [] {
+    QuietCall(MachineWithFault({.szFunction = "fork"}), [] {
         EXPECT_FAILS(NLIBCFork(0), -1, ERR_FORK_FAILED);
         EXPECT_STREQ(NLIBCErrGetFile(), "process.cpp");
     });
-}
-
-// The first child is the process that the fork of the grandchild fails in.
-TEST(Fork, LogsWhenTheGrandchildOfADaemonCannotBeMade)
-{
-    const MACHINE machine = MachineWithFault({.szFunction = "fork", .nCall = 2, .error = ENOMEM});
-    const RUN_RESULT result =
-        MachineCall(machine, [] { EXPECT_QUIET(NLIBCFork(FORK_DAEMONIZE), -1); });
-    EXPECT_EQ(LogText(result),
-              "<11>process.cpp:# Failed to fork(). errno=[12/Cannot allocate memory]\n");
 }
 
 volatile sig_atomic_t g_childStatus = -1;
@@ -66,17 +55,20 @@ void ChildStatusKeep(int, siginfo_t *pInfo, void *)
     g_childStatus = pInfo->si_code == CLD_EXITED ? pInfo->si_status : -2;
 }
 
-TEST(Fork, TheFirstChildOfADaemonEndsWith255WhenItCannotFork)
+// The first child is the process that the fork of the grandchild fails in; it ends with 255.
+TEST(Fork, LogsWhenTheGrandchildOfADaemonCannotBeMade)
 {
-    const MACHINE machine = MachineWithFault({.szFunction = "fork", .nCall = 2, .error = ENOMEM});
-    MachineCall(machine, [] {
+    const MACHINE machine = MachineWithFault({.szFunction = "fork", .nCall = 2});
+    const RUN_RESULT result = MachineCall(machine, [] {
         struct sigaction action = {};
         action.sa_sigaction = ChildStatusKeep;
         action.sa_flags = SA_SIGINFO;
         ASSERT_EQ(sigaction(SIGCHLD, &action, nullptr), 0);
-        EXPECT_EQ(NLIBCFork(FORK_DAEMONIZE), -1);
+        EXPECT_QUIET(NLIBCFork(FORK_DAEMONIZE), -1);
         EXPECT_EQ(g_childStatus, 255);
     });
+    EXPECT_EQ(LogText(result),
+              "<11>process.cpp:# Failed to fork(). errno=[12/Cannot allocate memory]\n");
 }
 
 // One call for each flag, and the fork of the grandchild.
@@ -129,8 +121,7 @@ TEST(Fork, AppliesItsFlagsInOrder)
 
 TEST(Execl, LeavesTheCodeOfTheRunWhenItCannotFork)
 {
-    const MACHINE machine = MachineWithFault({.szFunction = "fork", .error = EAGAIN});
-    QuietCall(machine, [] {
+    QuietCall(MachineWithFault({.szFunction = "fork", .error = EAGAIN}), [] {
         EXPECT_FAILS(NLIBCExecl("/bin/umount", "/dev/md2", NULL), -1, ERR_CHILD_FAILED);
     });
 }
@@ -139,31 +130,29 @@ TEST(Execl, LeavesTheCodeOfTheRunWhenItCannotFork)
 
 constexpr char FCNTL_FAILED[] = "<11>pipe.cpp:# fcntl failed, Permission denied\n";
 
-TEST(Popen, LogsThatItsEndStaysCloseOnExecAndGoesOn)
+// A tool that prints a row is read with this mode, though descriptors cannot be controlled.
+RUN_RESULT PopenWithoutFcntl(const char *szMode)
 {
     MACHINE machine = MachineWithFault({.szFunction = "fcntl", .error = EACCES});
     MachineTool(machine, "/sbin/pvs", {.szOut = "row\n", .status = 1});
-    const RUN_RESULT result = MachineCall(machine, [] {
+    return MachineCall(machine, [szMode] {
         RecordReset();
-        FILE *const pStream = NLIBCPopen("/sbin/pvs", "r", NULL);
+        FILE *const pStream = NLIBCPopen("/sbin/pvs", szMode, NULL);
         ASSERT_NE(pStream, nullptr);
         EXPECT_EQ(StreamRead(pStream), "row\n");
         EXPECT_EQ(NLIBCPclose(pStream), 256);
         EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
     });
-    EXPECT_EQ(LogText(result), FCNTL_FAILED);
+}
+
+TEST(Popen, LogsThatItsEndStaysCloseOnExecAndGoesOn)
+{
+    EXPECT_EQ(LogText(PopenWithoutFcntl("r")), FCNTL_FAILED);
 }
 
 TEST(Popen, DoesNotTouchItsEndWhenAskedNotTo)
 {
-    MACHINE machine = MachineWithFault({.szFunction = "fcntl", .error = EACCES});
-    MachineTool(machine, "/sbin/pvs", {.szOut = "row\n"});
-    QuietCall(machine, [] {
-        FILE *const pStream = NLIBCPopen("/sbin/pvs", "re", NULL);
-        ASSERT_NE(pStream, nullptr);
-        EXPECT_EQ(StreamRead(pStream), "row\n");
-        EXPECT_EQ(NLIBCPclose(pStream), 0);
-    });
+    EXPECT_EQ(LogText(PopenWithoutFcntl("re")), "");
 }
 
 // With standard input and output closed the pipe's ends are 0 and 1, so the tool's end has its
@@ -228,7 +217,6 @@ TEST(Popen, SetsACodeAndLogsNothingWhenItFails)
 
 // ---- lists -------------------------------------------------------------------------------------
 
-constexpr char PARAMETER_ERROR[] = "<11>szlist_join.cpp:# Parameter error\n";
 constexpr char OUT_OF_MEMORY[] = "<11>szlist_join.cpp:# Out of memory!!\n";
 
 PNLIBSZLIST ListOfTwo()
@@ -241,56 +229,35 @@ PNLIBSZLIST ListOfTwo()
 
 TEST(SzListJoin, LogsEachBadParameter)
 {
-    PNLIBSZLIST pList = ListOfTwo();
-    char achText[16] = "old";
-    char *pszText = achText;
-    char *pszNone = nullptr;
-    int cbText = sizeof(achText);
-    int cbNegative = -1;
-    const struct {
-        PNLIBSZLIST pList;
-        const char *szSeparator;
-        char **pszText;
-        int *pcbText;
-    } rows[] = {
-        {nullptr, ",", &pszText, &cbText}, {pList, nullptr, &pszText, &cbText},
-        {pList, ",", nullptr, &cbText},    {pList, ",", &pszNone, &cbText},
-        {pList, ",", &pszText, nullptr},   {pList, ",", &pszText, &cbNegative},
-    };
-    for (const auto &row : rows) {
-        const RUN_RESULT result = MachineCall(MachineMake(), [&row, &achText] {
-            EXPECT_FAILS(NLIBCSzListJoin(row.pList, row.szSeparator, row.pszText, row.pcbText), -1,
-                         ERR_BAD_PARAMETER);
+    const RUN_RESULT result = MachineCall(MachineMake(), [] {
+        PNLIBSZLIST pList = ListOfTwo();
+        char achText[16] = "old";
+        char *pszText = achText;
+        char *pszNone = nullptr;
+        int cbText = sizeof(achText);
+        int cbNegative = -1;
+        const auto refused = [&achText](long long call) {
+            EXPECT_EQ(call, -1);
+            EXPECT_EQ(NLIBCErrGet(), ERR_BAD_PARAMETER);
             EXPECT_STREQ(NLIBCErrGetFile(), "szlist_join.cpp");
             EXPECT_STREQ(achText, "old");
-        });
-        EXPECT_EQ(LogText(result), PARAMETER_ERROR);
-    }
-    NLIBCSzListFree(pList);
-}
-
-TEST(SzListDump2Str, LogsEachBadParameter)
-{
-    PNLIBSZLIST pList = ListOfTwo();
-    char achText[16] = "old";
-    const struct {
-        PNLIBSZLIST pList;
-        const char *szSeparator;
-        char *szText;
-        int cbText;
-    } rows[] = {
-        {nullptr, ",", achText, 16}, {pList, nullptr, achText, 16}, {pList, ",", nullptr, 16},
-        {pList, ",", achText, 0},    {pList, ",", achText, -1},     {pList, ",", achText, INT_MIN},
-    };
-    for (const auto &row : rows) {
-        const RUN_RESULT result = MachineCall(MachineMake(), [&row, &achText] {
-            EXPECT_FAILS(NLIBCSzListDump2Str(row.pList, row.szSeparator, row.szText, row.cbText),
-                         -1, ERR_BAD_PARAMETER);
-            EXPECT_STREQ(achText, "old");
-        });
-        EXPECT_EQ(LogText(result), PARAMETER_ERROR);
-    }
-    NLIBCSzListFree(pList);
+            RecordReset();
+        };
+        refused(NLIBCSzListJoin(nullptr, ",", &pszText, &cbText));
+        refused(NLIBCSzListJoin(pList, nullptr, &pszText, &cbText));
+        refused(NLIBCSzListJoin(pList, ",", nullptr, &cbText));
+        refused(NLIBCSzListJoin(pList, ",", &pszNone, &cbText));
+        refused(NLIBCSzListJoin(pList, ",", &pszText, nullptr));
+        refused(NLIBCSzListJoin(pList, ",", &pszText, &cbNegative));
+        refused(NLIBCSzListDump2Str(nullptr, ",", achText, 16));
+        refused(NLIBCSzListDump2Str(pList, nullptr, achText, 16));
+        refused(NLIBCSzListDump2Str(pList, ",", nullptr, 16));
+        refused(NLIBCSzListDump2Str(pList, ",", achText, 0));
+        refused(NLIBCSzListDump2Str(pList, ",", achText, -1));
+        refused(NLIBCSzListDump2Str(pList, ",", achText, INT_MIN));
+        NLIBCSzListFree(pList);
+    });
+    ExpectSteps(result, 12 * STEPS{{"<11>szlist_join.cpp:# Parameter error"}});
 }
 
 TEST(SzListJoin, LogsNothingWhenItWorks)

@@ -3,7 +3,6 @@
 // What a library function answers when an allocation fails in the middle of it: the lists and the
 // readers that fill them.
 #include "hwcontrol/disk_port.h"
-#include "last_error.h"
 #include "nurocore/error.h"
 #include "nurocore/file.h"
 #include "nurocore/keyvalue.h"
@@ -11,7 +10,7 @@
 #include "nurocore/szlist.h"
 #include "nurocore/text.h"
 #include "nurostoragecore/partition_enum.h"
-#include "storage_machine.h"
+#include "steps.h"
 
 #include <cerrno>
 #include <cstdio>
@@ -119,21 +118,27 @@ TEST(WithoutMemory, MergedListsAreNone)
     }
 }
 
+// A body on a new list of so many long items.
+std::function<std::string()> OnList(int nItem,
+                                    const std::function<std::string(PNLIBSZLIST &)> &body)
+{
+    return [nItem, body] {
+        LIST_SCOPE list(nItem, 'a', SZLIST_UNSORTED);
+        return list.p == nullptr || list.p->nItem != nItem ? "no list" : body(list.p);
+    };
+}
+
 // A failed growth leaves the list to its owner.
 TEST(WithoutMemory, AListThatCannotGrowStaysAsItWas)
 {
-    const auto body = [] {
-        LIST_SCOPE list(1, 'a', SZLIST_UNSORTED);
-        if (list.p == nullptr || list.p->nItem != 1) {
-            return std::string("no list");
-        }
-        PNLIBSZLIST const pGrown = NLIBCSzListExpand(list.p);
+    const auto body = OnList(1, [](PNLIBSZLIST &pList) {
+        PNLIBSZLIST const pGrown = NLIBCSzListExpand(pList);
         if (pGrown != nullptr) {
-            list.p = pGrown;
+            pList = pGrown;
             return std::string("grown");
         }
-        return Told(list.p->nItem) + NLIBCSzListGet(list.p, 0)[LONG_LENGTH - 1];
-    };
+        return Told(pList->nItem) + NLIBCSzListGet(pList, 0)[LONG_LENGTH - 1];
+    });
     EXPECT_EQ(TimesSeen(MachineMake(), "malloc", "1 200a", body), 1);
 }
 
@@ -142,60 +147,53 @@ TEST(WithoutMemory, FieldsAreNotSplit)
 {
     const std::string szField(200, 'x');
     const std::string szText = szField + " " + szField + " " + szField + " " + szField;
-    const auto body = [&szText] {
-        LIST_SCOPE list(0, 'a', SZLIST_UNSORTED);
-        if (list.p == nullptr) {
-            return std::string("no list");
-        }
-        return ToldWithItems(NLIBCStrTok(szText.c_str(), " ", &list.p), list.p);
-    };
+    const auto body = OnList(0, [&szText](PNLIBSZLIST &pList) {
+        return ToldWithItems(NLIBCStrTok(szText.c_str(), " ", &pList), pList);
+    });
     EXPECT_EQ(TimesSeen(MachineMake(), "malloc", "-1 200 2", body), 1) << "the list";
     EXPECT_EQ(TimesSeen(MachineMake(), "strdup", "-1 200 0", body), 1) << "the copy";
 }
 
 TEST(WithoutMemory, LinesAreNotRead)
 {
-    MACHINE machine = MachineMake();
-    MachineFile(machine, "/tmp/lines", std::string(400, 'x') + "\n" + std::string(400, 'y') + "\n");
-    const auto body = [] {
-        LIST_SCOPE list(0, 'a', SZLIST_UNSORTED);
-        if (list.p == nullptr) {
-            return std::string("no list");
-        }
-        return ToldWithItems(NLIBCFileReadLines("/tmp/lines", &list.p), list.p);
-    };
+    const MACHINE machine = WithFile(MachineMake(), "/tmp/lines",
+                                     std::string(400, 'x') + "\n" + std::string(400, 'y') + "\n");
+    const auto body = OnList(0, [](PNLIBSZLIST &pList) {
+        return ToldWithItems(NLIBCFileReadLines("/tmp/lines", &pList), pList);
+    });
     EXPECT_EQ(TimesSeen(machine, "malloc", "-1 200 1", body), 1);
 }
 
 TEST(WithoutMemory, ALineMatchesNoKey)
 {
-    MACHINE machine = MachineMake();
-    machine.faults = {{.szFunction = "strndup", .error = ENOMEM}};
-    const RUN_RESULT result = MachineCall(machine, [] {
-        RecordReset();
+    const auto call = [] {
         EXPECT_EQ(NLIBCFileLineKeyMatch("key=value\n", "key"), 0);
-        EXPECT_EQ(NLIBCFileLineKeyMatch("key=value\n", "key"), 1);
-        EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
-    });
-    EXPECT_EQ(TranscriptText(result), "fault strndup 1\n");
+        return NLIBCFileLineKeyMatch("key=value\n", "key");
+    };
+    (void)ExpectCall({.szName = "a line",
+                      .machine = WithFault(MachineMake(), {.szFunction = "strndup"}),
+                      .call = call,
+                      .result = 1,
+                      .steps = {{"fault strndup 1"}}});
+}
+
+// Fills the list with an item of this length, without an allocation of its own.
+void FillerPush(PNLIBSZLIST &pList, size_t cch)
+{
+    char szFiller[LONG_LENGTH + 1] = "";
+    memset(szFiller, 'b', cch);
+    (void)NLIBCSzListPush(&pList, szFiller);
 }
 
 // The list is full, so that the first disk makes it grow.
 TEST(WithoutMemory, DisksAreNotEnumerated)
 {
-    MACHINE machine = MachineMake();
-    MachineConf(machine, "usbportcfg=0x10\ninternalportcfg=0xf\n");
+    MACHINE machine = MachineWithConf("usbportcfg=0x10\ninternalportcfg=0xf\n");
     MachineDiskAdd(machine, "sda");
-    const auto body = [] {
-        LIST_SCOPE list(1, 'a', SZLIST_UNSORTED);
-        if (list.p == nullptr || list.p->nItem != 1) {
-            return std::string("no list");
-        }
-        char szFiller[174 + 1] = "";
-        memset(szFiller, 'b', sizeof(szFiller) - 1);
-        (void)NLIBCSzListPush(&list.p, szFiller);
-        return ToldWithItems(ExternalDiskPortEnum(INTERNAL_DEVICE, &list.p), list.p);
-    };
+    const auto body = OnList(1, [](PNLIBSZLIST &pList) {
+        FillerPush(pList, 174);
+        return ToldWithItems(ExternalDiskPortEnum(INTERNAL_DEVICE, &pList), pList);
+    });
     EXPECT_EQ(TimesSeen(machine, "malloc", "-1 200 2", body), 1);
 }
 
@@ -204,16 +202,10 @@ TEST(WithoutMemory, PartitionsAreNotEnumerated)
 {
     MACHINE machine = MachineMake();
     MachineDiskAdd(machine, "sda");
-    const auto body = [] {
-        LIST_SCOPE list(1, 'a', SZLIST_UNSORTED);
-        if (list.p == nullptr || list.p->nItem != 1) {
-            return std::string("no list");
-        }
-        char szFiller[170 + 1] = "";
-        memset(szFiller, 'b', sizeof(szFiller) - 1);
-        (void)NLIBCSzListPush(&list.p, szFiller);
-        return Told(PartitionPathEnum(nullptr, &list.p));
-    };
+    const auto body = OnList(1, [](PNLIBSZLIST &pList) {
+        FillerPush(pList, 170);
+        return Told(PartitionPathEnum(nullptr, &pList));
+    });
     EXPECT_GE(TimesSeen(machine, "malloc", "-1 200", body), 3);
 }
 
