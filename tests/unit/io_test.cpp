@@ -35,24 +35,11 @@ ssize_t ScriptRead(void *pCookie, char *pBuf, size_t cbBuf)
     return static_cast<ssize_t>(cb);
 }
 
-// The script as a stream, which is closed with its scope.
-struct SCRIPT_STREAM {
-    SCRIPT script;
-    FILE *p;
-
-    SCRIPT_STREAM(const std::vector<int> &failures, const std::string &text)
-        : script{.failures = failures, .text = text},
-          p(fopencookie(&script, "r",
-                        {.read = ScriptRead, .write = nullptr, .seek = nullptr, .close = nullptr}))
-    {
-    }
-    SCRIPT_STREAM(const SCRIPT_STREAM &) = delete;
-    SCRIPT_STREAM &operator=(const SCRIPT_STREAM &) = delete;
-    ~SCRIPT_STREAM()
-    {
-        (void)fclose(p);
-    }
-};
+FILE *ScriptOpen(SCRIPT &script)
+{
+    return fopencookie(&script, "r",
+                       {.read = ScriptRead, .write = nullptr, .seek = nullptr, .close = nullptr});
+}
 
 constexpr int ERRNO_AT_ENTRY = ENOTTY; // no call here fails with it
 
@@ -77,61 +64,69 @@ TEST(Fgets, IsTriedThreeTimesWhileInterrupted)
 {
     for (const FGETS_CASE &row : FGETS_CASES) {
         SCOPED_TRACE(testing::PrintToString(row.failures));
-        const SCRIPT_STREAM stream(row.failures, "line\nnext\n");
-        ASSERT_NE(stream.p, nullptr);
+        SCRIPT script = {.failures = row.failures, .text = "line\nnext\n"};
+        FILE *const pStream = ScriptOpen(script);
+        ASSERT_NE(pStream, nullptr);
         char szLine[16] = "";
         RecordReset();
         errno = ERRNO_AT_ENTRY;
-        char *const pszRead = NLIBCFgets(szLine, 16, stream.p);
+        char *const pszRead = NLIBCFgets(szLine, 16, pStream);
         const int errnoAtReturn = errno;
         EXPECT_EQ(errnoAtReturn, ERRNO_AT_ENTRY);
         EXPECT_EQ(NLIBCErrGet(), OLD_CODE);
-        EXPECT_EQ(stream.script.nRead, row.nRead);
+        EXPECT_EQ(script.nRead, row.nRead);
         if (row.szLine == nullptr) {
             EXPECT_EQ(pszRead, nullptr);
         } else {
             EXPECT_EQ(pszRead, szLine);
             EXPECT_STREQ(szLine, row.szLine);
         }
+        (void)fclose(pStream);
     }
 }
 
 TEST(Fgets, AnErrnoFromBeforeIsNoInterruption)
 {
     for (const std::vector<int> &failures : {std::vector<int>{0}, std::vector<int>{EINTR, 0}}) {
-        const SCRIPT_STREAM stream(failures, "line\n");
-        ASSERT_NE(stream.p, nullptr);
+        SCRIPT script = {.failures = failures, .text = "line\n"};
+        FILE *const pStream = ScriptOpen(script);
+        ASSERT_NE(pStream, nullptr);
         char szLine[16];
         errno = EINTR;
-        EXPECT_EQ(NLIBCFgets(szLine, 16, stream.p), nullptr);
+        EXPECT_EQ(NLIBCFgets(szLine, 16, pStream), nullptr);
         EXPECT_EQ(errno, EINTR);
-        EXPECT_EQ(stream.script.nRead, static_cast<int>(failures.size()));
+        EXPECT_EQ(script.nRead, static_cast<int>(failures.size()));
+        (void)fclose(pStream);
     }
 }
 
 TEST(Fgets, TheEndOfTheStreamIsFinal)
 {
-    const SCRIPT_STREAM stream({}, "");
-    ASSERT_NE(stream.p, nullptr);
+    SCRIPT script = {.failures = {}, .text = ""};
+    FILE *const pStream = ScriptOpen(script);
+    ASSERT_NE(pStream, nullptr);
     char szLine[16];
     errno = EINTR;
-    EXPECT_EQ(NLIBCFgets(szLine, 16, stream.p), nullptr);
+    EXPECT_EQ(NLIBCFgets(szLine, 16, pStream), nullptr);
     EXPECT_EQ(errno, EINTR);
-    EXPECT_EQ(stream.script.nRead, 1);
-    EXPECT_NE(feof(stream.p), 0);
+    EXPECT_EQ(script.nRead, 1);
+    EXPECT_NE(feof(pStream), 0);
+    (void)fclose(pStream);
 }
 
 TEST(Fgets, CutsAtTheBuffer)
 {
-    const SCRIPT_STREAM stream({}, "abcdef\n");
-    ASSERT_NE(stream.p, nullptr);
+    SCRIPT script = {.failures = {}, .text = "abcdef\n"};
+    FILE *const pStream = ScriptOpen(script);
+    ASSERT_NE(pStream, nullptr);
     char szLine[8] = "XXXXXXX";
-    EXPECT_EQ(NLIBCFgets(szLine, 4, stream.p), szLine);
+    EXPECT_EQ(NLIBCFgets(szLine, 4, pStream), szLine);
     EXPECT_STREQ(szLine, "abc");
     EXPECT_EQ(szLine[4], 'X');
-    EXPECT_EQ(NLIBCFgets(szLine, 8, stream.p), szLine);
+    EXPECT_EQ(NLIBCFgets(szLine, 8, pStream), szLine);
     EXPECT_STREQ(szLine, "def\n");
-    EXPECT_EQ(NLIBCFgets(szLine, 8, stream.p), nullptr);
+    EXPECT_EQ(NLIBCFgets(szLine, 8, pStream), nullptr);
+    (void)fclose(pStream);
 }
 
 struct PIPE_PAIR {
