@@ -3,7 +3,7 @@
 
 #include "owner.h"
 
-#include <algorithm>
+#include <array>
 #include <climits>
 #include <cstdlib>
 #include <sys/stat.h>
@@ -69,6 +69,14 @@ std::string RealPath(const std::string &szPath)
     return szReal == nullptr ? "" : szReal.get();
 }
 
+// What a link of /proc says; empty when the process has none, as those of the kernel.
+std::string LinkRead(const std::string &szPath)
+{
+    std::array<char, PATH_MAX> target = {};
+    const ssize_t cch = readlink(szPath.c_str(), target.data(), target.size() - 1);
+    return cch < 0 ? "" : target.data();
+}
+
 std::vector<pid_t> RunsFind(const std::string &szTool)
 {
     std::vector<pid_t> runs;
@@ -79,7 +87,7 @@ std::vector<pid_t> RunsFind(const std::string &szTool)
             continue;
         }
         const std::string szProcess = "/proc/" + szEntry;
-        if ((!szReal.empty() && RealPath(szProcess + "/exe") == szReal) ||
+        if ((!szReal.empty() && LinkRead(szProcess + "/exe") == szReal) ||
             AttributeRead(szProcess + "/comm") == szName) {
             runs.push_back(static_cast<pid_t>(NumberOf(szEntry)));
         }

@@ -167,17 +167,21 @@ ARRAY RunningArrayRead(const std::string &szName, const HOST &host)
 {
     constexpr char MEMBER[] = "dev-";
     const std::string szFolder = SYS_BLOCK + szName;
+    std::uint64_t nWhole = 0;
     ARRAY array;
     array.device = DeviceRead(szName, szFolder, host);
     array.fRunning = true;
     array.szLevel = AttributeRead(szFolder + "/md/level");
     array.nSlot = NumberOf(AttributeRead(szFolder + "/md/raid_disks"));
-    array.nMissing = NumberOf(AttributeRead(szFolder + "/md/degraded"));
     for (const std::string &szEntry : FolderList(szFolder + "/md")) {
         if (szEntry.compare(0, sizeof(MEMBER) - 1, MEMBER) == 0) {
             array.members.push_back(szEntry.substr(sizeof(MEMBER) - 1));
+            const std::string szState = AttributeRead(szFolder + "/md/" + szEntry + "/state");
+            nWhole += szState.find("faulty") == std::string::npos ? 1U : 0U;
         }
     }
+    // A member that is being rebuilt is there; "degraded" would count it as missing.
+    array.nMissing = array.nSlot > nWhole ? array.nSlot - nWhole : 0;
     return array;
 }
 

@@ -25,7 +25,7 @@ bool IsPlain(char ch)
     return ch >= ' ' && ch <= '~';
 }
 
-std::string FormatList(const char *szFormat, va_list arguments)
+[[gnu::format(printf, 1, 0)]] std::string FormatList(const char *szFormat, va_list arguments)
 {
     char *szText = nullptr;
     const int cch = vasprintf(&szText, szFormat, arguments);

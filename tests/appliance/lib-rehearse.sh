@@ -114,3 +114,19 @@ tells() {
     cat "$TOLD"
     return 1
 }
+
+# warns "COMMAND" LINE...: the rehearsal ends with 3, and each of these is one of its lines.
+warns() {
+    # shellcheck disable=SC2086  # a list of words
+    arrayctl-rehearse $1 >"$TOLD" 2>/tmp/told.errors
+    told=$?
+    shift
+    [ "$told" = 3 ] || {
+        echo "status $told"
+        cat "$TOLD" /tmp/told.errors
+        return 1
+    }
+    for line in "$@"; do
+        tells "$line" || return 1
+    done
+}

@@ -73,4 +73,14 @@ def case_nothing_else_is_offered():
         assert typed(keys) == keys.replace("\t", "").rstrip(" ") + (" " if keys[-2] == " " else "") + "=end", keys
 
 
+def case_a_rehearsal_is_completed_like_the_command():
+    sourced = "rehearse/completion/arrayctl-rehearse"
+    assert typed("arrayctl-rehearse --c\t", sourced) == "arrayctl-rehearse --commands =end"
+    assert typed("arrayctl-rehearse --json new\t", sourced) == "arrayctl-rehearse --json newvol =end"
+    assert typed("arrayctl-rehearse --tool /x status 127\t", sourced) == "arrayctl-rehearse --tool /x status 127 =end"
+    seen = typed("arrayctl-rehearse destroy \t", sourced)
+    assert seen == "arrayctl-rehearse destroy 0 12 127 arrayctl-rehearse destroy =end", seen
+    assert typed("arrayctl-rehearse newvol \t", sourced) == "arrayctl-rehearse newvol =end"
+
+
 verdict.cases(globals(), "".join(sys.argv[1:2]))

@@ -31,6 +31,10 @@ PLATFORM_FILES="usr/libexec/arrayctl/sfdisk
 usr/sbin/mdrequests
 usr/share/man/man8/mdrequests.8.gz"
 
+REHEARSE_FILES="usr/sbin/arrayctl-rehearse
+usr/share/bash-completion/completions/arrayctl-rehearse
+usr/share/man/man8/arrayctl-rehearse.8.gz"
+
 listing() { (cd "$1" && find . -type f -printf '%p %s %T@ %m\n' | LC_ALL=C sort); }
 
 files_of() { (cd "$1" && find . -type f | sed 's,^\./,,' | LC_ALL=C sort); }
@@ -72,7 +76,7 @@ packing_again_gives_the_same() {
     mkdir -p "$SCRATCH/first"
     cp "$DEBS"/*_amd64.deb "$SCRATCH/first" && make_deb amd64 || return 1
     local szPackage
-    for szPackage in arrayctl arrayctl-static arrayctl-dev arrayctl-platform; do
+    for szPackage in arrayctl arrayctl-static arrayctl-dev arrayctl-platform arrayctl-rehearse; do
         cmp "$SCRATCH/first/${szPackage}_${VERSION}_amd64.deb" "$DEBS/${szPackage}_${VERSION}_amd64.deb" || return 1
     done
 }
@@ -100,6 +104,8 @@ depends_are_right() {
     done
     same "glibc (= $(dpkg-query -W -f '${source:Version}' libc6-dev))" "$(field arrayctl-static amd64 Built-Using)" || return 1
     [[ $(field arrayctl-static powerpc Built-Using) =~ ^glibc\ \(=\ [0-9].*\)$ ]] || return 1
+    same "libblkid1 (>= 2.17), libc6 (>= 2.36), arrayctl (= $VERSION) | arrayctl-static (= $VERSION)" \
+        "$(field arrayctl-rehearse amd64 Depends)" || return 1
     same "libfdisk1 (>= 2.35), libc6 (>= 2.34), arrayctl (= $VERSION)" "$(field arrayctl-platform amd64 Depends)"
 }
 
@@ -107,6 +113,7 @@ packages_hold_what_they_should() {
     same "${TOOL_FILES}.gz" "$(package_files arrayctl amd64)" || return 1
     same "${TOOL_FILES}.gz" "$(package_files arrayctl powerpc)" || return 1
     same "$PLATFORM_FILES" "$(package_files arrayctl-platform amd64)" || return 1
+    same "$REHEARSE_FILES" "$(package_files arrayctl-rehearse amd64)" || return 1
     local szArch szHeaders
     szHeaders=$(git ls-files 'lib*/include/*.h' | sed 's,^lib[a-z]*/include,usr/include/arrayctl,' | LC_ALL=C sort)
     for szArch in amd64:x86_64-linux-gnu powerpc:powerpc-linux-gnu; do
