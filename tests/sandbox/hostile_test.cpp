@@ -175,7 +175,7 @@ TEST_P(HostileSurroundings, ChangeNothingOfAnInstallation)
 }
 
 INSTANTIATE_TEST_SUITE_P(All, HostileSurroundings, testing::ValuesIn(SURROUNDINGS_CASES),
-                         [](const auto &row) { return row.param.szName; });
+                         ROW_NAME{});
 
 // ---- standard streams --------------------------------------------------------------------------
 

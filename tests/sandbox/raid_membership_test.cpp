@@ -116,7 +116,7 @@ TEST(RaidMembership, RefusesNull)
 // ---- whether a disk is taken -------------------------------------------------------------------
 
 // The disk sda of this model, its partitions where they lie.
-MACHINE DiskOf(const char *szConf, const DISK_PLACES &places)
+MACHINE DiskOf(const std::string &szConf, const DISK_PLACES &places)
 {
     MACHINE machine = MachineWithConf(szConf);
     PartitionedDiskAdd(machine, "sda", places);
@@ -151,11 +151,7 @@ RUN_RESULT ExpectUsed(MACHINE machine, const STEPS &examined, int nMdExpected,
         EXPECT_EQ(RAIDDiskIsUsedByRAID(szDisk, &nMd), nMdExpected == UNTOUCHED ? 0 : 1);
         EXPECT_EQ(nMd, nMdExpected);
     });
-    std::string szCommands;
-    for (const STEP &step : examined) {
-        szCommands += step.szText + "\n";
-    }
-    EXPECT_EQ(TranscriptText(result), szCommands);
+    EXPECT_EQ(TranscriptText(result), StepsText(examined));
     return result;
 }
 

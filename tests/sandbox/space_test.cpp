@@ -280,31 +280,30 @@ int SpaceExeclOf(const std::vector<std::string> &argv)
     return SpaceExecl(arg(0), arg(1), arg(2), arg(3), arg(4), arg(5), arg(6), NULL);
 }
 
-void ExpectLoggedWithBlanksAndRunAsItIs(const COMMAND_CASE &row)
+// How a tool with this answer ends that is run as it is.
+void ExpectRunAsItIs(const std::vector<std::string> &argv, const TOOL_ANSWER &answer, int status)
 {
     MACHINE machine = MachineMake();
-    MachineTool(machine, row.argv, {.szErr = "x"});
+    MachineTool(machine, argv, answer);
     const RUN_RESULT result =
-        MachineCall(machine, [&row] { EXPECT_EQ(SpaceExeclOf(row.argv), 0); });
-    EXPECT_EQ(MachineFileRead(LOG_PATH), Line(row.text, "x"));
+        MachineCall(machine, [&argv, status] { EXPECT_EQ(SpaceExeclOf(argv), status); });
     ASSERT_EQ(result.events.size(), 1U);
-    EXPECT_EQ(result.events[0].argv, row.argv);
+    EXPECT_EQ(result.events[0].argv, argv);
 }
 
 TEST(SpaceExecl, LogsTheCommandWithBlanksAndRunsItAsItIs)
 {
     for (const COMMAND_CASE &row : COMMAND_CASES) {
         SCOPED_TRACE(row.text);
-        ExpectLoggedWithBlanksAndRunAsItIs(row);
+        ExpectRunAsItIs(row.argv, {.szErr = "x"}, 0);
+        EXPECT_EQ(MachineFileRead(LOG_PATH), Line(row.text, "x"));
     }
 }
 
 TEST(SpaceExecl, CutsLongCommandAndLongErrorInOneLine)
 {
-    const std::vector<std::string> argv = {"/sbin/mdadm", std::string(2000, 'a')};
-    MACHINE machine = MachineMake();
-    MachineTool(machine, argv, {.szErr = std::string(4000, 'e') + "\n", .status = 1});
-    (void)MachineCall(machine, [&argv] { EXPECT_EQ(SpaceExeclOf(argv), 256); });
+    ExpectRunAsItIs({"/sbin/mdadm", std::string(2000, 'a')},
+                    {.szErr = std::string(4000, 'e') + "\n", .status = 1}, 256);
     EXPECT_EQ(MachineFileRead(LOG_PATH),
               CutLine(Line("/sbin/mdadm " + std::string(1011, 'a'), std::string(2047, 'e'))));
 }
@@ -354,26 +353,13 @@ TEST(SpaceExecl, JudgesByTheToolWhenTheLogDoesNotOpen)
 
 TEST(Space, RefusesNull)
 {
-    ExpectCalls({{.szName = "no stream",
-                  .call = [] { return SpaceErrorLog(nullptr, "/sbin/x"); },
-                  .result = -1,
-                  .code = ERR_BAD_PARAMETER},
-                 {.szName = "no tool",
-                  .call = [] { return SpaceExecl(nullptr, "-S", NULL); },
-                  .result = -1,
-                  .code = ERR_BAD_PARAMETER},
-                 {.szName = "no vector",
-                  .call = [] { return SpaceExecv(nullptr); },
-                  .result = -1,
-                  .code = ERR_BAD_PARAMETER},
-                 {.szName = "an empty vector",
-                  .call =
-                      [] {
-                          const char *const argv[] = {nullptr};
-                          return SpaceExecv(argv);
-                      },
-                  .result = -1,
-                  .code = ERR_BAD_PARAMETER}});
+    IdleCall(MachineMake(), [] {
+        const char *const argv[] = {nullptr};
+        EXPECT_FAILS(SpaceErrorLog(nullptr, "/sbin/x"), -1, ERR_BAD_PARAMETER);
+        EXPECT_FAILS(SpaceExecl(nullptr, "-S", NULL), -1, ERR_BAD_PARAMETER);
+        EXPECT_FAILS(SpaceExecv(nullptr), -1, ERR_BAD_PARAMETER);
+        EXPECT_FAILS(SpaceExecv(argv), -1, ERR_BAD_PARAMETER);
+    });
 }
 
 struct FAULT_CASE {
