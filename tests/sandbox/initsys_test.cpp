@@ -4,6 +4,7 @@
 #include <cerrno>
 #include <csignal>
 #include <gtest/gtest.h>
+#include <ostream>
 #include <string>
 #include <vector>
 
@@ -530,12 +531,25 @@ TEST(InitsysFails, WithoutMemory)
 
 // ---- runs that end early -----------------------------------------------------------------------
 
-struct InitsysEnds : testing::TestWithParam<RUN_CASE> {
+struct END_CASE {
+    const char *szName;
+    MACHINE machine;
+    STEPS steps;
+    const char *szWord = "initsys";
+};
+
+void PrintTo(const END_CASE &row, std::ostream *pStream)
+{
+    *pStream << row.szName;
+}
+
+struct InitsysEnds : testing::TestWithParam<END_CASE> {
 };
 
 TEST_P(InitsysEnds, Early)
 {
-    ExpectRun(GetParam());
+    const END_CASE &row = GetParam();
+    ExpectRun({row.szName, row.machine, {row.szWord}, "", 1, row.steps});
 }
 
 MACHINE WithGlobFault(const MACHINE &machine, int nCall)
@@ -547,62 +561,37 @@ const STEPS TWO_BLANK = {{"<15>partition_layout.cpp:# /dev/sda: dont contain par
                          {"<15>partition_layout.cpp:# /dev/sdb: dont contain partition [1]"}};
 const STEPS UNREAD = {{"fault glob 3"}, {"<11>disk_port.cpp:# read error :/sys/block/sd*"}};
 
-const RUN_CASE RUN_CASES[] = {
-    {.szName = "WithoutADisk",
-     .machine = MachineWithConf(CONF_RAID),
-     .arguments = {"initsys"},
-     .status = 1,
-     .steps = NO_DISK},
-    {.szName = "WithTheMarkerOfTwoHeads",
-     .machine = WithFile(MachineOfDisks({{"sda", BLANK}}), "/tmp/.dualhead", ""),
-     .arguments = {"initsys"},
-     .status = 1,
-     .steps = NO_DISK},
-    {.szName = "WithoutALayout",
-     .machine = WithGlobFault(MachineOfDisks({{"sda", BLANK}}), 1),
-     .arguments = {"initsys"},
-     .status = 1,
-     .steps = {{"fault glob 1"}, {"<11>arrayctl.cpp:# Failed to find partition layout"}}},
-    {.szName = "WithoutTheInternalDisks",
-     .machine = WithGlobFault(MachineWithConf(CONF_RAID), 3),
-     .arguments = {"initsys"},
-     .status = 1,
-     .steps = UNREAD + STEPS{{"<11>arrayctl.cpp:# Failed to enum INTERNAL_DEVICE"}}},
-    {.szName = "WithoutTheUnitsDisks",
-     .machine = WithGlobFault(MachineWithConf(CONF_DUAL_HEAD), 3),
-     .arguments = {"initsys"},
-     .status = 1,
-     .steps = UNREAD + STEPS{{"<11>arrayctl.cpp:# Failed to enum EUNIT_DEVICE"}}},
-    {.szName = "WithoutAChild",
-     .machine = WithFault(MachineOfDisks({{"sda", BLANK}, {"sdb", BLANK}}),
-                          {.szFunction = "fork", .error = EAGAIN}),
-     .arguments = {"initsys"},
-     .status = 1,
-     .steps = TWO_BLANK + STEPS{{"fault fork 1"}} + NO_FORK},
+const STEPS NO_PARTITIONER = {
+    TWO_BLANK[0],
+    {"<15>partition_edit.cpp:# Failed to do '/sbin/sfdisk --fast-delete -1 /dev/sda'"}};
+const MACHINE ONE_DISK = MachineOfDisks({{"sda", BLANK}});
+const MACHINE TWO_DISKS = MachineOfDisks({{"sda", BLANK}, {"sdb", BLANK}});
+
+const END_CASE END_CASES[] = {
+    {"WithoutADisk", MachineWithConf(CONF_RAID), NO_DISK},
+    {"WithTheMarkerOfTwoHeads", WithFile(ONE_DISK, "/tmp/.dualhead", ""), NO_DISK},
+    {"WithoutALayout",
+     WithGlobFault(ONE_DISK, 1),
+     {{"fault glob 1"}, {"<11>arrayctl.cpp:# Failed to find partition layout"}}},
+    {"WithoutTheInternalDisks", WithGlobFault(MachineWithConf(CONF_RAID), 3),
+     UNREAD + STEPS{{"<11>arrayctl.cpp:# Failed to enum INTERNAL_DEVICE"}}},
+    {"WithoutTheUnitsDisks", WithGlobFault(MachineWithConf(CONF_DUAL_HEAD), 3),
+     UNREAD + STEPS{{"<11>arrayctl.cpp:# Failed to enum EUNIT_DEVICE"}}},
+    {"WithoutAChild", WithFault(TWO_DISKS, {.szFunction = "fork", .error = EAGAIN}),
+     TWO_BLANK + STEPS{{"fault fork 1"}} + NO_FORK},
     // With the marker the two that decide start nothing themselves.
-    {.szName = "WithoutAPartitioningChild",
-     .machine =
-         WithFault(WithFile(MachineOfDisks({{"sda", BLANK}, {"sdb", BLANK}}), FORCE_MARKER, ""),
-                   {.szFunction = "fork", .nCall = 3, .error = EAGAIN}),
-     .arguments = {"initsys"},
-     .status = 1,
-     .steps = TWO_BLANK + STEPS{{"fault fork 3"}} + NO_FORK},
-    {.szName = "WithoutAPartitioner",
-     .machine = WithTool(MachineOfDisks({{"sda", BLANK}}), "/sbin/sfdisk", TOOL_KIND::MISSING),
-     .arguments = {"initsys"},
-     .status = 1,
-     .steps =
-         STEPS{TWO_BLANK[0],
-               {"<15>partition_edit.cpp:# Failed to do '/sbin/sfdisk --fast-delete -1 /dev/sda'"}} +
-         2 * Unsigned("32512") + Unpartitioned("sda", "255") + Uncreated("sda", "2000") + NO_DISK},
-    {.szName = "WithTwoEmptyListsForTheDuplicationTool",
-     .machine = MachineWithConf(CONF_RAID),
-     .arguments = {"initsys-dd"},
-     .status = 1,
-     .steps = STEPS{{"/bin/nurodd"}} + NO_DISK},
+    {"WithoutAPartitioningChild",
+     WithFault(WithFile(TWO_DISKS, FORCE_MARKER, ""),
+               {.szFunction = "fork", .nCall = 3, .error = EAGAIN}),
+     TWO_BLANK + STEPS{{"fault fork 3"}} + NO_FORK},
+    {"WithoutAPartitioner", WithTool(ONE_DISK, "/sbin/sfdisk", TOOL_KIND::MISSING),
+     NO_PARTITIONER + 2 * Unsigned("32512") + Unpartitioned("sda", "255") +
+         Uncreated("sda", "2000") + NO_DISK},
+    {"WithTwoEmptyListsForTheDuplicationTool", MachineWithConf(CONF_RAID),
+     STEPS{{"/bin/nurodd"}} + NO_DISK, "initsys-dd"},
 };
 
-INSTANTIATE_TEST_SUITE_P(, InitsysEnds, testing::ValuesIn(RUN_CASES), ROW_NAME());
+INSTANTIATE_TEST_SUITE_P(, InitsysEnds, testing::ValuesIn(END_CASES), ROW_NAME());
 
 // ---- children ----------------------------------------------------------------------------------
 
