@@ -7,7 +7,6 @@
 
 #include "conf.h"
 #include "fuzz.h"
-#include "outside.h"
 
 #include <algorithm>
 
@@ -60,15 +59,12 @@ void LinesTell(std::string_view file)
 
 } // namespace
 
-extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *pInput, size_t cbInput)
+void Fuzz(std::string_view file)
 {
-    const std::string_view file = InputText(pInput, cbInput);
-    OutsideClear();
     OutsideFile(NUROINFO_CONF_PATH, file);
     const int cbValue = BUFFER_SIZES[file.size() % std::size(BUFFER_SIZES)];
     LookupTells(file, "maxdisks", cbValue, KEYVALUE_FIRST_MATCH);
     LookupTells(file, "usbportcfg", cbValue, KEYVALUE_LAST_MATCH);
     AnswersTell(file);
     LinesTell(file);
-    return 0;
 }

@@ -34,9 +34,8 @@ void TokensTell(const std::string &line)
 
 } // namespace
 
-extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *pInput, size_t cbInput)
+void Fuzz(std::string_view rest)
 {
-    std::string_view rest = InputText(pInput, cbInput);
     const std::string key = CString(TakeUntil(rest, '\n'));
     const std::string line = CString(rest);
 
@@ -48,5 +47,4 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *pInput, size_t cbInput
               trimmed.c_str() == Trimmed(line),
           "trimmed into another buffer");
     TokensTell(line);
-    return 0;
 }

@@ -66,18 +66,17 @@ void PartitionTells(const std::string &path, int partNum, size_t cbOut)
 
 } // namespace
 
-extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *pInput, size_t cbInput)
+void Fuzz(std::string_view input)
 {
-    if (cbInput == 0) {
-        return 0;
+    if (input.empty()) {
+        return;
     }
-    const size_t cbBuffer = pInput[0] % 130U + 1U;
-    const std::string name = CString(InputText(pInput + 1, cbInput - 1));
+    const size_t cbBuffer = static_cast<unsigned char>(input[0]) % 130U + 1U;
+    const std::string name = CString(input.substr(1));
     NumberTells(name, cbBuffer);
     RemoveTells(name, cbBuffer);
     for (const int partNum : PART_NUMBERS) {
         PartitionTells(name, partNum, cbBuffer);
     }
     Claim(DiskIndexGet(name.c_str()) == DiskIndex(name), "the disk's index");
-    return 0;
 }

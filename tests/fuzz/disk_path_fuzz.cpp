@@ -6,7 +6,6 @@
 
 #include "conf.h"
 #include "fuzz.h"
-#include "outside.h"
 #include "port.h"
 
 namespace
@@ -60,14 +59,11 @@ void ParseTells(const std::string &path, std::string_view report)
 
 } // namespace
 
-extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *pInput, size_t cbInput)
+void Fuzz(std::string_view rest)
 {
-    std::string_view rest = InputText(pInput, cbInput);
     const std::string report = "nuro_device_list=" + std::string(TakeUntil(rest, '\n')) + "\n";
-    OutsideClear();
     OutsideFile("/etc.defaults/nuroinfo.conf", CONF);
     OutsideFile("/sys/class/scsi_host/host0/nuro_pm_info", report);
     ParseTells(CString(rest), report);
     Claim(IsSupportSas() == 1, "the machine has SAS");
-    return 0;
 }

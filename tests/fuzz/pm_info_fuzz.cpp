@@ -6,7 +6,6 @@
 
 #include "conf.h"
 #include "fuzz.h"
-#include "outside.h"
 #include "port.h"
 
 namespace
@@ -17,14 +16,13 @@ constexpr char SECOND_HOST[] = "nuro_device_list=/dev/sdz\n";
 
 } // namespace
 
-extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *pInput, size_t cbInput)
+void Fuzz(std::string_view input)
 {
-    if (cbInput == 0) {
-        return 0;
+    if (input.empty()) {
+        return;
     }
-    const size_t cbOut = pInput[0] * size_t(16) + 1;
-    const std::string_view file = InputText(pInput + 1, cbInput - 1);
-    OutsideClear();
+    const size_t cbOut = static_cast<unsigned char>(input[0]) * size_t(16) + 1;
+    const std::string_view file = input.substr(1);
     OutsideFile("/sys/class/scsi_host/host0/nuro_pm_info", file);
     OutsideFile("/sys/class/scsi_host/host1/nuro_pm_info", SECOND_HOST);
     std::vector<char> out(cbOut, '#');
@@ -40,5 +38,4 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *pInput, size_t cbInput
     }
     Claim(result == (fFits ? 0 : -1), "everything fits or not");
     Claim(out.data() == expected, "the names reported");
-    return 0;
 }

@@ -4,14 +4,11 @@
 #include "raid/mdp_major.h"
 
 #include "fuzz.h"
-#include "outside.h"
 
 #include <algorithm>
 
-extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *pInput, size_t cbInput)
+void Fuzz(std::string_view file)
 {
-    const std::string_view file = InputText(pInput, cbInput);
-    OutsideClear();
     OutsideFile("/proc/devices", file);
     const i32 number = MdpMajorRead();
     Claim(number >= MAJOR_UNKNOWN, "a major number or none");
@@ -21,5 +18,4 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *pInput, size_t cbInput
     const size_t section = bare.find("devices:", std::min(bare.find("Block"), bare.size()));
     const bool fWords = bare.find("mdp", std::min(section, bare.size())) != std::string::npos;
     Claim(fWords || number == MAJOR_UNKNOWN, "no number without the words");
-    return 0;
 }

@@ -4,7 +4,6 @@
 #include "nurostoragecore/partition_enum.h"
 
 #include "fuzz.h"
-#include "outside.h"
 #include "text.h"
 
 namespace
@@ -41,10 +40,8 @@ void EnumTells(const PARTITION_ENUM_FILTER *pFilter, const PATHS &expected, bool
 
 } // namespace
 
-extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *pInput, size_t cbInput)
+void Fuzz(std::string_view file)
 {
-    const std::string_view file = InputText(pInput, cbInput);
-    OutsideClear();
     OutsideFile("/proc/partitions", file);
     OutsideFile("/etc.defaults/nuroinfo.conf", "usbportcfg=0x30\ninternalportcfg=0xf\n");
     EnumTells(nullptr, ModelPaths(file, ""), !file.empty());
@@ -55,5 +52,4 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *pInput, size_t cbInput
     PNLIBSZLIST pList = NLIBCSzListAlloc(512);
     Claim(PartitionPathEnum(&contained, &pList) >= (file.empty() ? -1 : 0), "by container");
     NLIBCSzListFree(pList);
-    return 0;
 }

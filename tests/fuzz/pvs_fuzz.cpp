@@ -4,7 +4,6 @@
 #include "nurostoragecore/lvm.h"
 
 #include "fuzz.h"
-#include "outside.h"
 #include "text.h"
 
 #include <array>
@@ -35,15 +34,12 @@ std::optional<std::string> ModelPath(std::string_view rows)
 
 } // namespace
 
-extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *pInput, size_t cbInput)
+void Fuzz(std::string_view rows)
 {
-    const std::string_view rows = InputText(pInput, cbInput);
-    OutsideClear();
     OutsideToolOutput(rows);
     std::array<char, PATH_SIZE> path = {};
     const int result = LVMGetLVPath("/dev/md2", path.data(), static_cast<int>(path.size()));
     const auto expected = ModelPath(rows);
     Claim(result == (expected.has_value() ? 0 : -1), "a row is found or not");
     Claim(result != 0 || *expected == path.data(), "the path of the row");
-    return 0;
 }

@@ -8,7 +8,6 @@
 
 #include "fuzz.h"
 #include "listing.h"
-#include "outside.h"
 
 #include <fcntl.h>
 #include <memory>
@@ -99,13 +98,11 @@ void StartSizeTells(std::string_view startFile, std::string_view sizeFile)
 
 } // namespace
 
-extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *pInput, size_t cbInput)
+void Fuzz(std::string_view rest)
 {
-    std::string_view second = InputText(pInput, cbInput);
-    const std::string_view first = TakeUntil(second, '|');
-    MemberTells(first, second);
+    const std::string_view first = TakeUntil(rest, '|');
+    MemberTells(first, rest);
     SyncActionTells(first);
     ComponentSizeTells(first);
-    StartSizeTells(first, second);
-    return 0;
+    StartSizeTells(first, rest);
 }

@@ -4,8 +4,8 @@
 #include "fuzz.h"
 #include "szlist_walk.h"
 
-extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *pInput, size_t cbInput)
+void Fuzz(std::string_view input)
 {
-    ClaimNoDefect(SzListWalk(InputText(pInput, cbInput).substr(0, WALK_LENGTH)));
-    return 0;
+    const std::string defect = SzListWalk(input.substr(0, WALK_LENGTH));
+    Claim(defect.empty(), defect.c_str());
 }
