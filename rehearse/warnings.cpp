@@ -267,21 +267,18 @@ void MarkerFind(const SCENE &scene, SENTENCES &found)
     }
 }
 
-// An array of no members, or fewer, is asked for when the machine does not know how many it has.
+// What the tool says when it does not know how many disks the machine has room for. Every disk is
+// one too many then: it is partitioned, and its members are erased.
+constexpr const char *NO_SLOTS[] = {
+    "Failed to NLIBCFileGetKeyValue(",
+    "No disk to create system and swap partition",
+};
+
 void NoSlotsFind(const SCENE &scene, SENTENCES &found)
 {
-    for (const COMMAND &command : scene.run.commands) {
-        if (command.fQuestion || command.argv.size() < 2 || command.argv[1] != "-C") {
-            continue;
-        }
-        for (const std::string &szWord : command.argv) {
-            if (szWord == "-n0" || szWord.rfind("-n-", 0) == 0) {
-                found.push_back("there are no slots: maxdisks or max_sys_raid_disks cannot be read "
-                                "from " +
-                                std::string(CONFIGURATION) + ", so " + ShellLine(command.argv) +
-                                " is refused");
-            }
-        }
+    for (const char *const szPart : NO_SLOTS) {
+        LogFind(scene, szPart, "no disk has a slot, look at maxdisks and max_sys_raid_disks",
+                found);
     }
 }
 
@@ -371,7 +368,7 @@ void OtherRunFind(const SCENE &scene, SENTENCES &found)
 {
     for (const pid_t pid : scene.host.otherRuns) {
         found.push_back(Format("%s runs at this moment, as process %d",
-                               scene.options.szTool.c_str(), static_cast<int>(pid)));
+                               NameOf(scene.options.szTool).c_str(), static_cast<int>(pid)));
     }
 }
 

@@ -16,7 +16,7 @@ constexpr int EXITED_WITH_1 = 1 << 8;
 std::string Said(const INVENTORY &inventory, const RUN &run, const WORDS &words = {"initsys"},
                  const HOST &host = {})
 {
-    const OPTIONS options = {.szTool = "arrayctl",
+    const OPTIONS options = {.szTool = "/sbin/arrayctl",
                              .szToolPath = "/sbin/arrayctl",
                              .form = FORM::TEXT,
                              .words = words,
@@ -161,10 +161,17 @@ TEST(Warnings, Markers)
 
 TEST(Warnings, NoSlots)
 {
-    EXPECT_EQ(Said({}, RunOf({"/sbin/mdadm -C /dev/md0 -e 0.9 -amd -R -l1 -n0"})),
-              "no-slots: there are no slots: maxdisks or max_sys_raid_disks cannot be read from "
-              "/etc.defaults/nuroinfo.conf, so /sbin/mdadm -C /dev/md0 -e 0.9 -amd -R -l1 -n0 is "
-              "refused\n");
+    RUN run;
+    run.log = {
+        {.priority = 11, .szText = "arrayctl: a.cpp:1 Failed to NLIBCFileGetKeyValue(/x,maxdisks)"},
+        {.priority = 11,
+         .szText = "arrayctl: b.cpp:2 No disk to create system and swap partition, initsys "
+                   "fail!"}};
+    EXPECT_EQ(Said({}, run),
+              "no-slots: no disk has a slot, look at maxdisks and max_sys_raid_disks: arrayctl: "
+              "a.cpp:1 Failed to NLIBCFileGetKeyValue(/x,maxdisks)\n"
+              "no-slots: no disk has a slot, look at maxdisks and max_sys_raid_disks: arrayctl: "
+              "b.cpp:2 No disk to create system and swap partition, initsys fail!\n");
 }
 
 TEST(Warnings, BadDisk)
