@@ -37,6 +37,9 @@ title "Four blank disks. An installation would use these numbers:"
 run arrayctl enumformatalldisks | sed 's/ $//'
 echo
 
+title "What a real run would do to them; this one changes nothing:"
+run arrayctl-rehearse initsys 2>&1 | sed '/^The commands:/,$d'
+
 title "Partitions on every disk, a system array and a swap array:"
 run arrayctl initsys
 run arrayctl status 0
