@@ -209,16 +209,29 @@ arrayctl_awake() {
         -e inject=clock_nanosleep:retval=0 arrayctl "$@"
 }
 
-# check_initsys SLOT...: it ends well, with a disk or "missing" in every slot.
+# check_initsys SLOT...: it ends well, with a disk or "missing" in every slot, and says which it took.
 check_initsys() {
     check 'initsys' says 0 '' arrayctl_awake initsys
     check 'arrays' system_arrays_are "$@"
+    check 'what it did' logged_inited $(printf '%s\n' "$@" | grep -v missing)
 }
 
-# installs SLOT...: the same, and the arrays are stopped again.
+# installs TABLE SLOT...: the same with this table on every disk, and the arrays are stopped again.
 installs() {
+    installed=$1
+    shift
     check_initsys "$@"
+    check_tables "$installed" $(printf '%s\n' "$@" | grep -v missing)
     stop_arrays 0 1
+}
+
+# installs_none DISK...: it could not set up these, and so none at all.
+installs_none() {
+    check 'initsys' says 1 '' arrayctl_awake initsys
+    for disk in "$@"; do
+        check 'why' logged_not_made "$disk"
+    done
+    check 'the end' logged_no_disk
 }
 
 # says STATUS TEXT COMMAND...: the exit status, and every byte on standard output and error. It is

@@ -38,19 +38,16 @@ if [ "$1" = 1 ]; then
     check 'nothing to format' enum_says 0 ''
     verdict 'four blank disks are set up'
     check_status 'a new data array builds its redundancy' 2 'clean, degraded, recovering' 'RAID 5' \
-        sdd3:Rebuilding sdc3:Normal sdb3:Normal sda3:Normal
+        sdd3:Rebuilding sdc3 sdb3 sda3
     fast_resync
-    check_status 'and has it' 2 clean 'RAID 5' sdd3:Normal sdc3:Normal sdb3:Normal sda3:Normal
-    check_status 'a system array with a disk in every slot' 0 clean 'RAID 1' \
-        sdd1:Normal sdc1:Normal sdb1:Normal sda1:Normal
+    check_status 'and has it' 2 clean 'RAID 5' sdd3 sdc3 sdb3 sda3
+    check_status 'a system array with a disk in every slot' 0 clean 'RAID 1' sdd1 sdc1 sdb1 sda1
     store_data md2
 
     pull_disk sdc
     find_out 0 1 2
-    check_status 'the data array without a drive' 2 'clean, degraded' 'RAID 5' \
-        sdd3:Normal sdc3:Failed sdb3:Normal sda3:Normal
-    check_status 'the system array without it' 0 'clean, degraded' 'RAID 1' \
-        sdd1:Normal sdc1:Failed sdb1:Normal sda1:Normal
+    check_status 'the data array without a drive' 2 'clean, degraded' 'RAID 5' sdd3 sdc3:Failed sdb3 sda3
+    check_status 'the system array without it' 0 'clean, degraded' 'RAID 1' sdd1 sdc1:Failed sdb1 sda1
     check 'data' data_is_whole md2
     check 'nothing to format' enum_says 0 ''
     for number in 0 1 2; do
@@ -62,10 +59,9 @@ if [ "$1" = 1 ]; then
     await test -b /dev/sdc3
     slow_resync
     must mdadm /dev/md2 -a /dev/sdc3
-    check_status 'the drive is back' 2 'clean, degraded, recovering' 'RAID 5' \
-        sdd3:Normal sdc3:Rebuilding sdb3:Normal sda3:Normal
+    check_status 'the drive is back' 2 'clean, degraded, recovering' 'RAID 5' sdd3 sdc3:Rebuilding sdb3 sda3
     fast_resync
-    check_status 'and rebuilt' 2 clean 'RAID 5' sdd3:Normal sdc3:Normal sdb3:Normal sda3:Normal
+    check_status 'and rebuilt' 2 clean 'RAID 5' sdd3 sdc3 sdb3 sda3
     check 'data' data_is_whole md2
     check_tables "$WHOLE_8" sda sdb sdc sdd
     verdict 'a drive comes back'
@@ -78,10 +74,8 @@ else
     must mdadm --assemble /dev/md2 /dev/sda3 /dev/sdb3 /dev/sdc3 /dev/sdd3
     check 'data' data_is_whole md2
     verdict 'the data is there after a reboot'
-    check_status 'the data array after a reboot' 2 clean 'RAID 5' \
-        sdd3:Normal sdc3:Normal sdb3:Normal sda3:Normal
-    check_status 'a system array that still lacks a disk' 0 'clean, degraded' 'RAID 1' \
-        sdd1:Normal sdb1:Normal sda1:Normal
+    check_status 'the data array after a reboot' 2 clean 'RAID 5' sdd3 sdc3 sdb3 sda3
+    check_status 'a system array that still lacks a disk' 0 'clean, degraded' 'RAID 1' sdd1 sdb1 sda1
 
     # Renewed system arrays take the drive in that came back, beside the data array that runs.
     slow_resync
