@@ -26,10 +26,9 @@ disks_show() {
     printf '%-10s %10s %10s  %-5s %s\n' partition start sectors type superblock
     for part in /sys/block/sd?/sd?[0-9]*; do
         dev=/dev/${part##*/}
-        disk=${dev%%[0-9]*}
-        type=$(sfdisk.stock --part-type "$disk" "${dev#"$disk"}" 2>/dev/null)
+        type=$(blkid -p -s PART_ENTRY_TYPE -o value "$dev")
         printf '%-10s %10s %10s  %-5s %s\n' "$dev" "$(cat "$part/start")" "$(cat "$part/size")" \
-            "$type" "$(member_of "$dev")"
+            "${type#0x}" "$(member_of "$dev")"
     done
 }
 

@@ -32,9 +32,15 @@ add_library(project_product INTERFACE)
 target_link_libraries(project_product INTERFACE project_warnings)
 target_compile_options(project_product INTERFACE
     $<$<COMPILE_LANGUAGE:CXX>:-fno-exceptions;-fno-rtti;-fno-threadsafe-statics>
-    -fvisibility=hidden -fstack-protector-strong)
+    -fvisibility=hidden -fstack-protector-strong
+    # A stack that grows touches every page on its way.
+    -fstack-clash-protection)
+# Indirect jumps land where they may, on processors that look after that.
+if(CMAKE_SYSTEM_PROCESSOR STREQUAL "x86_64" AND CMAKE_SIZEOF_VOID_P EQUAL 8)
+    target_compile_options(project_product INTERFACE -fcf-protection)
+endif()
 target_compile_options(project_product INTERFACE
-    $<$<CONFIG:Release>:-U_FORTIFY_SOURCE;-D_FORTIFY_SOURCE=2;-ffunction-sections;-fdata-sections>
+    $<$<CONFIG:Release>:-U_FORTIFY_SOURCE;-D_FORTIFY_SOURCE=3;-ffunction-sections;-fdata-sections>
     # Nothing unwinds: there are no exceptions, and a debugger has its own tables.
     $<$<CONFIG:Release>:-fno-unwind-tables;-fno-asynchronous-unwind-tables>)
 

@@ -21,6 +21,7 @@
 #include "nurostoragecore/partition_layout.h"
 #include "nurostoragecore/partition_version.h"
 #include "nurostoragecore/program_path.h"
+#include "nurostoragecore/raid_disk.h"
 #include "nurostoragecore/raid_info.h"
 #include "nurostoragecore/raid_membership.h"
 #include "nurostoragecore/raid_remove.h"

@@ -4,8 +4,8 @@
 # The part of the appliance that does not change from run to run: a stock kernel, its modules and
 # the stock programs. It is made once and kept in the cache folder; a run adds only what was built.
 
-KERNEL_META_PACKAGE=linux-image-cloud-amd64
-KERNEL_DEB_PATTERN='linux-image-*-cloud-amd64_*.deb'
+# shellcheck source=SCRIPTDIR/fetch.sh
+. "$APPLIANCE_DIR/lib/fetch.sh"
 
 # What the machine loads at its start, and what the kernel asks for when it is needed.
 KERNEL_MODULES=(
@@ -15,13 +15,11 @@ KERNEL_MODULES=(
     ext4 crc32c_generic loop scsi_debug
 )
 
-# Program of the host, and where it lies inside. The stock partitioner makes room for the
-# appliance's own.
+# Program, and where it lies inside. The stock partitioner makes room for the appliance's own.
 GUEST_TOOLS=(
     mdadm:/usr/sbin/mdadm
     lvm:/usr/sbin/lvm
     dmsetup:/usr/sbin/dmsetup
-    sfdisk:/usr/sbin/sfdisk.stock
     blkid:/usr/sbin/blkid
     wipefs:/usr/sbin/wipefs
     blockdev:/usr/sbin/blockdev
@@ -30,82 +28,103 @@ GUEST_TOOLS=(
     flock:/usr/bin/flock
     mount:/usr/bin/mount
     umount:/usr/bin/umount
-    strace:/usr/bin/strace
     mke2fs:/usr/sbin/mkfs.ext4
     e2fsck:/usr/sbin/e2fsck
     debugfs:/usr/sbin/debugfs
 )
+# The cases of the suites want these too; without them the demo still runs.
+CASE_TOOLS=(sfdisk:/usr/sbin/sfdisk.stock strace:/usr/bin/strace)
 
 LVM_COMMANDS=(
     pvs pvcreate pvremove pvscan pvck vgs vgcreate vgremove vgchange vgscan vgextend
     lvs lvcreate lvremove lvchange lvscan
 )
 
-BASE_PACKAGES=(busybox-static mdadm lvm2 dmsetup fdisk util-linux mount e2fsprogs strace libc6)
+PROGRAM_FOLDERS=(usr/sbin usr/bin sbin bin)
+LIBRARY_FOLDERS=(usr/lib/x86_64-linux-gnu lib/x86_64-linux-gnu usr/lib64 lib64 usr/lib lib)
 
 GUEST_FOLDERS=(
     usr/bin usr/sbin usr/lib usr/lib64 dev proc sys etc/lvm etc/mdadm etc.defaults run/lock
     tmp root mnt var/log var/run appliance
 )
 
-# Prints the path of the kernel package, fetched when the cache has none.
-kernel_package() {
-    local szDeb szPackage
-    szDeb=$(kernel_package_cached)
-    if [ -z "$szDeb" ]; then
-        szPackage=$(apt-cache depends --important "$KERNEL_META_PACKAGE" 2>/dev/null |
-            sed -n 's/^ *Depends: \(linux-image-[0-9].*\)/\1/p')
-        [ -n "$szPackage" ] || die "$KERNEL_META_PACKAGE is not known here; run apt-get update"
-        note "fetching $szPackage (27 MB, once)"
-        (cd "$CACHE_DIR" && apt-get -q -o APT::Sandbox::User=root download "$szPackage") \
-            >"$CACHE_DIR/download.log" 2>&1 || die "no kernel: $(tail -n 1 "$CACHE_DIR/download.log")"
-        szDeb=$(kernel_package_cached)
-    fi
-    printf '%s\n' "$szDeb"
-}
-
-kernel_package_cached() {
-    find "$CACHE_DIR" -maxdepth 1 -name "$KERNEL_DEB_PATTERN" | sort -V | tail -n 1
-}
-
-# Changes whenever something in the base would: the kernel, a program's version, this file.
+# Changes whenever something in the base would: a package, a program's version, the scripts.
 base_key() {
+    local -a packages
+    mapfile -t packages < <(packages_of inside "$szRelease" appliance)
     {
-        basename "$1"
-        dpkg-query -W -f '${Package} ${Version}\n' "${BASE_PACKAGES[@]}"
-        cat "${BASH_SOURCE[0]}"
+        ls "$1"
+        ! is_own_release || dpkg-query -W -f '${Package} ${Version}\n' "${packages[@]}" libc6 2>/dev/null
+        cat "${BASH_SOURCE[0]}" "$APPLIANCE_DIR/lib/fetch.sh"
     } | sha256sum | cut -c1-16
 }
 
+# A kernel's package comes without the list of what needs what; installing it would make one.
 base_modules() {
     local szUnpacked=$1 szRoot=$2 szVersion szModule szPath
+    # Releases differ in where the modules lie; both ways lead to them.
+    [ -e "$szUnpacked/lib/modules" ] || {
+        mkdir -p "$szUnpacked/lib" && ln -s ../usr/lib/modules "$szUnpacked/lib/modules" || return
+    }
     szVersion=$(basename "$szUnpacked"/lib/modules/*)
-    # The package comes without the dependency list; installing it would make one.
-    depmod -b "$szUnpacked" "$szVersion"
+    depmod -b "$szUnpacked" "$szVersion" || return
     for szModule in "${KERNEL_MODULES[@]}"; do
+        # Not every kernel has every one.
         modprobe -d "$szUnpacked" -S "$szVersion" --show-depends "$szModule" 2>/dev/null
     done | sed -n 's/^insmod \([^ ]*\).*/\1/p' | sort -u | while read -r szPath; do
-        install -D -m 644 "$szPath" "$szRoot/usr${szPath#"$szUnpacked"}"
-    done
+        install -D -m 644 "$szPath" "$szRoot/usr/lib/modules/${szPath#*/lib/modules/}" || exit
+    done || return
     cp "$szUnpacked/lib/modules/$szVersion"/modules.{order,builtin,builtin.modinfo} \
-        "$szRoot/usr/lib/modules/$szVersion/"
-    depmod -b "$szRoot/usr" "$szVersion"
+        "$szRoot/usr/lib/modules/$szVersion/" && depmod -b "$szRoot/usr" "$szVersion"
+}
+
+# inside_find UNPACKED NAME FOLDER...: where a file lies among what was fetched, or on this machine.
+inside_find() {
+    local szUnpacked=$1 szName=$2 szPlace szFolder
+    shift 2
+    for szPlace in "$szUnpacked" ''; do
+        [ -n "$szPlace" ] || is_own_release || continue
+        for szFolder in "$@"; do
+            [ ! -f "$szPlace/$szFolder/$szName" ] || { printf '%s\n' "$szPlace/$szFolder/$szName"; return; }
+        done
+    done
+    return 1
+}
+
+# inside_install UNPACKED FILE TARGET ROOT: a program or library, and every library that it needs.
+inside_install() {
+    local szUnpacked=$1 szFile=$2 szRoot=$4 szLibrary szPath
+    install -D "$szFile" "$szRoot$3" || return
+    while read -r szLibrary; do
+        szPath=/usr/lib/x86_64-linux-gnu/$szLibrary
+        [[ $szLibrary != ld-linux* ]] || szPath=/usr/lib64/$szLibrary
+        [ ! -e "$szRoot$szPath" ] || continue
+        szFile=$(inside_find "$szUnpacked" "$szLibrary" "${LIBRARY_FOLDERS[@]}") ||
+            { complain "no $szLibrary for $3"; return 1; }
+        inside_install "$szUnpacked" "$szFile" "$szPath" "$szRoot" || return
+    done < <(readelf -dl "$szFile" | sed -n -e 's/.*(NEEDED).*\[\(.*\)\]/\1/p' \
+        -e 's,.*program interpreter: .*/\(.*\)\],\1,p')
 }
 
 base_programs() {
-    local szRoot=$1 szPair szCommand szApplet
-    for szPair in "${GUEST_TOOLS[@]}"; do
-        szCommand=$(command -v "${szPair%%:*}") || die "${szPair%%:*} is missing on this machine"
-        copy_with_libraries "$szCommand" "${szPair#*:}" "$szRoot"
+    local szUnpacked=$1 szRoot=$2 szPair szCommand szApplet
+    for szPair in "${GUEST_TOOLS[@]}" "${CASE_TOOLS[@]}"; do
+        szCommand=$(inside_find "$szUnpacked" "${szPair%%:*}" "${PROGRAM_FOLDERS[@]}") || {
+            [[ " ${CASE_TOOLS[*]} " == *" $szPair "* ]] && continue
+            complain "no ${szPair%%:*} for the inside"
+            return 1
+        }
+        inside_install "$szUnpacked" "$szCommand" "${szPair#*:}" "$szRoot" || return
     done
     for szCommand in "${LVM_COMMANDS[@]}"; do
-        ln -s lvm "$szRoot/usr/sbin/$szCommand"
+        ln -s lvm "$szRoot/usr/sbin/$szCommand" || return
     done
-    install "$(command -v busybox)" "$szRoot/usr/bin/busybox"
+    szCommand=$(inside_find "$szUnpacked" busybox "${PROGRAM_FOLDERS[@]}") &&
+        install "$szCommand" "$szRoot/usr/bin/busybox" || return
     while read -r szApplet; do
         szApplet=$szRoot/usr/${szApplet#usr/}
-        [ -e "$szApplet" ] || ln -s /usr/bin/busybox "$szApplet"
-    done < <(busybox --list-full | grep -v '^linuxrc$')
+        [ -e "$szApplet" ] || ln -s /usr/bin/busybox "$szApplet" || return
+    done < <("$szCommand" --list-full | grep -v '^linuxrc$')
 }
 
 base_root() {
@@ -120,31 +139,48 @@ base_root() {
     printf 'root:x:0:\ndisk:x:6:\n' >"$szRoot/etc/group"
 }
 
-base_build() {
-    local szDeb=$1 szBase=$2 szWork
-    note "making the base of the appliance from $(basename "$szDeb") (once)"
+base_make() { # FETCHED WORK
+    local szDeb szWork=$2
+    mkdir "$szWork/unpacked" "$szWork/out" "$szWork/root" || return
+    for szDeb in "$1"/*.deb; do
+        dpkg -x "$szDeb" "$szWork/unpacked" || return
+    done
+    base_root "$szWork/root" &&
+        base_modules "$szWork/unpacked" "$szWork/root" &&
+        base_programs "$szWork/unpacked" "$szWork/root" &&
+        pack "$szWork/root" "$szWork/out/base.cpio" &&
+        cp "$szWork"/unpacked/boot/vmlinuz-* "$szWork/out/vmlinuz" &&
+        (cd "$szWork/root" && find usr/lib usr/lib64 -name '*.so*') >"$szWork/out/libraries"
+}
+
+# Only what has booted is kept; anything else would fail every run to come.
+base_build() { # FETCHED BASE
+    local szWork
+    note "making the base of the appliance from $(basename "$1"/linux-image-[0-9]*.deb) (once)"
     szWork=$(mktemp -d "$CACHE_DIR/work.XXXXXX")
-    mkdir "$szWork/out" "$szWork/root"
-    dpkg -x "$szDeb" "$szWork/kernel"
-    base_root "$szWork/root"
-    base_modules "$szWork/kernel" "$szWork/root"
-    base_programs "$szWork/root"
-    pack "$szWork/root" "$szWork/out/base.cpio"
-    cp "$szWork"/kernel/boot/vmlinuz-* "$szWork/out/vmlinuz"
-    mv "$szWork/out" "$szBase"
+    if base_make "$1" "$szWork" 2>"$szWork/log" && ARRAYCTL_BASE=$szWork/out ARRAYCTL_RELEASE=$szRelease \
+        "$APPLIANCE_DIR/run" --quiet --build none --disks 1 "$APPLIANCE_DIR/guest/trial" >>"$szWork/log" 2>&1; then
+        mv "$szWork/out" "$2"
+        rm -rf "$szWork"
+        return
+    fi
+    complain "the base of the appliance cannot be made:"
+    cat "$szWork/log" >&2
     rm -rf "$szWork"
+    exit "$EXIT_MACHINE"
 }
 
 # Prints the folder that holds vmlinuz and base.cpio, made first when it is not there. Runs may
 # start at the same time: one of them makes it, the others wait.
 base_ready() {
-    local szDeb szBase
+    local szFetched szBase
+    [ -z "${ARRAYCTL_BASE:-}" ] || { printf '%s\n' "$ARRAYCTL_BASE"; return; }
     mkdir -p "$CACHE_DIR"
-    exec 9>"$CACHE_DIR/lock"
+    exec 9>"$CACHE_DIR/lock-$szRelease"
     flock 9
-    szDeb=$(kernel_package) || exit
-    szBase=$CACHE_DIR/base-$(base_key "$szDeb")
-    [ -e "$szBase/vmlinuz" ] || base_build "$szDeb" "$szBase"
+    szFetched=$(fetch_packages) || exit
+    szBase=$CACHE_DIR/base-$szRelease-$(base_key "$szFetched")
+    [ -e "$szBase/vmlinuz" ] || base_build "$szFetched" "$szBase"
     exec 9>&-
     printf '%s\n' "$szBase"
 }

@@ -32,15 +32,9 @@ EXIT_MACHINE=125
 HOST_TOOLS=(
     "$QEMU:qemu-system-x86"
     busybox:busybox-static
-    mdadm:mdadm
-    lvm:lvm2
-    dmsetup:dmsetup
-    sfdisk:fdisk
-    mke2fs:e2fsprogs
-    strace:strace
     modprobe:kmod
     depmod:kmod
-    cpio:cpio
+    readelf:binutils
 )
 
 require_host_tools() {
@@ -59,7 +53,7 @@ copy_with_libraries() {
     local szSource=$1 szTarget=$2 szRoot=$3 szLibrary
     install -D "$szSource" "$szRoot$szTarget"
     while read -r szLibrary; do
-        [ -e "$szRoot$szLibrary" ] || install -D "$szLibrary" "$szRoot$szLibrary"
+        [ -e "$szRoot$szLibrary" ] || is_inside "$szLibrary" || install -D "$szLibrary" "$szRoot$szLibrary"
     done < <(libraries_of "$szSource")
 }
 
@@ -70,5 +64,5 @@ libraries_of() {
 
 pack() {
     (cd "$1" && find . -mindepth 1 | LC_ALL=C sort |
-        cpio --quiet -o -H newc -R 0:0) >"$2"
+        busybox cpio -o -H newc -R 0:0) >"$2"
 }

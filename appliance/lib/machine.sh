@@ -26,7 +26,7 @@ PROBE_SECONDS=10
 machine_options() {
     while [ $# -gt 0 ]; do
         case $1 in
-        --disks | --size | --keep | --build | --silence | --file | --console)
+        --disks | --size | --keep | --build | --silence | --file | --console | --release)
             [ $# -ge 2 ] || die "$1 needs a value; see --help"
             machine_option "$1" "$2"
             shift 2
@@ -49,6 +49,7 @@ machine_option() {
     --build) szBuildDir=$2 ;;
     --silence) nSilence=$2 ;;
     --file) files+=("$2") ;;
+    --release) szRelease=$2 ;;
     --console) szConsoleCopy=$2 ;;
     esac
 }
@@ -58,6 +59,8 @@ machine_options_check() {
     [[ $nDisks =~ ^[0-9]+$ && $nDisks -le 64 ]] || die "--disks takes 0 to 64, not $nDisks"
     [[ $nSilence =~ ^[1-9][0-9]*$ ]] || die "--silence takes seconds, not $nSilence"
     [[ $szDiskSize =~ ^[1-9][0-9]*[KMGT]?$ ]] || die "--size takes a size such as 6G"
+    is_own_release || [[ " ${DEBIAN_RELEASES[*]} " == *" $szRelease "* ]] ||
+        die "--release takes ${DEBIAN_RELEASES[*]}, not $szRelease"
     for szFile in "${files[@]}"; do
         [[ $szFile == ?*:/?* && -e ${szFile%%:*} ]] || die "--file takes SRC:/DEST, not $szFile"
     done
@@ -103,6 +106,11 @@ overlay_build() {
     if [ -e "$szBuildDir/$2" ]; then
         copy_with_libraries "$szBuildDir/$2" "$3" "$1"
     fi
+}
+
+# The programs of a newer release need its own libraries, which serve those of this machine, too.
+is_inside() {
+    is_newer_release && grep -qx "${1#/}" "$szBaseDir/libraries"
 }
 
 # A folder's entry in the archive would replace the link of the same name, so /bin and the like

@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: MIT
 #include "md_answer.h"
+#include "md_health.h"
 
+#include <cstdint>
 #include <cstdio>
 #include <cstring>
 #include <sys/sysmacros.h>

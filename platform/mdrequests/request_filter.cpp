@@ -5,6 +5,7 @@
 
 #include <cerrno>
 #include <cstddef>
+#include <cstdint>
 #include <linux/audit.h>
 #include <linux/filter.h>
 #include <linux/seccomp.h>

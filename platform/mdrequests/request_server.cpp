@@ -4,6 +4,7 @@
 #include "md_answer.h"
 
 #include <cerrno>
+#include <cstdint>
 #include <cstdio>
 #include <fcntl.h>
 #include <linux/seccomp.h>

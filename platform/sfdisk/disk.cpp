@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: MIT
 #include "disk.h"
+#include "partition.h"
 
 #include <cerrno>
 #include <cstdio>

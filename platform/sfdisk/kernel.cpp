@@ -1,5 +1,8 @@
 // SPDX-License-Identifier: MIT
 #include "kernel.h"
+#include "disk.h"
+#include "partition.h"
+#include "table.h"
 
 #include <algorithm>
 #include <cerrno>
@@ -9,6 +12,7 @@
 #include <ctime>
 #include <dirent.h>
 #include <linux/blkpg.h>
+#include <memory>
 #include <sys/ioctl.h>
 #include <sys/stat.h>
 #include <sys/sysmacros.h>

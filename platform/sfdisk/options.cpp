@@ -1,9 +1,11 @@
 // SPDX-License-Identifier: MIT
 #include "options.h"
+#include "partition.h"
 
 #include <cctype>
 #include <cerrno>
 #include <climits>
+#include <cstdint>
 #include <cstdlib>
 #include <cstring>
 

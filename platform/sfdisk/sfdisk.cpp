@@ -5,10 +5,12 @@
 #include "disk.h"
 #include "kernel.h"
 #include "options.h"
+#include "partition.h"
 #include "table.h"
 
 #include <cstdio>
 #include <cstdlib>
+#include <memory>
 
 namespace
 {

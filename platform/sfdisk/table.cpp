@@ -1,9 +1,13 @@
 // SPDX-License-Identifier: MIT
 #include "table.h"
+#include "disk.h"
+#include "partition.h"
 
 #include <algorithm>
 #include <cerrno>
+#include <cstdint>
 #include <cstring>
+#include <memory>
 
 namespace
 {
@@ -13,7 +17,9 @@ constexpr u32 TYPE_PROTECTIVE = 0xee;
 constexpr off_t MBR_FIRST_ENTRY = 446;
 constexpr off_t MBR_ENTRY_SIZE = 16;
 constexpr int MBR_ENTRIES = 4;
-constexpr u64 MBR_LAST_SECTOR = UINT32_MAX;
+// An entry counts in 32 bits. Since 2.41 libfdisk makes no partition that ends on the very last of
+// these sectors, and a disk gets the same table from every version.
+constexpr u64 MBR_ROOM = UINT32_MAX;
 
 constexpr char GPT_SIGNATURE[] = {'E', 'F', 'I', ' ', 'P', 'A', 'R', 'T'};
 constexpr size_t DISK_SECTOR_MAX = 4096;
@@ -247,7 +253,7 @@ int TableDelete(TABLE *pTable, int number)
 
 u64 TableRoomGet(const TABLE *pTable)
 {
-    return std::min(pTable->sectors, (MBR_LAST_SECTOR + 1) * pTable->unit);
+    return std::min(pTable->sectors, MBR_ROOM * pTable->unit);
 }
 
 int TableWrite(const TABLE *pTable)

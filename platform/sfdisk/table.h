@@ -49,8 +49,8 @@ int TableAdd(TABLE *pTable, const PARTITION &partition);
 // number of each one after it by 1.
 int TableDelete(TABLE *pTable, int number);
 
-// The first sector that no entry can address any more: the end of the disk, or 2 TiB on a disk with
-// 512-byte sectors (an entry counts in 32 bits), whichever comes first.
+// The first sector that no partition can have any more: the end of the disk, or the last sector of
+// 2 TiB on a disk with 512-byte sectors (an entry counts in 32 bits), whichever comes first.
 u64 TableRoomGet(const TABLE *pTable);
 
 // When this returns, everything is on the disk, not only in memory.

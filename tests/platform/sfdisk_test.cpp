@@ -765,24 +765,24 @@ TEST_F(SfdiskTest, OnlyAnMsdosTableGetsPartitions)
     RunBadly(CreateWords(2, 0, "100", "83"), szLine);
 }
 
-// An entry counts in 32 bits: sectors from 2 TiB on have no number.
+// An entry counts in 32 bits: the last sector of 2 TiB, and what is behind it, is left.
 TEST_F(SfdiskTest, TheRestOfALargeDiskEndsAtTwoTebibytes)
 {
     ImageMake(3 * 1024 * 1024 * MEBIBYTE);
     Sign();
     const string szLine = "sfdisk: partition 1 does not fit on " + szImage +
-                          ": it begins at sector 2048 of 4294967296\n";
-    EXPECT_EQ(Run(CreateWords(1, 2048, "4294965249", "fd")).szErr, szLine);
+                          ": it begins at sector 2048 of 4294967295\n";
+    EXPECT_EQ(Run(CreateWords(1, 2048, "4294965248", "fd")).szErr, szLine);
     ExpectNoEntry(szImage, 1);
     RunWell(CreateWords(1, 2048, "-1", "fd"));
-    ExpectEntry(szImage, 1, 0xfd, 2048, 4294965248);
-    EXPECT_EQ(List(1), szImage + "1 2048 4294967295 4294965248 fd\n");
+    ExpectEntry(szImage, 1, 0xfd, 2048, 4294965247);
+    EXPECT_EQ(List(1), szImage + "1 2048 4294967294 4294965247 fd\n");
     RunWell({"--fast-delete", "-1", szImage});
-    Create(1, 2048, 4294965248, "fd");
-    ExpectEntry(szImage, 1, 0xfd, 2048, 4294965248);
+    Create(1, 2048, 4294965247, "fd");
+    ExpectEntry(szImage, 1, 0xfd, 2048, 4294965247);
     EXPECT_EQ(Run(CreateWords(2, 0, "-1", "fd")).szErr,
               "sfdisk: partition 2 does not fit on " + szImage +
-                  ": it begins at sector 4294967296 of 4294967296\n");
+                  ": it begins at sector 4294967295 of 4294967295\n");
 }
 
 // ---- -l

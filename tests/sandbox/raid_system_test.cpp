@@ -193,9 +193,8 @@ TEST(SystemDiskStatus, FollowsFromBothStates)
 
 TEST(SystemDiskStatus, TakesAModelWithoutFileForOneWithSwap)
 {
-    const RUN_RESULT result = MachineCall(MachineMake(), [] {
-        ExpectStatus({NORMAL, NONE, 1, FAILED, FAILED}, FAILED);
-    });
+    const auto ask = [] { ExpectStatus({NORMAL, NONE, 1, FAILED, FAILED}, FAILED); };
+    const RUN_RESULT result = MachineCall(MachineMake(), ask);
     for (const LOG_LINE &line : result.log) {
         EXPECT_EQ(line.priority, 15);
         EXPECT_TRUE(std::regex_match(

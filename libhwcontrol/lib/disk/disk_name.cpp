@@ -5,6 +5,7 @@
 #include "nurocore/handle.h"
 #include "nurocore/log.h"
 #include "nurocore/text.h"
+#include "nurocore/types.h"
 
 #include <algorithm>
 #include <cctype>

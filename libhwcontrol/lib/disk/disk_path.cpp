@@ -2,9 +2,11 @@
 #include "hwcontrol/disk_path.h"
 
 #include "hwcontrol/disk_name.h"
+#include "hwcontrol/disk_port.h"
 #include "nurocore/error.h"
 #include "nurocore/log.h"
 #include "nurocore/text.h"
+#include "nurocore/types.h"
 
 #include <array>
 #include <cstring>

@@ -7,6 +7,7 @@
 #include "nurocore/handle.h"
 #include "nurocore/keyvalue.h"
 #include "nurocore/log.h"
+#include "nurocore/szlist_base.h"
 #include "nurocore/text.h"
 #include "nurocore/types.h"
 
@@ -241,7 +242,7 @@ struct DIRECTORY_ENTRIES {
         for (int i = 0; i < nEntry; i++) {
             free(ppEntries[i]);
         }
-        free(ppEntries);
+        free(static_cast<void *>(ppEntries));
     }
 };
 

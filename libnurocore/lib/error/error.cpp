@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: MIT
 #include "nurocore/error.h"
 
+#include "nurocore/types.h"
+
 namespace
 {
 

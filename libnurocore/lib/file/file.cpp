@@ -5,7 +5,9 @@
 #include "nurocore/handle.h"
 #include "nurocore/io.h"
 #include "nurocore/log.h"
+#include "nurocore/szlist_base.h"
 
+#include <cstdio>
 #include <sys/stat.h>
 
 namespace

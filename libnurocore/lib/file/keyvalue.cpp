@@ -10,7 +10,6 @@
 #include <cstdlib>
 #include <cstring>
 #include <strings.h>
-#include <sys/types.h>
 
 namespace
 {

@@ -6,6 +6,8 @@
 #include "nurocore/hash.h"
 
 #include "nurocore/error.h"
+#include "nurocore/szlist_base.h"
+#include "nurocore/types.h"
 
 #include <algorithm>
 #include <climits>

@@ -20,6 +20,7 @@
 
 #include "nurocore/error.h"
 #include "nurocore/handle.h"
+#include "nurocore/types.h"
 #include "szlist_internal.h"
 
 #include <algorithm>

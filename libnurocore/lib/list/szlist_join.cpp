@@ -4,7 +4,9 @@
 #include "nurocore/error.h"
 #include "nurocore/handle.h"
 #include "nurocore/log.h"
+#include "nurocore/szlist_base.h"
 #include "nurocore/text.h"
+#include "nurocore/types.h"
 #include "szlist_internal.h"
 
 #include <climits>

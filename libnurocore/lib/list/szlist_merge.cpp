@@ -2,6 +2,8 @@
 #include "nurocore/szlist_merge.h"
 
 #include "nurocore/error.h"
+#include "nurocore/szlist_base.h"
+#include "nurocore/types.h"
 #include "szlist_internal.h"
 
 #include <algorithm>

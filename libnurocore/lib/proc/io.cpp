@@ -4,6 +4,8 @@
 #include "nurocore/error.h"
 
 #include <cerrno>
+#include <cstddef>
+#include <cstdio>
 #include <unistd.h>
 
 namespace

@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: MIT
 #include "lock_file.h"
 
+#include <cstdio>
+
 namespace
 {
 

@@ -3,12 +3,15 @@
 
 #include "nurocore/error.h"
 #include "nurocore/handle.h"
+#include "nurocore/szlist_base.h"
+#include "nurocore/types.h"
 
 #include <algorithm>
 #include <cstdint>
 #include <cstdlib>
 #include <cstring>
 #include <limits>
+#include <string_view>
 
 namespace
 {

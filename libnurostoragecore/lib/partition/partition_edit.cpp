@@ -6,6 +6,7 @@
 #include "nurocore/log.h"
 #include "nurocore/pipe.h"
 #include "nurocore/text.h"
+#include "nurocore/types.h"
 #include "nurostoragecore/partition_layout.h"
 #include "nurostoragecore/partition_version.h"
 #include "nurostoragecore/program_path.h"

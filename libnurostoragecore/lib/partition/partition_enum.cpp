@@ -8,6 +8,7 @@
 #include "nurocore/log.h"
 #include "nurocore/szlist.h"
 #include "nurocore/text.h"
+#include "nurocore/types.h"
 
 #include <cstring>
 #include <string_view>

@@ -6,6 +6,7 @@
 #include "nurocore/conf.h"
 #include "nurocore/error.h"
 #include "nurocore/log.h"
+#include "nurocore/types.h"
 #include "partition/partition_type.h"
 
 #include <array>

@@ -7,6 +7,7 @@
 #include "nurocore/handle.h"
 #include "nurocore/log.h"
 #include "nurocore/szlist.h"
+#include "nurocore/types.h"
 #include "nurostoragecore/partition_layout.h"
 #include "nurostoragecore/raid_membership.h"
 

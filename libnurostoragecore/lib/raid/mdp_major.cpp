@@ -3,6 +3,7 @@
 
 #include "nurocore/handle.h"
 #include "nurocore/text.h"
+#include "nurocore/types.h"
 
 #include <cstdio>
 #include <cstdlib>

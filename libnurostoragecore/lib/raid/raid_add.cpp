@@ -2,11 +2,14 @@
 #include "nurostoragecore/raid_add.h"
 
 #include "nurocore/log.h"
+#include "nurocore/types.h"
 #include "nurostoragecore/program_path.h"
 #include "nurostoragecore/raid_info.h"
 #include "nurostoragecore/space.h"
 #include "raid/raid_owner.h"
 #include "space/command_text.h"
+
+#include <cstddef>
 
 namespace
 {

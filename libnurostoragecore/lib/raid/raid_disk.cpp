@@ -7,6 +7,7 @@
 #include "nurocore/handle.h"
 #include "nurocore/log.h"
 #include "nurocore/text.h"
+#include "nurocore/types.h"
 #include "raid/raid_owner.h"
 
 #include <cstdio>

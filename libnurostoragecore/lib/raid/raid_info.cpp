@@ -5,11 +5,11 @@
 #include "nurocore/error.h"
 #include "nurocore/handle.h"
 #include "nurocore/log.h"
-#include "nurocore/text.h"
+#include "nurocore/types.h"
+#include "nurostoragecore/raid_disk.h"
 #include "raid/mdp_major.h"
 #include "raid/raid_owner.h"
 
-#include <algorithm>
 #include <cerrno>
 #include <cstdio>
 #include <cstdlib>

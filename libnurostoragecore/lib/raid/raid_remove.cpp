@@ -8,6 +8,7 @@
 #include "nurocore/szlist.h"
 #include "nurostoragecore/partition_enum.h"
 #include "nurostoragecore/program_path.h"
+#include "nurostoragecore/raid_info.h"
 #include "nurostoragecore/raid_superblock.h"
 #include "nurostoragecore/space.h"
 #include "raid/raid_owner.h"

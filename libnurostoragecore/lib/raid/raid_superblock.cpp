@@ -5,7 +5,9 @@
 #include "nurocore/log.h"
 #include "nurocore/pipe.h"
 #include "nurocore/text.h"
+#include "nurocore/types.h"
 #include "nurostoragecore/program_path.h"
+#include "nurostoragecore/raid_info.h"
 
 #include <cstdio>
 #include <cstring>

@@ -6,6 +6,9 @@
 #include "nurocore/error.h"
 #include "nurocore/keyvalue.h"
 #include "nurocore/log.h"
+#include "nurocore/types.h"
+#include "nurostoragecore/raid_disk.h"
+#include "nurostoragecore/raid_info.h"
 
 namespace
 {

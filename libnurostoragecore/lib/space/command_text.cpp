@@ -4,6 +4,7 @@
 #include "nurocore/text.h"
 
 #include <algorithm>
+#include <cstddef>
 
 void CommandTextBuild(const char *const argv[], size_t cchArgumentMax, char *szText, size_t cbText)
 {

@@ -9,6 +9,7 @@
 #include "space/command_text.h"
 
 #include <cstdarg>
+#include <cstdio>
 #include <cstring>
 #include <ctime>
 

@@ -292,9 +292,9 @@ verdict 'sectors of 4096 bytes'
 debug_disk virtual_gb=3000
 check "the disk is large" [ "$(cat "/sys/block/$disk/size")" -gt 4294967296 ]
 signs "$disk"
-makes "$disk" 1 2048 -1 fd 2048 4294965248
+makes "$disk" 1 2048 -1 fd 2048 4294965247
 check "no more" refuses \
-    "partition 2 does not fit on /dev/$disk: it begins at sector 4294967296 of 4294967296" \
+    "partition 2 does not fit on /dev/$disk: it begins at sector 4294967295 of 4294967295" \
     -N2 -uS -j0 -z-1 -tfd "/dev/$disk"
 must rmmod scsi_debug
 verdict 'a disk of more than 2 TiB'
