@@ -25,7 +25,7 @@ struct JOIN_BUFFER {
     explicit JOIN_BUFFER(int cbIn)
         : psz(static_cast<char *>(malloc(cbIn > 0 ? static_cast<size_t>(cbIn) : 1))), cb(cbIn)
     {
-        memset(psz, 'X', cbIn > 0 ? static_cast<size_t>(cbIn) : 1);
+        memset(psz, '#', cbIn > 0 ? static_cast<size_t>(cbIn) : 1);
     }
     JOIN_BUFFER(const JOIN_BUFFER &) = delete;
     JOIN_BUFFER &operator=(const JOIN_BUFFER &) = delete;
@@ -39,7 +39,7 @@ struct JOIN_CASE {
     const char *szName;
     ITEMS items;
     const char *szSeparator;
-    int cb; // of the buffer, full of 'X'
+    int cb; // of the buffer, full of '#'
     int result;
     int cbAfter;
     std::string_view bytes; // the buffer begins with afterwards
@@ -59,7 +59,7 @@ const JOIN_CASE JOIN_CASES[] = {
      31,
      "sda1 /dev/sdb1 /dev/sdc1\0"sv},
     {"NeedsNoSeparator", {"sda1", "sdb1", "sdc1"}, "", 0, 13, 13, "sda1sdb1sdc1\0"sv},
-    {"LeavesTheBufferToAnEmptyList", {}, ",", 3, 0, 3, "XXX"sv},
+    {"LeavesTheBufferToAnEmptyList", {}, ",", 3, 0, 3, "###"sv},
 };
 
 TEST_ROWS(SzListJoin, JOIN_CASES)
@@ -81,7 +81,7 @@ TEST(SzListJoinEmptySlots, JoinsEmptySlotsAsEmptyTexts)
     EXPECT_STREQ(buffer.psz, "a,,b");
 }
 
-// 16 bytes, all of them 'X' before.
+// 16 bytes, all of them '#' before.
 struct DUMP_CASE {
     const char *szName;
     ITEMS items;
@@ -93,24 +93,24 @@ struct DUMP_CASE {
 
 const DUMP_CASE DUMP_CASES[] = {
     {"All", {"ab", "cd"}, ",", 16, 5, "ab,cd\0\0\0\0\0\0\0\0\0\0\0"sv},
-    {"WhatJustFits", {"ab", "cd"}, ",", 6, 5, "ab,cd\0XXXXXXXXXX"sv},
-    {"WithoutSeparator", {"ab", "cd"}, "", 5, 4, "abcd\0XXXXXXXXXXX"sv},
+    {"WhatJustFits", {"ab", "cd"}, ",", 6, 5, "ab,cd\0##########"sv},
+    {"WithoutSeparator", {"ab", "cd"}, "", 5, 4, "abcd\0###########"sv},
     {"ALongSeparator", {"ab", "cd"}, " and ", 16, 9, "ab and cd\0\0\0\0\0\0\0"sv},
-    {"OneItem", {"ab"}, ",", 7, 2, "ab\0\0\0\0\0XXXXXXXXX"sv},
-    {"NoItem", {}, ",", 7, 0, "\0\0\0\0\0\0\0XXXXXXXXX"sv},
+    {"OneItem", {"ab"}, ",", 7, 2, "ab\0\0\0\0\0#########"sv},
+    {"NoItem", {}, ",", 7, 0, "\0\0\0\0\0\0\0#########"sv},
     // up to the unit that does not fit
-    {"OneByteShort", {"ab", "cd"}, ",", 5, -1, "ab\0\0\0XXXXXXXXXXX"sv},
-    {"OneItemOfTwo", {"ab", "cd"}, ",", 3, -1, "ab\0XXXXXXXXXXXXX"sv},
-    {"NotEvenOneItem", {"ab", "cd"}, ",", 2, -1, "\0\0XXXXXXXXXXXXXX"sv},
-    {"NothingButTheEnd", {"ab", "cd"}, ",", 1, -1, "\0XXXXXXXXXXXXXXX"sv},
-    {"ALongItem", {"ab", "cdefg"}, ",", 7, -1, "ab\0\0\0\0\0XXXXXXXXX"sv},
+    {"OneByteShort", {"ab", "cd"}, ",", 5, -1, "ab\0\0\0###########"sv},
+    {"OneItemOfTwo", {"ab", "cd"}, ",", 3, -1, "ab\0#############"sv},
+    {"NotEvenOneItem", {"ab", "cd"}, ",", 2, -1, "\0\0##############"sv},
+    {"NothingButTheEnd", {"ab", "cd"}, ",", 1, -1, "\0###############"sv},
+    {"ALongItem", {"ab", "cdefg"}, ",", 7, -1, "ab\0\0\0\0\0#########"sv},
 };
 
 TEST_ROWS(SzListDump2Str, DUMP_CASES)
 {
     const DUMP_CASE &row = GetParam();
     const TEST_LIST list(row.items, SZLIST_UNSORTED);
-    std::string out(16, 'X');
+    std::string out(16, '#');
     EXPECT_FAILS(NLIBCSzListDump2Str(list.p, row.szSeparator, out.data(), row.cbOut), row.result,
                  row.result == -1 ? ERR_OUT_OF_SPACE : OLD_CODE);
     EXPECT_EQ(out, row.bytes);
