@@ -19,7 +19,7 @@ constexpr off_t MBR_ENTRY_SIZE = 16;
 constexpr int MBR_ENTRIES = 4;
 // An entry counts in 32 bits. Since 2.41 libfdisk makes no partition that ends on the very last of
 // these sectors, and a disk gets the same table from every version.
-constexpr u64 MBR_ROOM = UINT32_MAX;
+constexpr u64 MBR_SECTORS = UINT32_MAX;
 
 constexpr char GPT_SIGNATURE[] = {'E', 'F', 'I', ' ', 'P', 'A', 'R', 'T'};
 constexpr size_t DISK_SECTOR_MAX = 4096;
@@ -253,7 +253,7 @@ int TableDelete(TABLE *pTable, int number)
 
 u64 TableRoomGet(const TABLE *pTable)
 {
-    return std::min(pTable->sectors, MBR_ROOM * pTable->unit);
+    return std::min(pTable->sectors, MBR_SECTORS * pTable->unit);
 }
 
 int TableWrite(const TABLE *pTable)

@@ -83,6 +83,7 @@ void CallsTake(const string &szFolder, RECORD &record)
             continue;
         }
         ORACLE_WORDS words = Split(szLine, '\037');
+        words.pop_back(); // every word ends with the separator
         if (words.size() > 1) {
             const string szReply = "reply." + words[0];
             words.erase(words.begin());

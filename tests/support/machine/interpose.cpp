@@ -265,7 +265,9 @@ void EndAwait()
     static bool fAwaited = false;
     if (__gcov_dump != nullptr && g_fActive && !fAwaited) {
         fAwaited = true;
+        g_fActive = false; // it may allocate, and that is no call of the program
         (void)atexit(InterposeDeactivate);
+        g_fActive = true;
     }
 }
 
