@@ -21,6 +21,7 @@
 #include <csignal>
 #include <cstdio>
 #include <fcntl.h>
+#include <poll.h>
 #include <sched.h>
 #include <sys/prctl.h>
 #include <sys/socket.h>
@@ -61,10 +62,18 @@ int Rehearse(const OPTIONS &options, const HOST &host)
 {
     const DESCRIPTOR journal(socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
     const DESCRIPTOR syslog(socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
+    if (journal.fd < 0 || syslog.fd < 0) {
+        (void)ComplainErrno("cannot make a socket");
+        return STATUS_NOT_REHEARSED;
+    }
     if (!StageSetUp(options.szToolPath.c_str(), journal.fd, syslog.fd)) {
         return STATUS_NOT_REHEARSED;
     }
-    if (listen(journal.fd, SOMAXCONN) != 0 || StageClose() < 0) {
+    if (listen(journal.fd, SOMAXCONN) != 0) {
+        (void)ComplainErrno("cannot listen to the recorder");
+        return STATUS_NOT_REHEARSED;
+    }
+    if (StageClose() < 0) {
         return STATUS_NOT_REHEARSED;
     }
     PausesTell(options);
@@ -75,13 +84,22 @@ int Rehearse(const OPTIONS &options, const HOST &host)
     return RehearsalPrint(options, host, run);
 }
 
-// The child waits for a word, so that it cannot outlive a watcher that is killed before the child
-// asks to be killed with it.
-int ChildRun(const OPTIONS &options, const HOST &host, int fdGo)
+// The watcher alone can write to the pipe, and never does: it hangs up when it ends.
+bool WatcherLives(int fdWatcher)
 {
-    char go = 0;
-    (void)prctl(PR_SET_PDEATHSIG, SIGKILL);
-    if (read(fdGo, &go, 1) != 1) {
+    struct pollfd polled = {.fd = fdWatcher, .events = 0, .revents = 0};
+    return poll(&polled, 1, 0) == 0;
+}
+
+// A watcher that was killed before the child asked to be killed with it has hung up by then, so the
+// child never outlives it.
+int ChildRun(const OPTIONS &options, const HOST &host, int fdWatcher)
+{
+    if (prctl(PR_SET_PDEATHSIG, SIGKILL) != 0) {
+        (void)ComplainErrno("cannot end with its watcher");
+        return STATUS_NOT_REHEARSED;
+    }
+    if (!WatcherLives(fdWatcher)) {
         return STATUS_NOT_REHEARSED;
     }
     const int status = Rehearse(options, host);
@@ -101,8 +119,8 @@ pid_t NamespacesFork()
 
 int ChildWatch(const OPTIONS &options, const HOST &host)
 {
-    int go[2] = {-1, -1};
-    if (pipe2(go, O_CLOEXEC) != 0) {
+    int watcher[2] = {-1, -1};
+    if (pipe2(watcher, O_CLOEXEC) != 0) {
         (void)ComplainErrno("cannot start");
         return STATUS_NOT_REHEARSED;
     }
@@ -113,12 +131,12 @@ int ChildWatch(const OPTIONS &options, const HOST &host)
         return STATUS_NOT_REHEARSED;
     }
     if (pid == 0) {
-        (void)close(go[1]);
-        const int status = ChildRun(options, host, go[0]);
+        (void)close(watcher[1]);
+        const int status = ChildRun(options, host, watcher[0]);
         _exit(status);
     }
     int status = 0;
-    if (write(go[1], "g", 1) != 1 || waitpid(pid, &status, 0) != pid || !WIFEXITED(status)) {
+    if (waitpid(pid, &status, 0) != pid || !WIFEXITED(status)) {
         (void)Complain("the rehearsal came to no end");
         return STATUS_NOT_REHEARSED;
     }

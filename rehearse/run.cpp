@@ -164,7 +164,9 @@ std::vector<char *> Pointers(const WORDS &words)
     return pointers;
 }
 
-[[noreturn]] void ProgramBecome(const char *szPath, const WORDS &argv, int fdOut, int fdErr)
+// Where the program cannot be started, errno goes to fdFailed unless that is -1.
+[[noreturn]] void ProgramBecome(const char *szPath, const WORDS &argv, int fdOut, int fdErr,
+                                int fdFailed)
 {
     sigset_t none = {};
     const int fdNull = open("/dev/null", O_RDWR | O_CLOEXEC);
@@ -174,6 +176,7 @@ std::vector<char *> Pointers(const WORDS &words)
     (void)sigemptyset(&none);
     (void)sigprocmask(SIG_SETMASK, &none, nullptr);
     (void)execv(szPath, Pointers(argv).data());
+    (void)!write(fdFailed, &errno, sizeof(errno));
     _exit(STATUS_NOT_STARTED);
 }
 
@@ -230,12 +233,14 @@ bool RunTool(const WORDS &argv, int fdJournal, int fdSyslog, RUN *pRun)
     const DESCRIPTOR ended(EndedWatch());
     int out[2] = {-1, -1};
     int err[2] = {-1, -1};
-    const pid_t pid = ended.fd >= 0 && PipeMake(out) && PipeMake(err) ? fork() : -1;
+    int failed[2] = {-1, -1};
+    const pid_t pid =
+        ended.fd >= 0 && PipeMake(out) && PipeMake(err) && PipeMake(failed) ? fork() : -1;
     if (pid < 0) {
         return ComplainErrno("cannot start the tool");
     }
     if (pid == 0) {
-        ProgramBecome(TOOL_PATH, argv, out[1], err[1]);
+        ProgramBecome(TOOL_PATH, argv, out[1], err[1], failed[1]);
     }
     (void)close(out[1]);
     (void)close(err[1]);
@@ -253,10 +258,10 @@ bool RunTool(const WORDS &argv, int fdJournal, int fdSyslog, RUN *pRun)
         ListenerTake(listener);
     }
     LeftoversEnd(listener);
-    if (WIFEXITED(pRun->status) && WEXITSTATUS(pRun->status) == STATUS_NOT_STARTED) {
-        return Complain("the tool could not be started");
-    }
-    return true;
+    const DESCRIPTOR told(failed[0]);
+    const DESCRIPTOR telling(failed[1]);
+    return read(told.fd, &errno, sizeof(errno)) != sizeof(errno) ||
+           ComplainErrno("the tool could not be started");
 }
 
 std::string RunQuestion(const WORDS &argv)
@@ -270,7 +275,7 @@ std::string RunQuestion(const WORDS &argv)
     }
     const pid_t pid = fork();
     if (pid == 0) {
-        ProgramBecome(szReal.c_str(), argv, fds[1], -1);
+        ProgramBecome(szReal.c_str(), argv, fds[1], -1, -1);
     }
     (void)close(fds[1]);
     while (StreamTake(fds[0], &szOut, OUTPUT_SIZE_MAX)) {

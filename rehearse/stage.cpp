@@ -284,7 +284,8 @@ bool PrivateFolderMake()
 {
     return (mkdir(PRIVATE_FOLDER, FOLDER_MODE) == 0 ||
             ComplainErrno("cannot make %s", PRIVATE_FOLDER)) &&
-           FolderPrivate(PRIVATE_FOLDER) && (mkdir(REAL_FOLDER, FOLDER_MODE) == 0);
+           FolderPrivate(PRIVATE_FOLDER) &&
+           (mkdir(REAL_FOLDER, FOLDER_MODE) == 0 || ComplainErrno("cannot make %s", REAL_FOLDER));
 }
 
 // The whole file system, so the recorder is read-only wherever it lies.
@@ -338,8 +339,9 @@ bool StageSetUp(const char *szTool, int fdJournal, int fdSyslog)
     if (tool.fd < 0) {
         return ComplainErrno("cannot keep %s at hand", szTool);
     }
-    return chdir("/") == 0 && ProcessesHide() && TmpPrivate() && FoldersPrivate() &&
-           PrivateFolderMake() && RecorderCopy(self.fd) && ToolKeep(tool.fd) && RecorderLay() &&
+    return (chdir("/") == 0 || ComplainErrno("cannot leave the working folder")) &&
+           ProcessesHide() && TmpPrivate() && FoldersPrivate() && PrivateFolderMake() &&
+           RecorderCopy(self.fd) && ToolKeep(tool.fd) && RecorderLay() &&
            SocketBind(fdJournal, JOURNAL_PATH) && SyslogReplace(fdSyslog) && PrivateFolderSeal();
 }
 

@@ -12,28 +12,19 @@
 #include "oracle_model.h"
 #include "sandbox.h"
 #include "suite.h"
-#include "verdict.h"
 #include "words.h"
 
 #include <algorithm>
-#include <cstdio>
 #include <cstdlib>
-#include <cstring>
 
 namespace
 {
 
 using std::string;
-using std::to_string;
 using std::vector;
 using u64 = std::uint64_t;
 
-constexpr char SEED_OF[] = "seed ";
-
-struct OPTIONS {
-    u64 machines = 2000;
-    u64 seed = 1;
-};
+constexpr u64 MACHINES = 2000;
 
 // ---------------------------------------------------------------------------- what came of a run
 
@@ -103,50 +94,16 @@ string CaseRun(u64 seed)
     return text;
 }
 
-void MachinesTry(const OPTIONS &options)
-{
-    // Each machine is one worker's.
-    SUITE suite = {.szDone = "", .work = [&](size_t test, size_t worker) {
-                       TALLY tally;
-                       const string szWrong =
-                           test % VerdictWorkers() == worker ? CaseRun(options.seed + test) : "";
-                       if (!szWrong.empty()) {
-                           tally.wrong.push_back(szWrong);
-                       }
-                       return tally;
-                   }};
-    for (u64 i = 0; i < options.machines; i++) {
-        suite.names.push_back(SEED_OF + to_string(options.seed + i));
-    }
-    SuiteRun(suite);
-}
-
-// One seed is one machine.
-bool FilterTake(OPTIONS &options, const string &szFilter)
-{
-    if (szFilter.empty()) {
-        return true;
-    }
-    options.machines = 1;
-    const size_t cbPrefix = szFilter.starts_with(SEED_OF) ? strlen(SEED_OF) : 0;
-    return NumberTake(szFilter.c_str() + cbPrefix, options.seed);
-}
-
 } // namespace
 
 int main(int argc, char *argv[])
 {
-    OPTIONS options;
-    string szFilter;
+    SEEDS seeds = {.machines = MACHINES};
     const char *const szSeed = getenv("ORACLE_SEED");
-    const bool fSeed = szSeed == nullptr || NumberTake(szSeed, options.seed);
-    if (!fSeed ||
-        !OptionsTake(
-            argc, argv,
-            {{"--machines", &options.machines}, {"--seed", &options.seed}, {"", &szFilter}}) ||
-        !FilterTake(options, szFilter)) {
+    const bool fSeed = szSeed == nullptr || NumberTake(szSeed, seeds.first);
+    if (!fSeed || !SeedsTake(argc, argv, seeds)) {
         return EXIT_FAILURE;
     }
-    MachinesTry(options);
+    SeedsRun(seeds, CaseRun);
     return EXIT_SUCCESS;
 }

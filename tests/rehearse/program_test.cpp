@@ -14,7 +14,7 @@ constexpr char EXAMINED[] = "/sbin/mdadm -E /dev/sda1";
 MACHINE MachineWithTool(const std::string &szScript)
 {
     MACHINE machine = MachineMake();
-    MachineFile(machine, "/usr.rehearse/own", "#!/bin/sh\n" + szScript, 0755);
+    RehearsalToolAdd(machine, szScript);
     MachineTool(machine, EXAMINED, {.szOut = "a report\n", .status = 3, .nTimes = ANY_TIMES});
     return machine;
 }
@@ -22,7 +22,7 @@ MACHINE MachineWithTool(const std::string &szScript)
 RUN_RESULT Rehearsed(const std::string &szScript, const std::vector<std::string> &options)
 {
     std::vector<std::string> words = options;
-    words.insert(words.end(), {"--tool", "/usr.rehearse/own", "any", "word"});
+    words.insert(words.end(), {"--tool", REHEARSAL_OWN_TOOL, "any", "word"});
     return RehearsalTry(MachineWithTool(szScript), words);
 }
 
@@ -110,7 +110,7 @@ TEST(Rehearsal, KeepsMarkersAndLeavesNone)
                                       "echo new > /tmp/.dualhead; echo log > /var/log/any\n");
     MachineFile(machine, "/tmp/raid.1", "", 0755);
     MachineFile(machine, "/tmp/other", "");
-    const RUN_RESULT result = RehearsalTry(machine, {"--tool", "/usr.rehearse/own", "any"});
+    const RUN_RESULT result = RehearsalTry(machine, {"--tool", REHEARSAL_OWN_TOOL, "any"});
     EXPECT_EQ(result.status, 3); // a marker is set
     EXPECT_NE(result.szOut.find("What it prints:\n  /tmp/raid.1\n  same\n"), std::string::npos);
     EXPECT_FALSE(MachineFileRead("/tmp/.dualhead").has_value());
@@ -134,6 +134,25 @@ TEST(Rehearsal, EndsWhatTheToolLeaves)
     EXPECT_EQ(result.status, 0);
     EXPECT_EQ(result.nUnreaped, 0);
     EXPECT_EQ(result.nRunning, 0);
+}
+
+// A status that a shell gives when it finds no program is the tool's own here.
+TEST(Rehearsal, TellsAnyStatus)
+{
+    const RUN_RESULT result = Rehearsed("exit 127\n", {});
+    EXPECT_EQ(result.status, 0);
+    EXPECT_NE(result.szOut.find("Its exit status: 127\n"), std::string::npos);
+}
+
+TEST(Rehearsal, TellsOfAToolThatDoesNotStart)
+{
+    MACHINE machine = MachineMake();
+    MachineFile(machine, REHEARSAL_OWN_TOOL, "#!/no/shell\n", 0755);
+    const RUN_RESULT result = RehearsalTry(machine, {"--tool", REHEARSAL_OWN_TOOL, "any"});
+    EXPECT_EQ(result.status, 2);
+    EXPECT_EQ(result.szOut, "");
+    EXPECT_EQ(result.szErr, "arrayctl-rehearse: the tool could not be started: No such file or "
+                            "directory\n");
 }
 
 TEST(Rehearsal, TellsOfASignal)
@@ -186,7 +205,7 @@ TEST(Rehearsal, NeedsATmp)
 {
     MACHINE machine = MachineWithTool("exit 0\n");
     MachineRemove(machine, "/tmp");
-    const RUN_RESULT result = RehearsalTry(machine, {"--tool", "/usr.rehearse/own", "any"});
+    const RUN_RESULT result = RehearsalTry(machine, {"--tool", REHEARSAL_OWN_TOOL, "any"});
     EXPECT_EQ(result.status, 2);
     EXPECT_EQ(result.szErr, "arrayctl-rehearse: cannot open /tmp: No such file or directory\n");
 }

@@ -9,11 +9,9 @@
 #include "oracle_layout.h"
 #include "rehearsal.h"
 #include "suite.h"
-#include "verdict.h"
 
 #include <algorithm>
 #include <cstdlib>
-#include <cstring>
 
 namespace
 {
@@ -23,12 +21,7 @@ using std::to_string;
 using std::vector;
 using u64 = std::uint64_t;
 
-constexpr char SEED_OF[] = "seed ";
-
-struct OPTIONS {
-    u64 machines = 2000;
-    u64 seed = 1;
-};
+constexpr u64 MACHINES = 2000;
 
 bool IsQuestion(const vector<string> &argv)
 {
@@ -133,46 +126,14 @@ string CaseRun(u64 seed)
            "the tool ran\n" + StrandsText(done);
 }
 
-void MachinesTry(const OPTIONS &options)
-{
-    SUITE suite = {.szDone = "", .work = [&](size_t test, size_t worker) {
-                       TALLY tally;
-                       const string szWrong =
-                           test % VerdictWorkers() == worker ? CaseRun(options.seed + test) : "";
-                       if (!szWrong.empty()) {
-                           tally.wrong.push_back(szWrong);
-                       }
-                       return tally;
-                   }};
-    for (u64 i = 0; i < options.machines; i++) {
-        suite.names.push_back(SEED_OF + to_string(options.seed + i));
-    }
-    (void)SuiteRun(suite);
-}
-
-// One seed is one machine.
-bool FilterTake(OPTIONS &options, const string &szFilter)
-{
-    if (szFilter.empty()) {
-        return true;
-    }
-    options.machines = 1;
-    const size_t cbPrefix = szFilter.starts_with(SEED_OF) ? strlen(SEED_OF) : 0;
-    return NumberTake(szFilter.c_str() + cbPrefix, options.seed);
-}
-
 } // namespace
 
 int main(int argc, char *argv[])
 {
-    OPTIONS options;
-    string szFilter;
-    if (!OptionsTake(
-            argc, argv,
-            {{"--machines", &options.machines}, {"--seed", &options.seed}, {"", &szFilter}}) ||
-        !FilterTake(options, szFilter)) {
+    SEEDS seeds = {.machines = MACHINES};
+    if (!SeedsTake(argc, argv, seeds)) {
         return EXIT_FAILURE;
     }
-    MachinesTry(options);
+    SeedsRun(seeds, CaseRun);
     return EXIT_SUCCESS;
 }

@@ -162,6 +162,9 @@ std::vector<std::string> EnvironmentOf(const MACHINE &machine)
     }
     const std::vector<char *> words = Pointers(argv);
     const std::vector<char *> variables = Pointers(environment);
+    if (machine.prepare) {
+        machine.prepare();
+    }
     (void)execve(words[0], words.data(), variables.data());
     _exit(STATUS_NOT_STARTED);
 }
@@ -382,6 +385,16 @@ RUN_RESULT ProgramWatch(const MACHINE &machine, const std::vector<std::string> &
         machine, [&](const RUN_STREAMS &) { ProgramBecome(machine, arguments); }, szFailures);
 }
 
+RUN_RESULT OtherWatch(const MACHINE &machine, const std::vector<std::string> &arguments,
+                      void (*pLayOut)(const MACHINE &))
+{
+    PrivateRootEnter();
+    pLayOut(machine);
+    std::string szFailures;
+    return Watch(
+        machine, [&](const RUN_STREAMS &) { OtherBecome(machine, arguments); }, szFailures);
+}
+
 RUN_RESULT ProblemsFail(RUN_RESULT result)
 {
     for (const std::string &szProblem : result.problems) {
@@ -489,11 +502,12 @@ RUN_RESULT MachineTry(const MACHINE &machine, const std::vector<std::string> &ar
 
 RUN_RESULT MachineTryOther(const MACHINE &machine, const std::vector<std::string> &arguments)
 {
-    PrivateRootEnter();
-    PrivateRootLayOut(machine);
-    std::string szFailures;
-    return Watch(
-        machine, [&](const RUN_STREAMS &) { OtherBecome(machine, arguments); }, szFailures);
+    return OtherWatch(machine, arguments, PrivateRootLayOut);
+}
+
+RUN_RESULT MachineTryOtherAgain(const MACHINE &machine, const std::vector<std::string> &arguments)
+{
+    return OtherWatch(machine, arguments, PrivateRootAnswersWrite);
 }
 
 RUN_RESULT MachineTryAgain(const MACHINE &machine, const std::vector<std::string> &arguments)

@@ -22,6 +22,7 @@ constexpr size_t WRONG_SIZE = 32768;
 constexpr size_t REPORT_SIZE = 65536;
 
 constexpr char MINIMUM_OF[] = "minimum of ";
+constexpr char SEED_OF[] = "seed ";
 
 using std::string;
 using std::to_string;
@@ -230,4 +231,37 @@ void SuiteRun(const SUITE &suite)
         }
     }
     TotalsTell(suite, totals);
+}
+
+bool SeedsTake(int argc, char *argv[], SEEDS &seeds)
+{
+    string szFilter;
+    if (!OptionsTake(
+            argc, argv,
+            {{"--machines", &seeds.machines}, {"--seed", &seeds.first}, {"", &szFilter}})) {
+        return false;
+    }
+    if (szFilter.empty()) {
+        return true;
+    }
+    seeds.machines = 1;
+    const size_t cbPrefix = szFilter.starts_with(SEED_OF) ? strlen(SEED_OF) : 0;
+    return NumberTake(szFilter.c_str() + cbPrefix, seeds.first);
+}
+
+void SeedsRun(const SEEDS &seeds, const std::function<std::string(std::uint64_t seed)> &wrongOf)
+{
+    SUITE suite = {.szDone = "", .work = [&](size_t test, size_t worker) {
+                       TALLY tally;
+                       const string szWrong =
+                           test % VerdictWorkers() == worker ? wrongOf(seeds.first + test) : "";
+                       if (!szWrong.empty()) {
+                           tally.wrong.push_back(szWrong);
+                       }
+                       return tally;
+                   }};
+    for (std::uint64_t i = 0; i < seeds.machines; i++) {
+        suite.names.push_back(SEED_OF + to_string(seeds.first + i));
+    }
+    SuiteRun(suite);
 }

@@ -25,6 +25,19 @@ bool OptionsTake(int argc, char *argv[], const std::vector<OPTION> &options);
 // A number of 1 or more, and nothing behind it.
 bool NumberTake(const char *szText, std::uint64_t &number);
 
+// Random machines, each made from a seed of its own, so that one that fails comes back with it.
+struct SEEDS {
+    std::uint64_t machines;
+    std::uint64_t first = 1;
+};
+
+// Takes the options --machines, --seed and a filter: one seed, which is one machine.
+bool SeedsTake(int argc, char *argv[], SEEDS &seeds);
+
+// Runs a suite in which each machine is one worker's test. The function says what is wrong with the
+// machine of a seed; nothing is when that is empty.
+void SeedsRun(const SEEDS &seeds, const std::function<std::string(std::uint64_t seed)> &wrongOf);
+
 // What one worker finds out about its share of a test.
 struct TALLY {
     std::uint64_t done = 0; // injections, kills, machines
