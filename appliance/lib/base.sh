@@ -35,13 +35,23 @@ GUEST_TOOLS=(
 # The cases of the suites want these too; without them the demo still runs.
 CASE_TOOLS=(sfdisk:/usr/sbin/sfdisk.stock strace:/usr/bin/strace)
 
+# With udev, as on every stock machine: Debian's own rules for what this machine has.
+UDEV_TOOLS=(udevadm:/usr/bin/udevadm udevadm:/usr/lib/systemd/systemd-udevd scsi_id:/usr/lib/udev/scsi_id)
+UDEV_RULES=(
+    01-md-raid-creating 50-udev-default 55-dm 56-lvm 60-block 60-persistent-storage
+    60-persistent-storage-dm 63-md-raid-arrays 64-md-raid-assembly 69-lvm 95-dm-notify
+)
+
 LVM_COMMANDS=(
     pvs pvcreate pvremove pvscan pvck vgs vgcreate vgremove vgchange vgscan vgextend
     lvs lvcreate lvremove lvchange lvscan
 )
 
-PROGRAM_FOLDERS=(usr/sbin usr/bin sbin bin)
-LIBRARY_FOLDERS=(usr/lib/x86_64-linux-gnu lib/x86_64-linux-gnu usr/lib64 lib64 usr/lib lib)
+PROGRAM_FOLDERS=(usr/sbin usr/bin sbin bin usr/lib/udev lib/udev)
+RULE_FOLDERS=(usr/lib/udev/rules.d lib/udev/rules.d)
+LIBRARY_FOLDERS=(
+    usr/lib/x86_64-linux-gnu lib/x86_64-linux-gnu usr/lib/x86_64-linux-gnu/systemd usr/lib64 lib64 usr/lib lib
+)
 
 GUEST_FOLDERS=(
     usr/bin usr/sbin usr/lib usr/lib64 dev proc sys etc/lvm etc/mdadm etc.defaults run/lock
@@ -51,7 +61,7 @@ GUEST_FOLDERS=(
 # Changes whenever something in the base would: a package, a program's version, the scripts.
 base_key() {
     local -a packages
-    mapfile -t packages < <(packages_of inside "$szRelease" appliance)
+    mapfile -t packages < <(packages_of inside "$szRelease" appliance udev)
     {
         ls "$1"
         ! is_own_release || dpkg-query -W -f '${Package} ${Version}\n' "${packages[@]}" libc6 2>/dev/null
@@ -127,6 +137,20 @@ base_programs() {
     done < <("$szCommand" --list-full | grep -v '^linuxrc$')
 }
 
+base_udev() {
+    local szUnpacked=$1 szRoot=$2 szPair szRule szFile
+    for szPair in "${UDEV_TOOLS[@]}"; do
+        szFile=$(inside_find "$szUnpacked" "${szPair%%:*}" "${PROGRAM_FOLDERS[@]}") ||
+            { complain "no ${szPair%%:*} for the inside"; return 1; }
+        inside_install "$szUnpacked" "$szFile" "${szPair#*:}" "$szRoot" || return
+    done
+    for szRule in "${UDEV_RULES[@]}"; do
+        szFile=$(inside_find "$szUnpacked" "$szRule.rules" "${RULE_FOLDERS[@]}") ||
+            { complain "no rules $szRule for the inside"; return 1; }
+        install -D -m 644 "$szFile" "$szRoot/usr/lib/udev/rules.d/$szRule.rules" || return
+    done
+}
+
 base_root() {
     local szRoot=$1 szFolder
     for szFolder in "${GUEST_FOLDERS[@]}"; do
@@ -148,6 +172,7 @@ base_make() { # FETCHED WORK
     base_root "$szWork/root" &&
         base_modules "$szWork/unpacked" "$szWork/root" &&
         base_programs "$szWork/unpacked" "$szWork/root" &&
+        { [ "$fUdev" = no ] || base_udev "$szWork/unpacked" "$szWork/root"; } &&
         pack "$szWork/root" "$szWork/out/base.cpio" &&
         cp "$szWork"/unpacked/boot/vmlinuz-* "$szWork/out/vmlinuz" &&
         (cd "$szWork/root" && find usr/lib usr/lib64 -name '*.so*') >"$szWork/out/libraries"
@@ -158,8 +183,8 @@ base_build() { # FETCHED BASE
     local szWork
     note "making the base of the appliance from $(basename "$1"/linux-image-[0-9]*.deb) (once)"
     szWork=$(mktemp -d "$CACHE_DIR/work.XXXXXX")
-    if base_make "$1" "$szWork" 2>"$szWork/log" && ARRAYCTL_BASE=$szWork/out ARRAYCTL_RELEASE=$szRelease \
-        "$APPLIANCE_DIR/run" --quiet --build none --disks 1 "$APPLIANCE_DIR/guest/trial" >>"$szWork/log" 2>&1; then
+    if base_make "$1" "$szWork" 2>"$szWork/log" &&
+        ARRAYCTL_BASE=$szWork/out ARRAYCTL_RELEASE=$szRelease ARRAYCTL_UDEV=$fUdev "$APPLIANCE_DIR/run" --quiet --build none --disks 1 "$APPLIANCE_DIR/guest/trial" >>"$szWork/log" 2>&1; then
         mv "$szWork/out" "$2"
         rm -rf "$szWork"
         return
@@ -173,13 +198,14 @@ base_build() { # FETCHED BASE
 # Prints the folder that holds vmlinuz and base.cpio, made first when it is not there. Runs may
 # start at the same time: one of them makes it, the others wait.
 base_ready() {
-    local szFetched szBase
+    local szFetched szBase szKind=$szRelease
+    [ "$fUdev" = no ] || szKind+=-udev
     [ -z "${ARRAYCTL_BASE:-}" ] || { printf '%s\n' "$ARRAYCTL_BASE"; return; }
     mkdir -p "$CACHE_DIR"
     exec 9>"$CACHE_DIR/lock-$szRelease"
     flock 9
     szFetched=$(fetch_packages) || exit
-    szBase=$CACHE_DIR/base-$szRelease-$(base_key "$szFetched")
+    szBase=$CACHE_DIR/base-$szKind-$(base_key "$szFetched")
     [ -e "$szBase/vmlinuz" ] || base_build "$szFetched" "$szBase"
     exec 9>&-
     printf '%s\n' "$szBase"

@@ -12,6 +12,7 @@ DEBIAN_MIRROR=http://deb.debian.org
 # Oldest first.
 DEBIAN_RELEASES=(bookworm trixie)
 szRelease=${ARRAYCTL_RELEASE:-$(system_codename)}
+fUdev=${ARRAYCTL_UDEV:-no}
 
 # The programs of this machine are as good as fetched ones when they are of the same release.
 is_own_release() {
@@ -52,10 +53,12 @@ apt_lists() {
 
 # Of what the table has for the inside: what this machine lacks.
 fetch_wanted() {
-    local szPackage szWho=demo
+    local szPackage
+    local -a who=(demo)
     # What only cases of tests need is installed for them.
-    is_own_release || szWho=appliance
-    for szPackage in $(packages_of inside "$szRelease" "$szWho"); do
+    is_own_release || who=(appliance)
+    [ "$fUdev" = no ] || who+=(udev)
+    for szPackage in $(packages_of inside "$szRelease" "${who[@]}"); do
         is_here "$szPackage" || printf '%s\n' "$szPackage"
     done
 }
@@ -84,14 +87,19 @@ fetch_closure() { # PACKAGE...
 # As apt-get tells them; nothing when everything is there.
 fetch_uris() {
     local -a wanted
-    mapfile -t wanted < <(fetch_wanted)
     ! fetch_is_done || return 0
+    mapfile -t wanted < <(fetch_all)
     # shellcheck disable=SC2046  # a list
     apt_inside apt-get download --print-uris $(fetch_closure "${wanted[@]}")
 }
 
+# What is wanted, and what was wanted before, which the next machine may want again.
+fetch_all() {
+    { fetch_wanted && cat "$CACHE_DIR/$szRelease/fetched" 2>/dev/null; } | sort -u
+}
+
 fetch_is_done() {
-    [ "$(fetch_wanted)" = "$(cat "$CACHE_DIR/$szRelease/fetched" 2>/dev/null)" ]
+    [ "$(fetch_all)" = "$(cat "$CACHE_DIR/$szRelease/fetched" 2>/dev/null)" ]
 }
 
 # Prints the folder with the packages, fetched when they are not there.
@@ -106,7 +114,7 @@ fetch_packages() {
         # shellcheck disable=SC2046  # a list
         (cd "$szFolder" && apt_inside apt-get download $(awk '{ sub(/_.*/, "", $2); print $2 }' <<<"$szUris")) \
             >"$szFolder/log" 2>&1 || die "not fetched: $(tail -n 1 "$szFolder/log")"
-        fetch_wanted >"$szFolder/fetched"
+        fetch_all >"$szFolder/fetched.new" && mv "$szFolder/fetched.new" "$szFolder/fetched"
     fi
     printf '%s\n' "$szFolder"
 }

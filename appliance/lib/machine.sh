@@ -32,6 +32,7 @@ machine_options() {
             shift 2
             ;;
         --quiet) fQuiet=yes && shift ;;
+        --udev) fUdev=yes && shift ;;
         --help) usage && exit 0 ;;
         --) shift && break ;;
         -*) die "unknown option $1; see --help" ;;
@@ -90,7 +91,7 @@ machine_overlay() {
     install -D "$APPLIANCE_DIR/guest/arrayctl" "$szRoot/usr/bin/arrayctl"
     install -D "$APPLIANCE_DIR/guest/arrayctl-rehearse" "$szRoot/usr/bin/arrayctl-rehearse"
     install -D -m 644 "$APPLIANCE_DIR/guest/nuroinfo.conf" "$szRoot/etc.defaults/nuroinfo.conf"
-    install -D -m 644 "$APPLIANCE_DIR/guest/lvm.conf" "$szRoot/etc/lvm/lvm.conf"
+    [ "$fUdev" = yes ] || install -D -m 644 "$APPLIANCE_DIR/guest/lvm.conf" "$szRoot/etc/lvm/lvm.conf"
     install -D -m 644 "$APPLIANCE_DIR/guest/welcome" "$szRoot/appliance/welcome"
     overlay_build "$szRoot" tool/arrayctl /usr/sbin/arrayctl
     overlay_build "$szRoot" platform/mdrequests/mdrequests /usr/sbin/mdrequests

@@ -90,6 +90,11 @@ comes() {
     done
 }
 
+# Until udev, where there is one, has done what it does about what happened.
+rest() {
+    [ ! -e /run/udev/control ] || must udevadm settle
+}
+
 # await CONDITION...: what follows needs it.
 await() {
     comes "$@" || abort "it does not come to this: $*"
