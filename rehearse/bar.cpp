@@ -1,7 +1,13 @@
 // SPDX-License-Identifier: MIT
 #include "bar.h"
 
+#include "inventory.h"
+#include "outcome.h"
+
 #include <algorithm>
+#include <cstddef>
+#include <cstdint>
+#include <string>
 
 namespace
 {

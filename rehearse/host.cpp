@@ -1,13 +1,17 @@
 // SPDX-License-Identifier: MIT
 #include "host.h"
 
+#include "options.h"
 #include "owner.h"
+#include "text.h"
 
 #include <array>
 #include <climits>
 #include <cstdlib>
+#include <string>
 #include <sys/stat.h>
 #include <sys/sysmacros.h>
+#include <vector>
 
 namespace
 {

@@ -1,14 +1,22 @@
 // SPDX-License-Identifier: MIT
 #include "inventory.h"
 
+#include "host.h"
 #include "run.h"
+#include "text.h"
 
 #include <algorithm>
 #include <blkid/blkid.h>
 #include <cctype>
+#include <cstddef>
+#include <cstdint>
+#include <iterator>
 #include <memory>
+#include <string>
 #include <sys/stat.h>
 #include <sys/sysmacros.h>
+#include <type_traits>
+#include <vector>
 
 namespace
 {

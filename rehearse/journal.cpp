@@ -3,8 +3,11 @@
 
 #include "owner.h"
 #include "places.h"
+#include "text.h"
 
 #include <cstring>
+#include <string>
+#include <string_view>
 #include <sys/socket.h>
 #include <sys/un.h>
 

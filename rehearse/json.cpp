@@ -2,9 +2,17 @@
 #include "json.h"
 
 #include "bar.h"
+#include "inventory.h"
+#include "outcome.h"
+#include "run.h"
+#include "text.h"
+#include "warnings.h"
 
+#include <cstdint>
 #include <cstdio>
+#include <string>
 #include <sys/wait.h>
+#include <vector>
 
 namespace
 {

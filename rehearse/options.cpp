@@ -1,11 +1,12 @@
 // SPDX-License-Identifier: MIT
 #include "options.h"
 
-#include "places.h"
+#include "text.h"
 
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <string>
 #include <sys/stat.h>
 #include <unistd.h>
 

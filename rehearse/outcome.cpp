@@ -1,8 +1,16 @@
 // SPDX-License-Identifier: MIT
 #include "outcome.h"
 
+#include "inventory.h"
+#include "run.h"
+#include "text.h"
+
 #include <algorithm>
 #include <climits>
+#include <cstddef>
+#include <cstdint>
+#include <iterator>
+#include <string>
 
 namespace
 {

@@ -2,14 +2,24 @@
 #include "print.h"
 
 #include "bar.h"
+#include "host.h"
+#include "inventory.h"
 #include "json.h"
+#include "options.h"
+#include "outcome.h"
 #include "places.h"
+#include "run.h"
+#include "text.h"
+#include "warnings.h"
 
 #include <algorithm>
+#include <cstdint>
 #include <cstdio>
+#include <string>
 #include <sys/wait.h>
 #include <syslog.h>
 #include <unistd.h>
+#include <vector>
 
 namespace
 {

@@ -3,10 +3,13 @@
 
 #include "journal.h"
 #include "places.h"
+#include "text.h"
 
 #include <algorithm>
 #include <csignal>
 #include <cstring>
+#include <iterator>
+#include <string>
 #include <sys/auxv.h>
 #include <sys/wait.h>
 #include <unistd.h>

@@ -9,6 +9,7 @@
 // This process watches; the rehearsal is its child, the first process of a process namespace in a
 // mount namespace of its own. When either ends, however it ends, the kernel ends all that ran
 // there, and the namespace takes along what was written in it.
+#include "host.h"
 #include "options.h"
 #include "owner.h"
 #include "places.h"
@@ -16,6 +17,7 @@
 #include "recorder.h"
 #include "run.h"
 #include "stage.h"
+#include "text.h"
 
 #include <cerrno>
 #include <csignal>
@@ -69,7 +71,7 @@ int Rehearse(const OPTIONS &options, const HOST &host)
     if (!StageSetUp(options.szToolPath.c_str(), journal.fd, syslog.fd)) {
         return STATUS_NOT_REHEARSED;
     }
-    if (listen(journal.fd, SOMAXCONN) != 0) {
+    if (journal.fd < 0 || listen(journal.fd, SOMAXCONN) != 0) {
         (void)ComplainErrno("cannot listen to the recorder");
         return STATUS_NOT_REHEARSED;
     }

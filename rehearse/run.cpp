@@ -4,17 +4,23 @@
 #include "journal.h"
 #include "owner.h"
 #include "places.h"
+#include "text.h"
 
 #include <algorithm>
 #include <array>
 #include <cerrno>
 #include <csignal>
+#include <cstddef>
 #include <fcntl.h>
 #include <list>
 #include <poll.h>
+#include <string>
+#include <string_view>
 #include <sys/signalfd.h>
 #include <sys/socket.h>
 #include <sys/wait.h>
+#include <utility>
+#include <vector>
 
 namespace
 {
@@ -170,6 +176,9 @@ std::vector<char *> Pointers(const WORDS &words)
 {
     sigset_t none = {};
     const int fdNull = open("/dev/null", O_RDWR | O_CLOEXEC);
+    if (fdNull < 0) {
+        _exit(STATUS_NOT_STARTED);
+    }
     (void)dup2(fdNull, STDIN_FILENO);
     (void)dup2(fdOut, STDOUT_FILENO);
     (void)dup2(fdErr < 0 ? fdNull : fdErr, STDERR_FILENO);

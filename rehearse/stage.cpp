@@ -14,6 +14,7 @@
 #include <linux/capability.h>
 #include <linux/landlock.h>
 #include <linux/magic.h>
+#include <string>
 #include <sys/auxv.h>
 #include <sys/mount.h>
 #include <sys/prctl.h>
@@ -166,6 +167,9 @@ bool TmpPrivate()
         return false;
     }
     const DESCRIPTOR made(open(TMP_FOLDER, O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    if (made.fd < 0) {
+        return ComplainErrno("cannot open %s", TMP_FOLDER);
+    }
     for (const char *const szMarker : MARKERS) {
         if (!MarkerCopy(old.fd, made.fd, szMarker)) {
             return false;

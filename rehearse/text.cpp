@@ -7,9 +7,14 @@
 #include <algorithm>
 #include <cerrno>
 #include <cstdarg>
+#include <cstdint>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <iterator>
+#include <optional>
+#include <string>
+#include <string_view>
 
 namespace
 {
@@ -76,8 +81,9 @@ std::optional<std::string> FileRead(const std::string &szPath)
     }
     std::string szText;
     char ach[MESSAGE_SIZE];
-    for (size_t cb = 0;
-         szText.size() < FILE_SIZE_MAX && (cb = fread(ach, 1, sizeof(ach), pFile.get())) > 0;) {
+    // Less than was asked for is the end, or a failure.
+    for (size_t cb = sizeof(ach); cb == sizeof(ach) && szText.size() < FILE_SIZE_MAX;) {
+        cb = fread(ach, 1, sizeof(ach), pFile.get());
         szText.append(ach, cb);
     }
     if (ferror(pFile.get()) != 0) {

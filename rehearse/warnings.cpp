@@ -1,8 +1,15 @@
 // SPDX-License-Identifier: MIT
 #include "warnings.h"
 
+#include "inventory.h"
+#include "outcome.h"
+#include "run.h"
+#include "text.h"
+
 #include <algorithm>
+#include <string>
 #include <sys/wait.h>
+#include <vector>
 
 namespace
 {

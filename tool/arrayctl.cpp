@@ -357,7 +357,7 @@ constexpr unsigned int ARRAY_PAUSE_SECONDS = 3;
 constexpr size_t MISSING_TEXT_SIZE = 256;
 constexpr size_t DUPLICATE_COMMAND_SIZE = 512;
 constexpr char DUPLICATE_COMMAND[] = "/bin/nurodd ";
-constexpr std::string_view SILENT = " > /dev/null 2>&1";
+constexpr char SILENT[] = " > /dev/null 2>&1";
 
 void DecideCollect(const NLIBSZLIST *pDisks, DISK_CHILD *pChildren)
 {
@@ -467,12 +467,12 @@ int MembersAppend(const MEMBER_LIST &members, char *szText, size_t cbText)
 void PartitionsDuplicate(const SYSTEM_MEMBERS &members)
 {
     char szCommand[DUPLICATE_COMMAND_SIZE] = "";
-    constexpr size_t CB_BEFORE_SILENT = sizeof(szCommand) - SILENT.size();
+    constexpr size_t CB_BEFORE_SILENT = sizeof(szCommand) - (sizeof(SILENT) - 1);
     (void)NLIBCStrAppend(szCommand, CB_BEFORE_SILENT, DUPLICATE_COMMAND);
     int nTaken = MembersAppend(members.system, szCommand, CB_BEFORE_SILENT);
     (void)NLIBCStrAppend(szCommand, CB_BEFORE_SILENT, " ");
     nTaken += MembersAppend(members.swap, szCommand, CB_BEFORE_SILENT);
-    (void)NLIBCStrAppend(szCommand, sizeof(szCommand), SILENT.data());
+    (void)NLIBCStrAppend(szCommand, sizeof(szCommand), SILENT);
     const int nPartition = members.system.nPartition + members.swap.nPartition;
     LeftOutTell(nPartition - nTaken, nPartition);
     const int result = system(szCommand);

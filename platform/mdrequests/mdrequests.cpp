@@ -105,7 +105,9 @@ bool PlaceLeave(int fdSocket)
     // If one of the three streams was closed, the socket may have its number.
     const int fdKept = fcntl(fdSocket, F_DUPFD, FD_SOCKET);
     const int fdNull = open("/dev/null", O_RDWR);
-
+    if (fdKept < 0 || fdNull < 0) {
+        return false;
+    }
     for (int fd = STDIN_FILENO; fd <= STDERR_FILENO; fd++) {
         if (dup2(fdNull, fd) != fd) {
             return false;

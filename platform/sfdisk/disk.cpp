@@ -67,10 +67,11 @@ int DiskOpen(const char *szPath, bool fWrite, DISK *pDisk)
     if (DiskKindCheck(status, pDisk) != 0) {
         return 1;
     }
-    pDisk->file.reset(DESCRIPTOR{open(szPath, (fWrite ? O_RDWR : O_RDONLY) | O_CLOEXEC)});
-    if (!pDisk->file) {
+    const int fdFile = open(szPath, (fWrite ? O_RDWR : O_RDONLY) | O_CLOEXEC);
+    if (fdFile < 0) {
         return Complain("cannot open %s: %s", szPath, strerror(errno));
     }
+    pDisk->file.reset(DESCRIPTOR{fdFile});
     return DiskLock(pDisk, fWrite ? LOCK_EX : LOCK_SH);
 }
 
@@ -80,9 +81,10 @@ int DiskClaim(DISK *pDisk)
         return 0;
     }
     // A partition that is open exclusively makes this fail, too.
-    pDisk->claim.reset(DESCRIPTOR{open(pDisk->szPath, O_RDONLY | O_EXCL | O_CLOEXEC)});
-    if (!pDisk->claim) {
+    const int fdClaim = open(pDisk->szPath, O_RDONLY | O_EXCL | O_CLOEXEC);
+    if (fdClaim < 0) {
         return Complain(errno == EBUSY ? "%s is in use" : "cannot claim %s", pDisk->szPath);
     }
+    pDisk->claim.reset(DESCRIPTOR{fdClaim});
     return 0;
 }

@@ -176,7 +176,7 @@ headers_stand_alone() {
     tac "$szUnits/all.cpp" >"$szUnits/reversed.cpp"
     # shellcheck disable=SC2016  # for the inner shell
     printf '%s\n' "$szUnits"/*.cpp | xargs -P 2 -I UNIT sh -ec '
-        for compiler in g++ clang++-14; do
+        for compiler in g++ clang++-19; do
             for standard in c++20 c++2b; do
                 $compiler -std=$standard -Wall -Wextra -Wpedantic -Werror -fsyntax-only -I "$0" UNIT
             done

@@ -24,10 +24,10 @@ std::string Said(const INVENTORY &inventory, const RUN &run, const WORDS &words 
     const OUTCOME outcome = OutcomeOf(inventory, run);
     std::string text;
     for (const WARNING &warning : WarningsFind({.options = options,
-                                  .host = host,
-                                  .run = run,
-                                  .inventory = inventory,
-                                  .outcome = outcome})) {
+                                                .host = host,
+                                                .run = run,
+                                                .inventory = inventory,
+                                                .outcome = outcome})) {
         text += std::string(warning.szKind) + ": " + warning.szText + '\n';
     }
     return text;

@@ -110,8 +110,7 @@ TEST(LVMGetLVPath, ARowMayFillTheWholeLine)
 
 TEST(LVMGetLVPath, IsCutToTheBuffer)
 {
-    Expect(
-        "8 bytes", [] { return PathGet("/dev/vg", 8); }, Pvs(ROW_MD2));
+    Expect("8 bytes", [] { return PathGet("/dev/vg", 8); }, Pvs(ROW_MD2));
 }
 
 TEST(LVMGetLVPath, BadArgumentsRunNothing)
@@ -153,8 +152,7 @@ TEST(LVMGetLVPath, ACommandThatCannotBeStartedIsTold)
     const STEPS steps = {{"fault pipe2 1"},
                          {"<11>lvm.cpp:# Fail to do [/sbin/pvs -o "
                           "pv_name,vg_name,lv_name,origin --noheading --separator :]"}};
-    Expect(
-        "no path", [] { return PathGet(NO_PATH); }, steps, machine, ERR_PIPE_FAILED, -1);
+    Expect("no path", [] { return PathGet(NO_PATH); }, steps, machine, ERR_PIPE_FAILED, -1);
     Expect("as if there was none", Remove, steps, machine, ERR_PIPE_FAILED);
 }
 

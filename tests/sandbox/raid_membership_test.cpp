@@ -98,10 +98,8 @@ TEST(RaidMembership, RefusesNull)
 {
     int nMd = UNTOUCHED;
     const STEPS told = {{"<11>raid_membership.cpp:# Bad parameters"}};
-    Expect(
-        "no device", [&] { return RAIDDiskSuperblockMdGet(nullptr, &nMd); }, -1, told);
-    Expect(
-        "no number", [] { return RAIDDiskSuperblockMdGet("/dev/sda3", nullptr); }, -1, told);
+    Expect("no device", [&] { return RAIDDiskSuperblockMdGet(nullptr, &nMd); }, -1, told);
+    Expect("no number", [] { return RAIDDiskSuperblockMdGet("/dev/sda3", nullptr); }, -1, told);
     const auto noDisk = [&nMd] {
         const int result = RAIDDiskIsUsedByRAID(nullptr, &nMd);
         EXPECT_EQ(nMd, UNTOUCHED);

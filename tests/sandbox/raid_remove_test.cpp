@@ -120,12 +120,9 @@ long long UuidFail()
 TEST(RAIDUUIDGet, IsThatOfTheMemberThatSortsLast)
 {
     const STEPS examined = {Examined("sdb3", UUID_MD2)};
-    Expect(
-        "whole", [] { return UuidGet(UUID_MD2); }, 1, examined);
-    Expect(
-        "cut to the buffer", [] { return UuidGet("5b1f", 5); }, 1, examined);
-    Expect(
-        "no room", [] { return UuidGet("", 1); }, 1, examined);
+    Expect("whole", [] { return UuidGet(UUID_MD2); }, 1, examined);
+    Expect("cut to the buffer", [] { return UuidGet("5b1f", 5); }, 1, examined);
+    Expect("no room", [] { return UuidGet("", 1); }, 1, examined);
 }
 
 TEST(RAIDUUIDGet, BadArgumentsSetACodeAndRunNothing)
@@ -206,8 +203,7 @@ TEST(RAIDUUIDHashForRemoveGet, ExaminesDataPartitionsOfSdDisksInByteOrder)
                       "uuid of " + szName);
         }
     };
-    Expect(
-        "seven disks", [&body] { return MapFill(body); }, 0, steps, machine);
+    Expect("seven disks", [&body] { return MapFill(body); }, 0, steps, machine);
 }
 
 TEST(RAIDUUIDHashForRemoveGet, LeavesOutWhatHasNoSuperblock)
@@ -398,8 +394,7 @@ void ExpectRemoval(const char *szName, const STEPS &steps, const std::string &sz
                    u32 code = OLD_CODE)
 {
     const RAID_INFO info = RecordOf("/dev/md2", szUuid);
-    Expect(
-        szName, [&info] { return RAIDRemoveByInfo(&info); }, result, steps, machine, code);
+    Expect(szName, [&info] { return RAIDRemoveByInfo(&info); }, result, steps, machine, code);
 }
 
 TEST(RAIDRemove, StopsThenCleans)

@@ -51,12 +51,14 @@ bool EndsInActive(const WORD &word)
     return std::string_view(word.pszText.get(), word.cch).ends_with(ACTIVE);
 }
 
-void CommentSkip(FILE *pFile)
+// What ended the comment: the line or the stream.
+int CommentSkip(FILE *pFile)
 {
     int ch = fgetc(pFile);
     while (ch != EOF && ch != '\n') {
         ch = fgetc(pFile);
     }
+    return ch;
 }
 
 // The md driver's reports may have "active(auto-read-only)", which is read as two words; the second
@@ -79,8 +81,10 @@ bool WordRead(FILE *pFile, WORD &word)
     int chQuote = 0;
     for (int ch = fgetc(pFile); ch != EOF; ch = fgetc(pFile)) {
         if (chQuote == 0 && ch == '#') {
-            CommentSkip(pFile);
-            ch = '\n';
+            ch = CommentSkip(pFile);
+        }
+        if (ch == EOF) {
+            break;
         }
         if (ch == '\n') {
             chQuote = 0; // an unmatched quote affects its own line only

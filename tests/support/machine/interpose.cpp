@@ -456,9 +456,9 @@ void InterposeDeactivate()
 
 // The labels are the names that the C library's callers link to; under them the declarations of
 // the headers cannot clash with these.
+#define VISIBLE __attribute__((visibility("default")))
 #define INTERPOSED(symbol, type, parameters)                                                       \
-    extern "C" __attribute__((visibility("default")))                                              \
-    type Wrap_##symbol parameters __asm__(#symbol);                                                \
+    extern "C" VISIBLE type Wrap_##symbol parameters __asm__(#symbol);                             \
     extern "C" type Wrap_##symbol parameters
 #define NEXT(symbol) Next<Wrap_##symbol>(#symbol)
 

@@ -101,9 +101,13 @@ inline int ModelInsert(SZLIST_MODEL &model, int index, const std::string &text)
 
 inline void ModelOrder(SZLIST_MODEL &model, int fMode)
 {
-    std::stable_sort(model.items.begin(), model.items.end(), [&](const auto &a, const auto &b) {
+    const auto less = [&](const auto &a, const auto &b) {
         return Difference(fMode, a.value_or(""), b.value_or("")) < 0;
-    });
+    };
+    // Each goes behind what it equals.
+    for (auto item = model.items.begin(); item != model.items.end(); ++item) {
+        std::rotate(std::upper_bound(model.items.begin(), item, *item, less), item, item + 1);
+    }
 }
 
 inline void ModelCompact(SZLIST_MODEL &model)
