@@ -69,7 +69,7 @@ fetch_closure() { # PACKAGE...
     apt_inside apt-cache depends --recurse --important "$@" | awk -v given="$*" '
         BEGIN { split(given, names, " "); for (n in names) { taken[names[n]] = 1 } }
         /^[^ ]/ { from = $1 }
-        /Depends: (lib|linux-image-[0-9])/ { edge[++edges] = from " " $NF }
+        /Depends: (z?lib|linux-image-[0-9])/ { edge[++edges] = from " " $NF }
         END {
             do {
                 grown = 0
