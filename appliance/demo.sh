@@ -55,7 +55,7 @@ dmsetup mknodes
 run mkfs.ext4 -q /dev/vg1/volume_1
 run pvs
 
-title "The array and what is on it, taken down so that they never come back:"
+title "The array and what is on it, taken down; no superblock of it is left:"
 run arrayctl destroy 2
 run arrayctl status 2
 run pvs

@@ -103,9 +103,49 @@ void CutOffFind(const SCENE &scene, SENTENCES &found)
                                 " has no partitions 1 and 2 and is taken for blank, but " +
                                 partition.device.szPath +
                                 " carries the superblock of an array: it looks like a run that was "
-                                "cut off, and running again loses the data");
+                                "cut off: recovery.md, row 1; running again loses the data");
             }
         }
+    }
+}
+
+const PARTITION *PartitionFind(const DISK &disk, int number)
+{
+    for (const PARTITION &partition : disk.partitions) {
+        if (partition.number == number) {
+            return &partition;
+        }
+    }
+    return nullptr;
+}
+
+// Another disk whose system partition is in the same place, and has a swap partition behind it.
+bool HasWholeTwin(const INVENTORY &inventory, const PARTITION &system)
+{
+    return std::any_of(inventory.disks.begin(), inventory.disks.end(), [&](const DISK &disk) {
+        const PARTITION *const pSystem = PartitionFind(disk, 1);
+        return pSystem != nullptr && PartitionFind(disk, LAST_SYSTEM_PARTITION) != nullptr &&
+               pSystem->start == system.start && pSystem->device.nSector == system.device.nSector;
+    });
+}
+
+// initsys leaves such a disk out and ends with 0.
+void HalfMadeFind(const SCENE &scene, SENTENCES &found)
+{
+    if (scene.options.words.empty() || scene.options.words[0].rfind("initsys", 0) != 0) {
+        return;
+    }
+    for (const DISK_OUTCOME &outcome : scene.outcome.disks) {
+        const PARTITION *const pSystem = PartitionFind(*outcome.pDisk, 1);
+        if (!outcome.fAsked || pSystem == nullptr ||
+            PartitionFind(*outcome.pDisk, LAST_SYSTEM_PARTITION) != nullptr ||
+            !HasWholeTwin(scene.inventory, *pSystem)) {
+            continue;
+        }
+        const bool fData = outcome.pDisk->partitions.size() > 1;
+        found.push_back(Format("%s has partition 1 without 2 and is left out: it looks like a run "
+                               "that was cut off: recovery.md, row %d",
+                               outcome.pDisk->device.szPath.c_str(), fData ? 4 : 6));
     }
 }
 
@@ -341,7 +381,8 @@ void IncompleteFind(const SCENE &scene, SENTENCES &found)
         }
         if (!array.fRunning) {
             found.push_back("the array " + szName + " is not assembled, so it is not found; its " +
-                            "superblocks stay on " + Join(array.members, ", "));
+                            "superblocks stay on " + Join(array.members, ", ") +
+                            ": recovery.md, rows 11 to 13");
         } else if (array.nMissing > 0) {
             found.push_back(Format("the array %s lacks %llu of its members: their superblocks stay",
                                    szName.c_str(),
@@ -407,6 +448,7 @@ struct WARNING_ROW {
 constexpr WARNING_ROW WARNING_ROWS[] = {
     {"in-use", InUseFind},
     {"cut-off", CutOffFind},
+    {"cut-off", HalfMadeFind},
     {"wrong-row", WrongRowFind},
     {"wide-group", WideGroupFind},
     {"unread-report", UnreadReportFind},

@@ -74,4 +74,5 @@ def main():
         sys.stdout.write(draw(list(layouts(source.read()))))
 
 
-main()
+if __name__ == "__main__":
+    main()

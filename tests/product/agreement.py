@@ -14,7 +14,9 @@ import sys
 import tempfile
 
 sys.path.insert(0, os.path.join(os.path.dirname(__file__), "../support/verdict"))
+sys.path.insert(0, os.path.join(os.path.dirname(__file__), "../../docs/pictures"))
 import calls  # noqa: E402
+import layouts  # noqa: E402
 import verdict  # noqa: E402
 from verdict import ROOT, read  # noqa: E402
 
@@ -198,6 +200,64 @@ def case_the_log_page_tells_which_lines_no_command_can_write():
     told = re.search(r"### Never by a command\n(.*?)\n## ", read("docs/log.md"), re.S).group(1)
     told = re.sub(r"\[.*?\]\(.*?\)", "", told).replace("\n", " ")
     verdict.same(re.findall(r"`([^`]+)`", told), by_others - by_commands, "log.md")
+
+
+def case_the_layouts_page_has_the_numbers_of_the_code():
+    types = {name: f"{int(value, 16):x}" for name, value in re.findall(
+        r"(TYPE_\w+) = (0x\w+);", read("libnurostoragecore/lib/partition/partition_type.h"))}
+    expected = set()
+    for version, machine, places in layouts.layouts(read(layouts.TABLE)):
+        raid = machine == "RAID"
+        linux = types["TYPE_RAID" if raid else "TYPE_LINUX"]
+        swap = types["TYPE_RAID" if raid else "TYPE_SWAP"]
+        # Behind the third fixed place there is a gap of the same length.
+        _, start, size = places[-1]
+        cells = [version, machine, *places[0][1:], linux, *places[1][1:], swap, start + (size or 0), linux]
+        expected.add("| " + " | ".join(str(cell) for cell in cells) + " |")
+    told = re.search(r"## The numbers\n.*?\n\|---.*?\n(.*?)\n\n", read("docs/layouts.md"), re.S).group(1)
+    verdict.same(told.split("\n"), expected, "docs/layouts.md")
+    assert len(expected) == 14, expected
+
+
+def rows_of_recovery():
+    """{number: its title and text} of the page."""
+    parts = re.split(r"^### Row (\d+): ", read("docs/recovery.md"), flags=re.M)
+    return dict(zip(map(int, parts[1::2]), parts[2::2]))
+
+
+def verdicts_of_recovery():
+    """(what led to the verdict, its row or None, the line) of all cases that cut the tool off."""
+    for path in sorted(glob.glob("tests/appliance/cases/recovery*.sh", root_dir=ROOT)):
+        begin, text = 0, read(path)
+        for found in re.finditer(r"^ *verdict ['\"](?:row (\d+): )?.*$", text, re.M):
+            row = found.group(1)
+            yield text[begin:found.start()], int(row) if row else None, f"{path}: {found.group(0)}"
+            begin = found.end()
+
+
+def case_every_row_of_recovery_is_tested():
+    rows = rows_of_recovery()
+    assert sorted(rows) == list(range(1, len(rows) + 1)), sorted(rows)
+    verdict.same((row for _, row, _ in verdicts_of_recovery() if row), rows, "docs/recovery.md")
+    for row, text in rows.items():
+        title = text.split("\n", 1)[0]
+        anchor = re.sub(r"[^\w -]", "", f"row {row} {title}").lower().replace(" ", "-")
+        assert f"(#{anchor})" in read("docs/recovery.md"), f"no link leads to {anchor}"
+
+
+def case_what_the_tests_of_recovery_type_is_the_page():
+    typed = set()
+    for body, row, line in verdicts_of_recovery():
+        ways = {(int(number), kind) for number, kind in re.findall(r"^ *way_back (\d+) ?(\w*)", body, re.M)}
+        assert all(number == row for number, _ in ways), f"{line} types another row's block"
+        assert row is None or ways or "```sh" not in rows_of_recovery()[row], f"{line} types nothing"
+        typed |= ways
+    told = {(row, kind) for row, text in rows_of_recovery().items()
+            for kind in re.findall(r"^```sh ?(\w*)$", text.split("\n## ")[0], re.M)}
+    verdict.same(typed, told, "blocks of docs/recovery.md")
+    shown = {row for row, text in rows_of_recovery().items() if "```text\n" in text}
+    seen = {row for body, row, _ in verdicts_of_recovery() if re.search(rf"looks_like {row}\b", body)}
+    verdict.same(seen & shown, shown, "what one sees")
 
 
 verdict.cases(globals(), "".join(sys.argv[2:3]))

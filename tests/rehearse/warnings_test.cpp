@@ -89,8 +89,28 @@ TEST(Warnings, CutOff)
     disk.partitions.erase(disk.partitions.begin(), disk.partitions.begin() + 2);
     EXPECT_EQ(Said(WithDisk(disk), RunOf(WIPE)),
               "cut-off: /dev/sda has no partitions 1 and 2 and is taken for blank, but /dev/sda3 "
-              "carries the superblock of an array: it looks like a run that was cut off, and "
-              "running again loses the data\n");
+              "carries the superblock of an array: it looks like a run that was cut off: "
+              "recovery.md, row 1; running again loses the data\n");
+}
+
+TEST(Warnings, CutOffBetweenItsPartitions)
+{
+    DISK half = DataDisk("sdb");
+    half.partitions.erase(half.partitions.begin() + 1);
+    INVENTORY inventory = WithDisk(DataDisk("sda"));
+    inventory.disks.push_back(half);
+    const RUN run = RunOf({"/sbin/sfdisk -l -uS -N2 /dev/sda", "/sbin/sfdisk -l -uS -N2 /dev/sdb"});
+    EXPECT_EQ(Said(inventory, run, {"initsys"}),
+              "cut-off: /dev/sdb has partition 1 without 2 and is left out: it looks like a run "
+              "that was cut off: recovery.md, row 4\n");
+    EXPECT_EQ(Said(inventory, run, {"newvol"}), "");
+    inventory.disks[1].partitions.pop_back();
+    EXPECT_EQ(Said(inventory, run, {"initsys-dd"}),
+              "cut-off: /dev/sdb has partition 1 without 2 and is left out: it looks like a run "
+              "that was cut off: recovery.md, row 6\n");
+    // Somebody else's.
+    inventory.disks[1].partitions[0].start += 1;
+    EXPECT_EQ(Said(inventory, run, {"initsys"}), "");
 }
 
 TEST(Warnings, WrongRowAndWideGroup)
@@ -216,7 +236,7 @@ TEST(Warnings, IncompleteArrayAndSurvivor)
     inventory.arrays[0].fRunning = false;
     EXPECT_EQ(Said(inventory, {}, {"destroy", "2"}),
               "incomplete-array: the array md2 is not assembled, so it is not found; its "
-              "superblocks stay on sda3, nvme0n1p3\n");
+              "superblocks stay on sda3, nvme0n1p3: recovery.md, rows 11 to 13\n");
 }
 
 TEST(Warnings, OtherRunUnseenDiskAndBadEnd)

@@ -87,7 +87,7 @@ fail_member 2 sdc3
 check 'a member less' warns 'destroy 2' 'the array md2 lacks 1 of its members: their superblocks stay'
 stop_arrays 2
 check 'stopped' warns 'destroy 2' \
-    'the array md2 is not assembled, so it is not found; its superblocks stay on sda3, sdb3, sdc3'
+    'the array md2 is not assembled, so it is not found; its superblocks stay on sda3, sdb3, sdc3: recovery.md, rows 11 to 13'
 verdict 'an array that is not whole'
 
 must mdadm --zero-superblock /dev/sda3 /dev/sdb3 /dev/sdc3
@@ -104,7 +104,7 @@ for disk in sda sdb sdc; do
     must sfdisk.stock -q --delete "/dev/$disk" 1 2
 done
 check 'cut off' warns initsys \
-    '/dev/sda has no partitions 1 and 2 and is taken for blank, but /dev/sda3 carries the superblock of an array: it looks like a run that was cut off, and running again loses the data'
+    '/dev/sda has no partitions 1 and 2 and is taken for blank, but /dev/sda3 carries the superblock of an array: it looks like a run that was cut off: recovery.md, row 1; running again loses the data'
 verdict 'a run that was cut off'
 
 for disk in sda sdb sdc sdd; do
