@@ -168,6 +168,14 @@ array() {
     make_array "$number" --uuid="$(uuid "$number")" --assume-clean --raid-devices=$# $options $(nodes "$@")
 }
 
+# The level that the kernels of Debian 13 and later do not have any more.
+has_linear() {
+    case $(uname -r) in
+    6.1.*) return 0 ;;
+    *) return 1 ;;
+    esac
+}
+
 array_is_gone() {
     ! grep -q "^md$1 :" /proc/mdstat
 }
@@ -343,6 +351,22 @@ check_not_found() {
     echo "RAID /dev/md$2 is not found" >"$EXPECTED"
     check 'report' answers 1 arrayctl status "$2"
     verdict "$1"
+}
+
+# check_no_linear NAME MD "OPTIONS" MEMBER...: where the kernel lacks that level, mdadm writes the
+# superblocks and fails at the start of the array.
+check_no_linear() {
+    name=$1
+    number=$2
+    options=$3
+    shift 3
+    mdadm --create "/dev/md$number" --run --raid-devices=$# -l linear $options $(nodes "$@") \
+        </dev/null >/tmp/refused 2>&1
+    check 'status of mdadm' [ $? = 1 ]
+    check 'words of mdadm' grep -qx 'mdadm: RUN_ARRAY failed: Invalid argument' /tmp/refused
+    check 'no array' comes array_is_gone "$number"
+    must mdadm --zero-superblock $(nodes "$@")
+    check_not_found "$name: this kernel does not start it" "$number"
 }
 
 # --- the system log ----------------------------------------------------------------------------

@@ -6,7 +6,8 @@
 
 CROSS=powerpc-linux-gnu
 CROSS_ROOT=/usr/$CROSS
-KERNEL_PACKAGE=linux-source-6.1
+# The one that this machine's release has.
+KERNEL_PACKAGE=$(packages_of outside "$(system_codename)" powerpc-machine | grep '^linux-source-')
 KERNEL_ARCHIVE=/usr/src/$KERNEL_PACKAGE.tar.xz
 SOURCE_JOBS=$(nproc)
 

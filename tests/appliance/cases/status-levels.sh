@@ -35,8 +35,13 @@ level_case 'RAID 5 of three' raid5 'RAID 5' 1.2 sda1 sdb1 sdc1
 level_case 'RAID 5 with a 0.90 superblock' raid5 'RAID 5' 0.90 sda1 sdb1 sdc1 sdd1
 level_case 'RAID 6 of four' raid6 'RAID 6' 1.2 sda1 sdb1 sdc1 sdd1
 level_case 'RAID 10 of four' raid10 'RAID_10' 1.2 sda1 sdb1 sdc1 sdd1
-level_case 'linear of two' linear JBOD 1.2 sda1 sdb1
-level_case 'linear with a 0.90 superblock' linear JBOD 0.90 sda1 sdb1 sdc1
+if has_linear; then
+    level_case 'linear of two' linear JBOD 1.2 sda1 sdb1
+    level_case 'linear with a 0.90 superblock' linear JBOD 0.90 sda1 sdb1 sdc1
+else
+    check_no_linear 'linear of two' 2 '-e 1.2' sda1 sdb1
+    check_no_linear 'linear with a 0.90 superblock' 2 '-e 0.90' sda1 sdb1 sdc1
+fi
 
 # A 64 MiB partition under a 0.90 superblock gives its last 64 KiB, and no more.
 array 0 '-e 0.90 -l 1' sda2 sdb2

@@ -59,10 +59,14 @@ break_array 0 sda1
 check_report 'RAID 0 with a fault' 0 CRASHED None 'RAID 0' sdb1 sda1
 drop_arrays 0
 
-array 7 '-l linear' sda1 sdb1
-break_array 7 sdb1
-check_report 'linear with a fault' 7 CRASHED None JBOD sdb1 sda1
-drop_arrays 7
+if has_linear; then
+    array 7 '-l linear' sda1 sdb1
+    break_array 7 sdb1
+    check_report 'linear with a fault' 7 CRASHED None JBOD sdb1 sda1
+    drop_arrays 7
+else
+    check_no_linear 'linear with a fault' 7 '' sda1 sdb1
+fi
 
 # Real drives that disappear. The driver finds out when it next writes to them.
 array 1 '-l 1' sde1 sdf1
