@@ -48,8 +48,10 @@ constexpr const char *WRITABLE[] = {
     "/dev/pts",  "/dev/random", "/dev/ptmx", "/dev/urandom", "/dev/mapper/control",
 };
 
-// Rights that nothing needs for a question: rebooting, loading modules, raw ports, device nodes.
-constexpr int RIGHTS_DROPPED[] = {CAP_SYS_BOOT, CAP_SYS_MODULE, CAP_SYS_RAWIO, CAP_MKNOD};
+// Rights that nothing needs for a question: rebooting, loading modules, raw ports, device nodes,
+// the clock.
+constexpr int RIGHTS_DROPPED[] = {CAP_SYS_BOOT, CAP_SYS_MODULE, CAP_SYS_RAWIO, CAP_MKNOD,
+                                  CAP_SYS_TIME};
 
 std::string RealPath(const std::string &szPath)
 {

@@ -63,6 +63,24 @@ lay_out() {
     must sh -c "sfdisk.stock -q --wipe always --wipe-partitions never /dev/$1 </tmp/table"
 }
 
+# The name of the disk that the kernel's test driver made.
+debug_disk_name() {
+    for folder in /sys/bus/pseudo/drivers/scsi_debug/adapter*/host*/target*/*/block/*; do
+        [ -b "/dev/${folder##*/}" ] && echo "${folder##*/}" && return
+    done
+    return 1
+}
+
+# debug_disk PARAMETER...: sets disk.
+debug_disk() {
+    must modprobe scsi_debug per_host_store=1 dev_size_mb=16 "$@"
+    for host in /sys/class/scsi_host/host*; do
+        [ "$(cat "$host/proc_name")" = scsi_debug ] && echo '- - -' >"$host/scan"
+    done
+    await debug_disk_name
+    disk=$(debug_disk_name)
+}
+
 # The table as the stock partitioner reads it, then as the kernel knows it.
 table_of() {
     sfdisk.stock --dump "/dev/$1" | tr -d ' ,' |

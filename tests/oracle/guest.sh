@@ -26,7 +26,8 @@ install_recorder() {
     mkdir -p "$REAL" "$RECORDS"
     mv /usr/sbin/mdadm /usr/sbin/sfdisk "$REAL"
     # The duplication tool succeeds in silence.
-    ln -s /usr/bin/true "$REAL/nurodd"
+    printf '#!/bin/sh\n' >"$REAL/nurodd"
+    chmod +x "$REAL/nurodd"
     cat >"$ORACLE/recorder" <<'SCRIPT'
 #!/bin/sh
 # The newline ends the record, and the whole record is one write.
@@ -59,8 +60,10 @@ SCRIPT
     chmod +x "$ORACLE/recorder"
 }
 
+TOOLS="/usr/sbin/mdadm /usr/sbin/sfdisk $DUPLICATOR"
+
 restore_tools() {
-    for program in /usr/sbin/mdadm /usr/sbin/sfdisk "$DUPLICATOR"; do
+    for program in $TOOLS; do
         ln -sf "$ORACLE/recorder" "$program"
     done
     : >"$FAULTS"
@@ -210,6 +213,18 @@ record_markers() {
 
 log_is_complete() {
     grep -q ' oracle: end$' "$SYSLOG"
+}
+
+# rehearse ARGUMENT...: with the real programs in the recorder's place, where nothing can be written.
+rehearse() {
+    for program in $TOOLS; do
+        [ ! -e "$program" ] || ln -sf "$REAL/${program##*/}" "$program"
+    done
+    arrayctl-rehearse --commands "$@" >"$CURRENT/rehearsed" 2>"$CURRENT/rehearsed.errors"
+    echo $? >"$CURRENT/rehearsed.status"
+    for program in $TOOLS; do
+        [ ! -e "$program" ] || ln -sf "$ORACLE/recorder" "$program"
+    done
 }
 
 # run ARGUMENT...: pauses are answered at once, and written down among the calls.

@@ -354,10 +354,11 @@ string HostsScript(const PLAN &plan)
 
 } // namespace
 
-PLAN PlanMake(std::uint64_t seed)
+PLAN PlanMake(std::uint64_t seed, bool fRehearsed)
 {
     DICE dice(seed);
     PLAN plan;
+    plan.fRehearsed = fRehearsed;
     plan.subject = CaseFind(seed);
     ORACLE_MACHINE &machine = plan.subject.machine;
     for (const auto &[szName, table] : machine.disks) {
@@ -369,7 +370,9 @@ PLAN PlanMake(std::uint64_t seed)
     WholeAdd(dice, plan);
     ArraysAdd(dice, plan);
     SystemArrayAdd(plan);
-    FaultsAdd(dice, plan);
+    if (!fRehearsed) {
+        FaultsAdd(dice, plan);
+    }
     return plan;
 }
 
@@ -393,5 +396,11 @@ std::string PlanScript(const PLAN &plan)
     }
     vector<string> run = {"run"};
     run.insert(run.end(), plan.subject.words.begin(), plan.subject.words.end());
-    return text + HostsScript(plan) + Command(run);
+    text += HostsScript(plan);
+    if (plan.fRehearsed) {
+        run[0] = "rehearse";
+        text += Command(run);
+        run[0] = "run";
+    }
+    return text + Command(run);
 }

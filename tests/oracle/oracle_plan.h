@@ -47,9 +47,11 @@ struct PLAN {
     std::vector<PLAN_ARRAY> arrays{};
     std::vector<PLAN_FAULT> faults{};
     bool fUnits = false; // the host adapters' folder has to be made up
+    bool fRehearsed = false;
 };
 
-PLAN PlanMake(std::uint64_t seed);
+// With a rehearsal before the run no tool is made to fail: that could not be foreseen.
+PLAN PlanMake(std::uint64_t seed, bool fRehearsed);
 
 // The plan in the words of the script that carries it out.
 std::string PlanScript(const PLAN &plan);

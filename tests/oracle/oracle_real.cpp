@@ -3,10 +3,14 @@
 // Random machines with real disks: prints what the appliance must set up, and compares what was
 // recorded there with the model.
 //
-//     oracle_real plan SEED N             the script of N machines, the first from SEED
-//     oracle_real compare SEED N FOLDER   their records
+//     oracle_real plan SEED N [rehearsed]             the script of N machines, the first from SEED
+//     oracle_real compare SEED N FOLDER [rehearsed]   their records
+//
+// Rehearsed, the commands of a rehearsal must be those that the tool ran afterwards. Where one of
+// these failed, which no rehearsal can know, it must have warned.
 #include "oracle_compare.h"
 #include "oracle_plan.h"
+#include "oracle_strands.h"
 #include "suite.h"
 #include "verdict.h"
 #include "words.h"
@@ -14,6 +18,7 @@
 #include <algorithm>
 #include <cstdio>
 #include <cstdlib>
+#include <cstring>
 #include <regex>
 
 namespace
@@ -29,6 +34,7 @@ using u64 = std::uint64_t;
 struct RECORD {
     ORACLE_MACHINE machine{};
     ORACLE_SEEN seen{};
+    string szFailed{}; // the first command that did, and its status
 };
 
 // A file of a record that must be there.
@@ -69,6 +75,9 @@ void ReplyTake(const string &szFolder, const string &szReply, const ORACLE_WORDS
     reply.szErr = PartRead(szFolder, szReply + ".err", record.seen);
     reply.nExit = atoi(PartRead(szFolder, szReply + ".status", record.seen).c_str());
     record.machine.replies[OracleReplyKey(words)].push_back(reply);
+    if (reply.nExit != 0 && !OracleIsQuestion(words) && record.szFailed.empty()) {
+        record.szFailed = OracleReplyKey(words) + ", status " + to_string(reply.nExit);
+    }
 }
 
 // Lines of a number and an argument list, or of a pause that was answered.
@@ -183,34 +192,75 @@ string Head(const PLAN &plan, const RECORD &record)
            " calls, status " + to_string(record.seen.nStatus);
 }
 
-void MachineCompare(u64 seed, const string &szRecords)
+// So many machines have to be compared with what was rehearsed on them.
+constexpr u64 COMPARED_MIN = 60;
+constexpr char COMPARED[] = "enough machines on which no command failed";
+
+constexpr int STATUS_CLEAN = 0;
+constexpr int STATUS_WARNED = 3;
+
+void RehearsalCompare(const string &szFolder, RECORD &record, vector<string> &differences)
 {
-    const PLAN plan = PlanMake(seed);
-    const RECORD record = RecordTake(plan, szRecords + "/" + to_string(seed));
+    const string szTold = PartRead(szFolder, "rehearsed", record.seen);
+    const int nStatus = atoi(PartRead(szFolder, "rehearsed.status", record.seen).c_str());
+    if (!record.szFailed.empty()) {
+        if (nStatus != STATUS_WARNED) {
+            differences.push_back(
+                "the rehearsal: it did not warn, and this failed: " + record.szFailed + "\n");
+        }
+        return;
+    }
+    const string szDifference = OracleStrandsDifference(OracleStrandsRehearsed(szTold),
+                                                        OracleStrandsRun(record.seen.commands));
+    if ((nStatus != STATUS_CLEAN && nStatus != STATUS_WARNED) || !szDifference.empty()) {
+        differences.push_back("the rehearsal, of status " + to_string(nStatus) + "\n" +
+                              PartRead(szFolder, "rehearsed.errors", record.seen) + szDifference);
+    }
+}
+
+// Whether no command failed.
+bool MachineCompare(u64 seed, const string &szRecords, bool fRehearsed)
+{
+    const string szFolder = szRecords + "/" + to_string(seed);
+    const PLAN plan = PlanMake(seed, fRehearsed);
+    RECORD record = RecordTake(plan, szFolder);
+    vector<string> differences;
+    if (fRehearsed) {
+        RehearsalCompare(szFolder, record, differences);
+    }
     ORACLE_CASE subject = plan.subject;
     subject.machine = record.machine;
-    vector<string> differences =
+    const vector<string> others =
         OracleDifferences(OracleAnswers(subject.machine, subject.words), record.seen);
+    differences.insert(differences.end(), others.begin(), others.end());
     SetUpCheck(plan, record, differences);
     string szText = differences.empty() ? "" : OracleCaseText(subject);
     for (const string &szDifference : differences) {
         szText += "difference in " + szDifference;
     }
-    VerdictTell("seed " + to_string(seed), szText, Head(plan, record));
+    const string szFailed = record.szFailed.empty() ? "" : ", failed: " + record.szFailed;
+    VerdictTell("seed " + to_string(seed), szText,
+                Head(plan, record) + (fRehearsed ? szFailed : ""));
+    return record.szFailed.empty();
 }
 
-int CompareAll(u64 first, u64 count, const string &szRecords)
+int CompareAll(u64 first, u64 count, const string &szRecords, bool fRehearsed)
 {
+    u64 nCompared = 0;
     for (u64 seed = first; seed < first + count; seed++) {
-        MachineCompare(seed, szRecords);
+        nCompared += MachineCompare(seed, szRecords, fRehearsed) ? 1 : 0;
+    }
+    if (fRehearsed && count >= COMPARED_MIN) {
+        const string szCompared = to_string(nCompared) + " of " + to_string(count) + " machines";
+        VerdictTell(COMPARED, nCompared < COMPARED_MIN ? szCompared + "\n" : "", szCompared);
     }
     return EXIT_SUCCESS;
 }
 
-int PlanAll(u64 first, u64 count)
+int PlanAll(u64 first, u64 count, bool fRehearsed)
 {
     for (u64 seed = first; seed < first + count; seed++) {
-        const string szScript = PlanScript(PlanMake(seed));
+        const string szScript = PlanScript(PlanMake(seed, fRehearsed));
         (void)fwrite(szScript.data(), 1, szScript.size(), stdout);
     }
     return EXIT_SUCCESS;
@@ -222,12 +272,16 @@ int main(int argc, char *argv[])
 {
     const string szWord = argc > 1 ? argv[1] : "";
     const bool fPlan = szWord == "plan";
+    const bool fRehearsed = argc > 1 && strcmp(argv[argc - 1], "rehearsed") == 0;
+    const int nWords = argc - (fRehearsed ? 1 : 0);
     u64 first = 0;
     u64 count = 0;
-    if ((!fPlan && szWord != "compare") || argc != (fPlan ? 4 : 5) || !NumberTake(argv[2], first) ||
-        !NumberTake(argv[3], count)) {
-        fprintf(stderr, "usage: oracle_real plan SEED N | compare SEED N FOLDER\n");
+    if ((!fPlan && szWord != "compare") || nWords != (fPlan ? 4 : 5) ||
+        !NumberTake(argv[2], first) || !NumberTake(argv[3], count)) {
+        fprintf(stderr,
+                "usage: oracle_real plan SEED N [rehearsed] | compare SEED N FOLDER [rehearsed]\n");
         return EXIT_FAILURE;
     }
-    return fPlan ? PlanAll(first, count) : CompareAll(first, count, argv[4]);
+    return fPlan ? PlanAll(first, count, fRehearsed)
+                 : CompareAll(first, count, argv[4], fRehearsed);
 }

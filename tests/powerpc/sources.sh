@@ -136,6 +136,36 @@ libfdisk_keep() { # WORK OUT
     done
 }
 
+# What the rehearsal is linked with: Debian's main archive has no package of it for this processor.
+blkid_build() {
+    cd "$1" || return
+    ./configure "--host=$CROSS" --prefix=/usr --disable-nls --disable-shared --enable-static \
+        --disable-all-programs --enable-libblkid --without-udev --without-systemd --without-python \
+        --disable-bash-completion --disable-asciidoc CFLAGS=-O2 &&
+        make -j "$SOURCE_JOBS" ACLOCAL=: AUTOMAKE=: AUTOCONF=: AUTOHEADER=: libblkid.la
+}
+
+# blkid_ready CACHE: prints the folder of its header and archive; made once and kept there.
+blkid_ready() {
+    local szKept szWork
+    szKept=$1/powerpc-blkid-$(declare -f blkid_build source_fetch | sha256sum | cut -c1-16)
+    mkdir -p "$1"
+    exec 9>"$1/lock-powerpc-blkid"
+    flock 9
+    if [ ! -d "$szKept" ]; then
+        szWork=$(mktemp -d "$1/work.XXXXXX")
+        source_fetch util-linux "$szWork"
+        note "making libblkid for PowerPC"
+        (run_logged "$szWork/util-linux.log" blkid_build "$szWork/util-linux") || return
+        install -D -m 644 "$szWork/util-linux/libblkid/src/blkid.h" "$szWork/out/blkid/blkid.h"
+        install -m 644 "$szWork/util-linux/.libs/libblkid.a" "$szWork/out/"
+        mv "$szWork/out" "$szKept"
+        rm -rf "$szWork"
+    fi
+    exec 9>&-
+    printf '%s\n' "$szKept"
+}
+
 # partitioner_build LIBFDISK SOURCE OUT: the compiler's own libraries go in, as there is but the C
 # library inside.
 partitioner_build() {

@@ -57,24 +57,6 @@ synced() {
 ioctl" ]
 }
 
-# The name of the disk that the kernel's test driver made.
-debug_disk_name() {
-    for folder in /sys/bus/pseudo/drivers/scsi_debug/adapter*/host*/target*/*/block/*; do
-        [ -b "/dev/${folder##*/}" ] && echo "${folder##*/}" && return
-    done
-    return 1
-}
-
-# debug_disk PARAMETER...: sets disk.
-debug_disk() {
-    must modprobe scsi_debug per_host_store=1 dev_size_mb=16 "$@"
-    for host in /sys/class/scsi_host/host*; do
-        [ "$(cat "$host/proc_name")" = scsi_debug ] && echo '- - -' >"$host/scan"
-    done
-    await debug_disk_name
-    disk=$(debug_disk_name)
-}
-
 # makes DISK NUMBER GAP SIZE TYPE START SECTORS: what it is asked for, and what the kernel knows at once.
 makes() {
     check "$1$2 is made" creates "$1" "$2" "$3" "$4" "$5"

@@ -6,7 +6,7 @@
 # shellcheck disable=SC2046,SC2086,SC2317  # lists of words; check must call the functions
 # shellcheck source=SCRIPTDIR/../lib-rehearse.sh
 . /appliance/lib-rehearse.sh
-plan 13
+plan 18
 REFUSED='the programs will refuse to change it, and the real run will end otherwise than this rehearsal'
 
 must mkfs.ext4 -q -F -L films /dev/sdd
@@ -62,6 +62,18 @@ check 'a system that runs' warns initsys "/dev/sda1 is in use (held by md0): $RE
 drop_arrays 0
 verdict 'partitions in use'
 
+must mkswap /dev/sdb2
+must swapon /dev/sdb2
+check 'swap' warns initsys "/dev/sdb2 is in use (used as swap): $REFUSED"
+must swapoff /dev/sdb2
+verdict 'swap in use'
+
+must blockdev --setro /dev/sdd
+check 'newvol' warns newvol \
+    '/dev/sdd is read-only: the command fails at it, after others have been changed'
+must blockdev --setrw /dev/sdd
+verdict 'a new volume that fails half-way'
+
 must mv /usr/sbin/sfdisk /usr/sbin/sfdisk.whole
 printf '#!/bin/sh\ncase $* in *-l*sdd) exit 4 ;; esac\nexec /usr/sbin/sfdisk.whole "$@"\n' >/usr/sbin/sfdisk
 chmod +x /usr/sbin/sfdisk
@@ -100,6 +112,24 @@ stop_arrays 2
 must mdadm --zero-superblock /dev/sdd3
 verdict 'a journal'
 
+is_replacement() {
+    mdadm -E "/dev/$1" | grep -q 'Replacement device 0'
+}
+
+slow_resync
+array 2 '-l 1' sda3 sdb3
+must mdadm /dev/md2 --add /dev/sdc3
+echo want_replacement >/sys/block/md2/md/dev-sda3/state
+await is_replacement sdc3
+check 'a replacement' warns 'destroy 2' \
+    '/dev/sdc3 is a member that the tool does not read: mdadm -E calls it "Replacement device 0"' \
+    'the superblock on /dev/sdc3 survives: /dev/md2 is stopped, and can come back'
+stop_arrays 2
+must mdadm --zero-superblock /dev/sda3 /dev/sdb3 /dev/sdc3
+array 2 '-l 5' sda3 sdb3 sdc3
+stop_arrays 2
+verdict 'a replacement'
+
 for disk in sda sdb sdc; do
     must sfdisk.stock -q --delete "/dev/$disk" 1 2
 done
@@ -110,6 +140,20 @@ verdict 'a run that was cut off'
 for disk in sda sdb sdc sdd; do
     must sh -c "mdadm --zero-superblock /dev/${disk}3; wipefs -q -a /dev/$disk; blockdev --rereadpt /dev/$disk"
 done
+machine internalportcfg=0x1f usbportcfg=0x10000 maxdisks=5
+debug_disk
+check 'a small disk' warns initsys "/dev/$disk is too small for partition 1, which begins at sector \
+2048: the command fails at it, after others have been changed"
+must rmmod scsi_debug
+verdict 'a disk that is too small'
+
+debug_disk virtual_gb=6 opts=2 medium_error_start=0
+check 'it cannot be read' warns initsys \
+    "/dev/$disk cannot be read: the command fails at it, after others have been changed"
+must rmmod scsi_debug
+bays 0xf
+verdict 'a disk that cannot be read'
+
 check 'nothing speaks against it' rehearses 0 initsys
 check 'in words' tells 'nothing'
 verdict 'none of that'
