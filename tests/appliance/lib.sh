@@ -36,6 +36,12 @@ must() {
         cat /tmp/must
         abort "$* ended with an error"
     }
+    rest
+}
+
+# Until udev, where there is one, has done what it does about what happened.
+rest() {
+    [ ! -e /run/udev/control ] || udevadm settle
 }
 
 # --- many checks, one verdict ------------------------------------------------------------------
@@ -48,7 +54,7 @@ check() {
     what=$1
     shift
     checks=$((checks + 1))
-    "$@" >/tmp/check 2>&1 && return
+    "$@" >/tmp/check 2>&1 && rest && return
     failures=$((failures + 1))
     echo "    wrong: $what: $*"
     sed 's/^/        /' /tmp/check
@@ -88,11 +94,6 @@ comes() {
         [ "$tenths" -gt 0 ] || return 1
         sleep 0.1
     done
-}
-
-# Until udev, where there is one, has done what it does about what happened.
-rest() {
-    [ ! -e /run/udev/control ] || must udevadm settle
 }
 
 # await CONDITION...: what follows needs it.

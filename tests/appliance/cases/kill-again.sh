@@ -39,6 +39,7 @@ kill_within() {
     wait
     : >"$PID"
     await is_quiet
+    rest
 }
 
 # length_of COMMAND...: of an undisturbed run, in hundredths of a second; at least one.
