@@ -64,8 +64,10 @@ lose_system "$WHOLE_7"
 must arrayctl_awake initsys
 numbers "$WHOLE_7"
 way_back 2
-check_way_back "$LAYOUT_8
-$(echo "$WHOLE_7" | tail -n 1)"
+check_tables "$LAYOUT_8
+$(echo "$WHOLE_7" | tail -n 1)" $ALL
+check_data
+forget
 verdict 'row 2: layout 7, on disks of layout 8'
 
 finish
