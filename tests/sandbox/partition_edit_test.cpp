@@ -306,7 +306,7 @@ TEST(PartitionZero, WipesThePartitionsSuperblock)
 
 u64 sectorsOut = 0;
 u32 typeOut = 0;
-u32 versionIn = 8;
+u32 versionGiven = 8;
 PNLIBSZLIST pNone = nullptr;
 constexpr char EDIT_REFUSES[] = "<11>partition_edit.cpp:# Bad parameters";
 constexpr char ENUM_REFUSES[] = "<11>partition_enum.cpp:# bad parameters";
@@ -321,7 +321,7 @@ struct BAD_CASE {
 };
 
 constexpr BAD_CASE BAD_CASES[] = {
-    {"create, no disk", [] { return 0LL + PartitionCreate(nullptr, 1, &versionIn); }, OLD_CODE,
+    {"create, no disk", [] { return 0LL + PartitionCreate(nullptr, 1, &versionGiven); }, OLD_CODE,
      EDIT_REFUSES},
     {"clean, no disk", [] { return 0LL + PartitionClean(nullptr, 3); }, OLD_CODE, EDIT_REFUSES},
     {"signature, no disk", [] { return 0LL + PartitionTableAdd(nullptr); }, OLD_CODE, EDIT_REFUSES},
