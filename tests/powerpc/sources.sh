@@ -37,11 +37,13 @@ GUEST_PROGRAMS=(
     util-linux/wipefs:/usr/sbin/wipefs
 )
 
-# run_logged LOG COMMAND...: silent unless it fails.
+# run_logged LOG COMMAND...: says how far it is now and then, so that nobody takes it for one that hangs.
 run_logged() {
     local szLog=$1
     shift
-    "$@" >>"$szLog" 2>&1 || { tail -n 30 "$szLog" >&2; die "'$1' failed, see $szLog"; }
+    "$@" 2>&1 | tee -a "$szLog" |
+        awk '++line % 100 == 0 { print "... " line " lines" >"/dev/stderr"; fflush() }'
+    [ "${PIPESTATUS[0]}" -eq 0 ] || { tail -n 30 "$szLog" >&2; die "'$1' failed, see $szLog"; }
 }
 
 # source_fetch PACKAGE FOLDER: FOLDER/PACKAGE is the unpacked source.
