@@ -1,14 +1,14 @@
 #!/bin/sh
 # SPDX-License-Identifier: MIT
 # The tool is cut off before and behind each of the commands that it runs, on the first, a middle and the
-# last disk, and at random moments: every state is a row of the page of recovery. One cut in ten, unless
+# last disk, and at random moments: every state is a row of the page of recovery. One cut in thirty, unless
 # the second argument says otherwise.
 # disks: 4
 # size: 4672M
 # shellcheck disable=SC2046,SC2086,SC2154,SC2317  # lists of words; check must call the functions
 # shellcheck source=SCRIPTDIR/../lib-recovery.sh
 . /appliance/lib-recovery.sh
-EVERY=${2:-10}
+EVERY=${2:-30}
 # All of them are some more than 300.
 RANDOM_CUTS=60
 plan 5
