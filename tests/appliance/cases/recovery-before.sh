@@ -1,6 +1,7 @@
 #!/bin/sh
 # SPDX-License-Identifier: MIT
 # What the page of recovery has an installer do first, and what runs at the same time do to each other.
+# alone: yes
 # disks: 4
 # size: 4672M
 # shellcheck disable=SC2046,SC2086,SC2154,SC2317  # lists of words; check must call the functions

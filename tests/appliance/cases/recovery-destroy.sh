@@ -2,6 +2,7 @@
 # SPDX-License-Identifier: MIT
 # A teardown is cut off at every place that the page of recovery tells of; what the page says ends it,
 # or brings the array and its volume back with every byte.
+# alone: yes
 # disks: 4
 # size: 4672M
 # shellcheck disable=SC2046,SC2086,SC2154,SC2317  # lists of words; check must call the functions

@@ -1,6 +1,7 @@
 #!/bin/sh
 # SPDX-License-Identifier: MIT
 # The way back of rows 1 to 3 with the numbers of other layouts.
+# alone: yes
 # disks: 4
 # size: 4672M
 # shellcheck disable=SC2046,SC2086,SC2154,SC2317  # lists of words; check must call the functions
