@@ -39,9 +39,13 @@ must() {
     rest
 }
 
+has_udev() {
+    [ -e /run/udev/control ]
+}
+
 # Until udev, where there is one, has done what it does about what happened.
 rest() {
-    [ ! -e /run/udev/control ] || udevadm settle
+    ! has_udev || udevadm settle
 }
 
 # --- many checks, one verdict ------------------------------------------------------------------

@@ -225,7 +225,8 @@ check "sdc1" creates sdc 1 2048 2048 fd
 dd if=/dev/sdc of=/tmp/table bs=512 count=1 2>/dev/null
 deletes -1 sdc
 dd if=/tmp/table of=/dev/sdc bs=512 count=1 conv=notrunc 2>/dev/null
-gone sdc 1
+# udev reads a table as soon as somebody has written one.
+has_udev || gone sdc 1
 signs sdc
 check "the kernel knows" knows sdc 1 2048 2048
 verdict 'the table and the kernel differ'
