@@ -37,9 +37,9 @@ SCRIPT
     done
 }
 
-# The commands among the calls: what is no question.
+# The commands among the calls: what is no question, be it the tool's or, where there is one, udev's.
 calls_that_change() {
-    grep -v -e '^/sbin/mdadm -E ' -e '^/sbin/sfdisk -l ' -e '^/sbin/pvs -o ' "$CALLS"
+    grep -v -e '^/sbin/mdadm --detail ' -e '^/sbin/mdadm -E ' -e '^/sbin/sfdisk -l ' -e '^/sbin/pvs -o ' "$CALLS"
 }
 
 # Children work side by side, so the commands of each disk are compared in their order; those of the

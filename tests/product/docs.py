@@ -165,12 +165,21 @@ def by_being_there(command):
     run("bash", "-n", script)
 
 
+def by_udev(command):
+    """The case of udev does it, for each of the rules that it names."""
+    case = read("tests/appliance/cases/udev.sh")
+    rules = re.search("^RULES='(.*)'$", case, re.M).group(1).split()
+    steps = re.findall(r"^ *must (.*)$", case, re.M)
+    assert command in [step.replace('"', "").replace("$rule", rule) for step in steps for rule in rules], command
+
+
 RULES = (
     (r"\./check\b", by_check), (r"\./demo$", by_demo), (r"cmake ", by_preset),
     (r"tests/run ", by_suite), (r"build/release/bench/", by_bench), (r"bench/", by_gates),
     (r"DESTDIR=", by_install), (r"mdrequests ", by_installed),
     (r"appliance/(run|shell)\b", by_options), (re.escape(PROMPT), by_story),
     (r"packaging/make-", by_install_test), (r"docs/pictures/make", by_pictures),
+    (r"ln -s /dev/null |udevadm ", by_udev),
     (r"tests/style/before-commit|ln -s .*tests/style/before-commit", by_being_there),
 )
 
