@@ -71,7 +71,7 @@ int Rehearse(const OPTIONS &options, const HOST &host)
     if (!StageSetUp(options.szToolPath.c_str(), journal.fd, syslog.fd)) {
         return STATUS_NOT_REHEARSED;
     }
-    if (journal.fd < 0 || listen(journal.fd, SOMAXCONN) != 0) {
+    if (listen(journal.fd, SOMAXCONN) != 0) {
         (void)ComplainErrno("cannot listen to the recorder");
         return STATUS_NOT_REHEARSED;
     }
