@@ -15,6 +15,7 @@ FAULTS=$ORACLE/faults
 CURRENT=$ORACLE/current
 RECORDS=$ORACLE/records
 DUPLICATOR=/bin/nurodd
+VOLUME=/volume1
 LETTERS='a b c d e f g h i j'
 MARKERS='/.force_clean_all_disk /tmp/.dualhead /tmp/.not.dualhead /tmp/raid.0 /tmp/raid.1 /tmp/raid.5'
 
@@ -24,7 +25,10 @@ MARKERS='/.force_clean_all_disk /tmp/.dualhead /tmp/.not.dualhead /tmp/raid.0 /t
 # what it was called with, passes that on, and keeps the answer.
 install_recorder() {
     mkdir -p "$REAL" "$RECORDS"
-    mv /usr/sbin/mdadm /usr/sbin/sfdisk "$REAL"
+    mv /usr/sbin/mdadm /usr/sbin/sfdisk /usr/bin/umount "$REAL"
+    for program in pvs lvremove vgremove pvremove; do
+        ln -s /usr/sbin/lvm "$REAL/$program"
+    done
     # The duplication tool succeeds in silence.
     printf '#!/bin/sh\n' >"$REAL/nurodd"
     chmod +x "$REAL/nurodd"
@@ -60,7 +64,8 @@ SCRIPT
     chmod +x "$ORACLE/recorder"
 }
 
-TOOLS="/usr/sbin/mdadm /usr/sbin/sfdisk $DUPLICATOR"
+TOOLS="/usr/sbin/mdadm /usr/sbin/sfdisk /usr/sbin/pvs /usr/sbin/lvremove /usr/sbin/vgremove
+    /usr/sbin/pvremove /usr/bin/umount $DUPLICATOR"
 
 restore_tools() {
     for program in $TOOLS; do
@@ -95,6 +100,11 @@ all_present() {
     done
 }
 
+close_groups() {
+    ! grep -q " $VOLUME " /proc/mounts || must "$REAL/umount" "$VOLUME"
+    must lvm vgchange -q -a n
+}
+
 stop_all() {
     for number in $(arrays_known); do
         must "$REAL/mdadm" -q --stop "/dev/md$number"
@@ -106,7 +116,8 @@ stop_all() {
 begin() {
     seed=$1
     echo "# machine $seed"
-    ! grep -q " $SCSI_HOSTS tmpfs " /proc/mounts || must umount "$SCSI_HOSTS"
+    ! grep -q " $SCSI_HOSTS tmpfs " /proc/mounts || must "$REAL/umount" "$SCSI_HOSTS"
+    close_groups
     stop_all
     all_present
     for letter in $LETTERS; do
@@ -165,7 +176,11 @@ tables_made() {
 }
 
 create() {
-    must "$REAL/mdadm" --create "$@" --run --assume-clean --bitmap=none
+    bitmap=--bitmap=none
+    case " $* " in
+    *' -l0 '*) bitmap= ;; # it takes no word about one
+    esac
+    must "$REAL/mdadm" --create "$@" --run --assume-clean $bitmap
 }
 
 # whole DISK MD: a superblock at the disk's end.
@@ -181,6 +196,20 @@ array() {
     shift 2
     create "/dev/md$number" "$@"
     [ "$fate" = running ] || must "$REAL/mdadm" -q --stop "/dev/md$number"
+}
+
+# group MD full|open COUNT mounted|closed: a group on an array, with so many volumes that fill it, or not.
+group() {
+    must pvcreate -q "/dev/md$1"
+    must vgcreate -q -s 1M "vg$1" "/dev/md$1"
+    [ "$3" = 1 ] || make_volume "vg$1" volume_2 8
+    [ "$2" = open ] && extents=8 || extents=100%FREE
+    make_volume "vg$1" volume_1 "$extents"
+    must mkfs.ext4 -q "/dev/vg$1/volume_1"
+    [ "$4" = closed ] || {
+        mkdir -p "$VOLUME"
+        must mount "/dev/vg$1/volume_1" "$VOLUME"
+    }
 }
 
 # --- the run -----------------------------------------------------------------------------------

@@ -25,6 +25,8 @@ constexpr u64 DATA_SIZE = 65536;
 constexpr int TYPE_RAID = 0xfd;
 constexpr int TYPE_EXTENDED = 0x05;
 constexpr size_t SECTOR = 512;
+constexpr u64 DESTROY_EVERY = 4;
+constexpr char DESTROY[] = "destroy";
 
 // ---------------------------------------------------------------------------- which can be real
 
@@ -98,14 +100,24 @@ bool CaseIsWanted(const ORACLE_CASE &subject, u64 seed)
     return (answer.markers.count(ORACLE_MARKER_DUAL) != 0) == fDual && HasWork(answer, seed);
 }
 
-ORACLE_CASE CaseFind(u64 seed)
+// An array can be destroyed on a machine that has room for its members.
+bool CaseIsWantedForArrays(const ORACLE_CASE &subject, u64 seed)
+{
+    const auto &disks = subject.machine.disks;
+    const auto nWithRoom = std::count_if(disks.begin(), disks.end(),
+                                         [](const auto &disk) { return disk.second.size() > 1; });
+    return MachineIsReal(subject.machine) && disks.size() == 1 + seed / DESTROY_EVERY % DISKS_MAX &&
+           2 * nWithRoom >= static_cast<std::ptrdiff_t>(disks.size());
+}
+
+ORACLE_CASE CaseFind(u64 seed, bool fArrays)
 {
     for (u64 draw = seed * DRAWS_PER_SEED;; draw++) {
         ORACLE_CASE subject = OracleCaseMake(draw);
         subject.machine.replies.clear();
         subject.machine.disks.erase("loop0");
         subject.machine.disks.erase("mmcblk0");
-        if (CaseIsWanted(subject, seed)) {
+        if (fArrays ? CaseIsWantedForArrays(subject, seed) : CaseIsWanted(subject, seed)) {
             subject.seed = seed;
             return subject;
         }
@@ -156,11 +168,11 @@ void WholeAdd(DICE &dice, PLAN &plan)
     }
 }
 
-void ArraysAdd(DICE &dice, PLAN &plan)
+void ArraysAdd(DICE &dice, PLAN &plan, const vector<u64> &percents)
 {
     static const vector<string> metadata = {"0.90", "0.90", "1.0", "1.1", "1.2", "1.2"};
     vector<string> candidates;
-    const u64 percent = Pick(dice, vector<u64>{0, 60, 90});
+    const u64 percent = Pick(dice, percents);
     for (const auto &[szName, disk] : plan.disks) {
         for (const PLAN_PARTITION &partition : disk.table) {
             if ((partition.number == 3 || partition.number == 5) && Chance(dice, percent)) {
@@ -184,6 +196,37 @@ void ArraysAdd(DICE &dice, PLAN &plan)
         array.fSpare = count == 3 && Chance(dice, 40);
         array.fRunning = Chance(dice, 30);
         plan.arrays.push_back(array);
+    }
+}
+
+int LevelMake(DICE &dice, const PLAN_ARRAY &array)
+{
+    static const vector<int> levels = {0, 1, 5, 10};
+    const int nLevel = Pick(dice, levels);
+    const bool fEnough = array.members.size() >= (nLevel == 5 ? 3 : 2);
+    return fEnough && !array.fSpare ? nLevel : 1;
+}
+
+// The array that the command takes apart runs, and may carry a group. Now and then it does not run,
+// or there is none of this number.
+void DestroyAdd(DICE &dice, PLAN &plan)
+{
+    ORACLE_WORDS &words = plan.subject.words;
+    words = {DESTROY, "2"};
+    plan.subject.machine.missing.clear();
+    for (PLAN_ARRAY &array : plan.arrays) {
+        array.nLevel = array.nMd == 0 ? 1 : LevelMake(dice, array);
+    }
+    if (plan.arrays.empty()) {
+        return;
+    }
+    PLAN_ARRAY &array = plan.arrays[Below(dice, plan.arrays.size())];
+    words[1] = to_string(array.nMd);
+    array.fRunning = array.nMd == 0 || Chance(dice, 90);
+    if (array.nMd != 0 && array.fRunning && Chance(dice, 60)) {
+        array.nVolumes = static_cast<int>(1 + Below(dice, 2));
+        array.fFull = Chance(dice, 75);
+        array.fMounted = Chance(dice, 15);
     }
 }
 
@@ -325,7 +368,7 @@ string ArrayScript(const PLAN_ARRAY &array)
                             array.fRunning ? "running" : "stopped",
                             "-e",
                             array.szMetadata,
-                            "-l1",
+                            "-l" + to_string(array.nLevel),
                             "-n" + to_string(array.members.size() - (array.fSpare ? 1 : 0))};
     if (array.members.size() == 1) {
         words.emplace_back("-f");
@@ -339,7 +382,10 @@ string ArrayScript(const PLAN_ARRAY &array)
     for (const string &szMember : array.members) {
         words.push_back("/dev/" + szMember);
     }
-    return Command(words);
+    const string szGroup =
+        Command({"group", to_string(array.nMd), array.fFull ? "full" : "open",
+                 to_string(array.nVolumes), array.fMounted ? "mounted" : "closed"});
+    return Command(words) + (array.nVolumes == 0 ? "" : szGroup);
 }
 
 string HostsScript(const PLAN &plan)
@@ -359,7 +405,8 @@ PLAN PlanMake(std::uint64_t seed, bool fRehearsed)
     DICE dice(seed);
     PLAN plan;
     plan.fRehearsed = fRehearsed;
-    plan.subject = CaseFind(seed);
+    const bool fDestroys = fRehearsed && seed % DESTROY_EVERY == 0;
+    plan.subject = CaseFind(seed, fDestroys);
     ORACLE_MACHINE &machine = plan.subject.machine;
     for (const auto &[szName, table] : machine.disks) {
         plan.disks[szName] = DiskMake(dice, table);
@@ -368,12 +415,20 @@ PLAN PlanMake(std::uint64_t seed, bool fRehearsed)
         return host.first.compare(0, 4, "host") == 0 && host.first != "host0";
     });
     WholeAdd(dice, plan);
-    ArraysAdd(dice, plan);
+    ArraysAdd(dice, plan, fDestroys ? vector<u64>{90} : vector<u64>{0, 60, 90});
     SystemArrayAdd(plan);
+    if (fDestroys) {
+        DestroyAdd(dice, plan);
+    }
     if (!fRehearsed) {
         FaultsAdd(dice, plan);
     }
     return plan;
+}
+
+bool PlanDestroys(const PLAN &plan)
+{
+    return plan.subject.words[0] == DESTROY;
 }
 
 std::string PlanScript(const PLAN &plan)

@@ -31,6 +31,10 @@ struct PLAN_ARRAY {
     std::vector<std::string> members{};
     bool fSpare = false;
     bool fRunning = false;
+    int nLevel = 1;
+    int nVolumes = 0;   // of the group on it; without one it has no group
+    bool fFull = false; // no room is left beside the volumes
+    bool fMounted = false;
 };
 
 // A call of a tool that fails without being passed on.
@@ -50,8 +54,11 @@ struct PLAN {
     bool fRehearsed = false;
 };
 
-// With a rehearsal before the run no tool is made to fail: that could not be foreseen.
+// With a rehearsal before the run no tool is made to fail: that could not be foreseen. One in four
+// of these machines has an array to destroy, which the model knows nothing of.
 PLAN PlanMake(std::uint64_t seed, bool fRehearsed);
+
+bool PlanDestroys(const PLAN &plan);
 
 // The plan in the words of the script that carries it out.
 std::string PlanScript(const PLAN &plan);

@@ -195,6 +195,9 @@ string Head(const PLAN &plan, const RECORD &record)
 // So many machines have to be compared with what was rehearsed on them.
 constexpr u64 COMPARED_MIN = 60;
 constexpr char COMPARED[] = "enough machines on which no command failed";
+constexpr std::pair<const char *, u64> COMMANDS_MIN[] = {
+    {"initsys", 6}, {"initsys-dd", 4}, {"newvol", 10}, {"enumformatalldisks", 6}, {"destroy", 12},
+};
 
 constexpr int STATUS_CLEAN = 0;
 constexpr int STATUS_WARNED = 3;
@@ -218,8 +221,37 @@ void RehearsalCompare(const string &szFolder, RECORD &record, vector<string> &di
     }
 }
 
-// Whether no command failed.
-bool MachineCompare(u64 seed, const string &szRecords, bool fRehearsed)
+// Whether the array that is to be taken apart runs.
+bool HasArray(const PLAN &plan)
+{
+    return PlanDestroys(plan) &&
+           std::any_of(plan.arrays.begin(), plan.arrays.end(), [&](const PLAN_ARRAY &array) {
+               return array.fRunning && to_string(array.nMd) == plan.subject.words[1];
+           });
+}
+
+// A run that was to take an array apart has to have come so far as to stop it.
+void DestroyCompare(const PLAN &plan, const RECORD &record, vector<string> &differences)
+{
+    const ORACLE_WORDS stop = {ORACLE_MDADM, "-S", "/dev/md" + plan.subject.words[1]};
+    const auto &commands = record.seen.commands;
+    const bool fStopped = std::find(commands.begin(), commands.end(), stop) != commands.end();
+    if (HasArray(plan) != fStopped) {
+        differences.push_back(string("what was done to the array: it was ") +
+                              (fStopped ? "stopped, and did not run\n" : "not stopped\n"));
+    }
+    differences.insert(differences.end(), record.seen.problems.begin(), record.seen.problems.end());
+}
+
+void ModelCompare(const ORACLE_CASE &subject, const RECORD &record, vector<string> &differences)
+{
+    const vector<string> others =
+        OracleDifferences(OracleAnswers(subject.machine, subject.words), record.seen);
+    differences.insert(differences.end(), others.begin(), others.end());
+}
+
+// What the machine proves: its command when nothing of that failed, else an empty text.
+string MachineCompare(u64 seed, const string &szRecords, bool fRehearsed)
 {
     const string szFolder = szRecords + "/" + to_string(seed);
     const PLAN plan = PlanMake(seed, fRehearsed);
@@ -230,9 +262,11 @@ bool MachineCompare(u64 seed, const string &szRecords, bool fRehearsed)
     }
     ORACLE_CASE subject = plan.subject;
     subject.machine = record.machine;
-    const vector<string> others =
-        OracleDifferences(OracleAnswers(subject.machine, subject.words), record.seen);
-    differences.insert(differences.end(), others.begin(), others.end());
+    if (PlanDestroys(plan)) {
+        DestroyCompare(plan, record, differences);
+    } else {
+        ModelCompare(subject, record, differences);
+    }
     SetUpCheck(plan, record, differences);
     string szText = differences.empty() ? "" : OracleCaseText(subject);
     for (const string &szDifference : differences) {
@@ -241,18 +275,28 @@ bool MachineCompare(u64 seed, const string &szRecords, bool fRehearsed)
     const string szFailed = record.szFailed.empty() ? "" : ", failed: " + record.szFailed;
     VerdictTell("seed " + to_string(seed), szText,
                 Head(plan, record) + (fRehearsed ? szFailed : ""));
-    return record.szFailed.empty();
+    return !record.szFailed.empty()                ? ""
+           : PlanDestroys(plan) && !HasArray(plan) ? "destroy of nothing"
+                                                   : plan.subject.words[0];
+}
+
+void EnoughTell(const string &szName, u64 nSeen, u64 nMin)
+{
+    const string szSeen = to_string(nSeen) + " machines";
+    VerdictTell(szName, nSeen < nMin ? szSeen + "\n" : "", szSeen);
 }
 
 int CompareAll(u64 first, u64 count, const string &szRecords, bool fRehearsed)
 {
-    u64 nCompared = 0;
+    std::map<string, u64> compared;
     for (u64 seed = first; seed < first + count; seed++) {
-        nCompared += MachineCompare(seed, szRecords, fRehearsed) ? 1 : 0;
+        compared[MachineCompare(seed, szRecords, fRehearsed)]++;
     }
     if (fRehearsed && count >= COMPARED_MIN) {
-        const string szCompared = to_string(nCompared) + " of " + to_string(count) + " machines";
-        VerdictTell(COMPARED, nCompared < COMPARED_MIN ? szCompared + "\n" : "", szCompared);
+        EnoughTell(COMPARED, count - compared[""], COMPARED_MIN);
+        for (const auto &[szCommand, nMin] : COMMANDS_MIN) {
+            EnoughTell("enough of these for " + string(szCommand), compared[szCommand], nMin);
+        }
     }
     return EXIT_SUCCESS;
 }
