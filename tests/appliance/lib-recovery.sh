@@ -16,6 +16,29 @@ STAYED=/tmp/stayed
 RAN=/tmp/ran
 ALL='sda sdb sdc sdd'
 
+# Older layouts, with the data partitions that belong to them.
+LAYOUT_1='1 63 1574307 fd
+2 1574370 787185 fd'
+WHOLE_1="$LAYOUT_1
+3 2634660 6933596 fd"
+LAYOUT_2='1 63 4980087 fd
+2 4980150 1044225 fd'
+WHOLE_2="$LAYOUT_2
+3 6281415 3286841 fd"
+
+# Of machines without RAID: layout, first and length of the system, the swap and the data partition.
+PLAIN='1 63 273042 273105 787185 1333332 8234924
+2 63 4980087 4980150 1044225 6281415 3286841
+3 63 530082 530145 787185 1333332 8234924
+5 63 722862 722925 594405 1333332 8234924
+6 63 4980087 4980150 4192965 9430155 138101
+7 256 4980480 4980736 4194304 9437184 131072
+8 2048 4980480 4982528 4194304 9437184 131072'
+
+plain_of() { # LAYOUT
+    echo "$PLAIN" | awk -v layout="$1" '$1 == layout { print 1, $2, $3, 83; print 2, $4, $5, 82; print 3, $6, $7, 83 }'
+}
+
 # --- the page --------------------------------------------------------------------------------------
 
 # block_of ROW KIND: a fenced block of a row, or, with "-", of the page.
@@ -94,6 +117,19 @@ with() {
     done >/tmp/set
 }
 
+# numbers LAYOUT MACHINE: the same, from a line of the page of the layouts.
+numbers() {
+    set -- $(grep "^| $1 | $2 |" /appliance/layouts.md | sed "s/^| $1 | $2 |//" | tr -d '|')
+    [ $# = 8 ] || abort "docs/layouts.md has no such line"
+    printf '%s\n' START="$1" SYSTEM="$2" TYPE="$3" SWAP="$5" SWAP_TYPE="$6" DATA="$7" >>/tmp/set
+}
+
+# with_disks [DISK...]: and these, or all.
+with_disks() {
+    [ $# -gt 0 ] || set -- $ALL
+    printf '%s\n' "DISKS='$(printf '/dev/%s ' "$@")'" "MEMBERS='$(printf '/dev/%s3 ' $ALL)'" >>/tmp/set
+}
+
 # --- cuts ------------------------------------------------------------------------------------------
 
 # Under the names of the programs that change disks lies a script that can stay before or behind the
@@ -121,6 +157,12 @@ stay() {
     esac
 }
 stay before
+if [ -e /tmp/fails ] && read -r pattern </tmp/fails; then
+    # shellcheck disable=SC2254  # a pattern
+    case $line in
+    $pattern) exit 1 ;;
+    esac
+fi
 "/real/${0##*/}" "$@"
 status=$?
 echo "$line" >>/tmp/ran
@@ -256,8 +298,8 @@ with_partitions() {
 }
 
 with_system_arrays() {
-    array 0 '-e 0.9 -l 1' sda1 sdb1 sdc1 sdd1
-    array 1 '-e 0.9 -l 1' sda2 sdb2 sdc2 sdd2
+    array 0 '-e 0.9 -l 1 --force' $(printf '%s1 ' $ALL)
+    array 1 '-e 0.9 -l 1 --force' $(printf '%s2 ' $ALL)
     settle 0 1
     stop_arrays 0 1
 }
@@ -297,13 +339,23 @@ put_back() {
     done
 }
 
+data_members() {
+    printf '%s3 ' $ALL
+}
+
+# What newvol would give that many disks.
+data_level() {
+    [ "$(echo $ALL | wc -w)" -gt 2 ] && echo 5 || echo 1
+}
+
 # with_data TABLE: a machine in order that has been switched off, and what is on its array.
 with_data() {
-    name=$(echo "$1" | md5sum | cut -c1-8)
+    name=$(echo "$1 $ALL" | md5sum | cut -c1-8)
     if [ ! -d "/tmp/kept.$name" ]; then
         with_partitions "$1"
         with_system_arrays
-        make_array 2 -l 5 -n 4 --assume-clean --size=16384 $(nodes sda3 sdb3 sdc3 sdd3)
+        make_array 2 -l "$(data_level)" -n "$(echo $ALL | wc -w)" --force --assume-clean --size=16384 \
+            $(nodes $(data_members))
         store_data md2
         repair 2
         settle 2
@@ -313,6 +365,15 @@ with_data() {
     fi
     put_back "$name"
     cp "/tmp/before.$name" /tmp/before
+}
+
+# lose_system TABLE: row 1 on all disks.
+lose_system() {
+    with_data "$1"
+    cut_at before 'sfdisk -N1 *' "$(echo $ALL | wc -w)" '' 0 initsys
+    forget
+    block_of - 'sh look' >/tmp/look
+    check 'partition 3 alone' [ "$(sh /tmp/look | grep -c '^sd. 3:md2$')" = "$(echo $ALL | wc -w)" ]
 }
 
 # with_volume: the same with a volume on an array that newvol has made; the array runs.
@@ -380,7 +441,7 @@ parity_is_right() {
 
 # check_data: the array runs, not a byte of it is another one, and its parity is right.
 check_data() {
-    check 'the data array' array_is 2 raid5 1.2 sda3 sdb3 sdc3 sdd3
+    check 'the data array' array_is 2 "raid$(data_level)" 1.2 $(data_members)
     picture md2 >/tmp/now
     check 'every byte of it' cmp /tmp/before /tmp/now
     check 'its files' data_is_whole md2
@@ -388,7 +449,21 @@ check_data() {
 }
 
 assembles() {
-    mdadm -A -R /dev/md2 $(nodes sda3 sdb3 sdc3 sdd3)
+    mdadm -A -R /dev/md2 $(nodes $(data_members))
+}
+
+# check_found SECTOR: what the page finds without a partition is where the data begins.
+check_found() {
+    block_of - 'sh begin' >/tmp/begin
+    check 'where it begins' [ "$(sh /tmp/begin)" = "$1" ]
+}
+
+# check_way_back TABLE: the data is back, where it was.
+check_way_back() {
+    check_tables "$1" $ALL
+    [ -e /sys/block/md2 ] || check 'assembles' assembles
+    check_data
+    forget
 }
 
 # check_whole TABLE: the way back has ended in a machine in order.

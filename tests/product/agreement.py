@@ -248,16 +248,66 @@ def case_every_row_of_recovery_is_tested():
 def case_what_the_tests_of_recovery_type_is_the_page():
     typed = set()
     for body, row, line in verdicts_of_recovery():
-        ways = {(int(number), kind) for number, kind in re.findall(r"^ *way_back (\d+) ?(\w*)", body, re.M)}
+        ways = {(int(number), kind) for number, kinds in re.findall(r"^ *way_back (\d+) ?(\$?\w*)", body, re.M)
+                for kind in (("", "stock") if kinds == "$kind" else (kinds,))}
         assert all(number == row for number, _ in ways), f"{line} types another row's block"
         assert row is None or ways or "```sh" not in rows_of_recovery()[row], f"{line} types nothing"
         typed |= ways
     told = {(row, kind) for row, text in rows_of_recovery().items()
             for kind in re.findall(r"^```sh ?(\w*)$", text.split("\n## ")[0], re.M)}
     verdict.same(typed, told, "blocks of docs/recovery.md")
+    for row, text in rows_of_recovery().items():
+        blocks = dict(re.findall(r"^```sh ?(\w*)\n(.*?)^```", text.split("\n## ")[0], re.S | re.M))
+        assert ("sfdisk" in blocks.get("", "")) == ("stock" in blocks), f"row {row} for which partitioner?"
     shown = {row for row, text in rows_of_recovery().items() if "```text\n" in text}
     seen = {row for body, row, _ in verdicts_of_recovery() if re.search(rf"looks_like {row}\b", body)}
     verdict.same(seen & shown, shown, "what one sees")
+
+
+def numbers_of_layouts():
+    """{(version, machine): where swap ends and where data begins} of docs/layouts.md."""
+    lines = re.findall(r"^\| (\d) \| ([^|]*) \| (.*) \|$", read("docs/layouts.md"), re.M)
+    cells = {(version, machine): line.split(" | ") for version, machine, line in lines}
+    return {which: (int(line[3]) + int(line[4]), int(line[6])) for which, line in cells.items()}
+
+
+def layouts_typed():
+    """{(version, machine): rows} whose block was typed with the numbers of that line."""
+    typed = {}
+    for path in sorted(glob.glob("tests/appliance/cases/recovery*.sh", root_dir=ROOT)):
+        versions, which = (), [("8", "RAID")]
+        for line in read(path).split("\n"):
+            versions = line[len("for layout in "):-len("; do")].split() if line.startswith("for layout in ") else versions
+            told = re.fullmatch(r""" *numbers (\d|"\$layout") (?:(RAID)|'(.*)')""", line)
+            if told:
+                asked = versions if told.group(1).startswith('"') else told.group(1)
+                which = [(version, told.group(2) or told.group(3)) for version in asked]
+            way = re.match(r" *way_back (\d+)", line)
+            for layout in which if way else ():
+                typed.setdefault(layout, set()).add(int(way.group(1)))
+            which = [("8", "RAID")] if way else which
+    return typed
+
+
+def case_what_the_tests_of_recovery_type_has_the_numbers_of_every_layout():
+    numbers, typed = numbers_of_layouts(), layouts_typed()
+    newest = {machine: numbers[version, machine][0] for version, machine in numbers if version == "8"}
+    for (version, machine), (_, data) in numbers.items():
+        # Built-in storage has the same numbers twice; there, partitions are where they were.
+        rows = typed.get(("8" if machine == "built-in storage" else version, machine), set())
+        # Every run wipes it, so that partition 3 is never alone.
+        assert (1 in rows) == ((version, machine) != ("1", "RAID")), f"row 1, layout {version}, {machine}: {rows}"
+        assert (3 in rows) == (data < newest[machine]), f"row 3, layout {version}, {machine}: {rows}"
+        assert rows & {2, 3}, f"row 2 or 3, layout {version}, {machine}: {rows}"
+
+
+def case_recovery_looks_where_data_begins_in_any_layout():
+    numbers = numbers_of_layouts()
+    gap = {machine: data - end for (version, machine), (end, data) in numbers.items() if version == "8"}
+    expected = {data for _, data in numbers.values()}
+    expected |= {end + gap[machine] for (_, machine), (end, _) in numbers.items()}
+    told = re.search(r"^for data in ([\d ]+); do$", read("docs/recovery.md"), re.M).group(1)
+    verdict.same([int(number) for number in told.split()], sorted(expected), "docs/recovery.md")
 
 
 verdict.cases(globals(), "".join(sys.argv[2:3]))
