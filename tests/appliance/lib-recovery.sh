@@ -64,35 +64,7 @@ looks_like() {
 # row_seen COMMAND data|blank: the row of what one sees behind a reboot, "ended" for a run that had come to
 # its end, and nothing for a state that the page does not have.
 row_seen() {
-    awk -v ran="$1" -v had="$2" '
-        /^sd/ {
-            disks++
-            parts = ""
-            for (i = 2; i <= NF; i++) parts = parts substr($i, 1, 1)
-            count[parts]++
-            if (/3:md2/) data++
-        }
-        function row() {
-            if (ran == "initsys" && had == "data") {
-                if (data < disks) return 0
-                if (count["3"] > 0 && count["3"] + count["13"] + count["123"] == disks) return 1
-                if (count["13"] > 0 && count["13"] + count["123"] == disks) return 4
-                return count["123"] == disks ? 5 : 0
-            }
-            if (ran == "initsys") {
-                if (count[""] + count["1"] + count["12"] != disks) return 0
-                if (count["12"] == disks) return 5
-                return count["1"] > 0 && count["12"] > 0 ? 6 : 7
-            }
-            if (ran == "newvol") return count["12"] + count["123"] == disks ? 9 : 0
-            if (count["123"] != disks) return 0
-            return data == disks ? 11 : data == disks - 1 ? 12 : data > 0 ? 13 : -1
-        }
-        END {
-            number = row()
-            if (number > 0) print "row " number
-            if (number < 0) print "ended"
-        }'
+    awk -v ran="$1" -v had="$2" -f /appliance/rows.awk
 }
 
 # way_back ROW [KIND]: typed as it stands, behind what has to be set.
@@ -156,6 +128,21 @@ stay() {
         ;;
     esac
 }
+# Killed before it enters the kernel for the N-th time with this call.
+run() {
+    if [ -d /tmp/calls ]; then
+        echo "$line" >"/tmp/calls/$$.line"
+        strace -q -o "/tmp/calls/$$.calls" -e signal=none -e trace=write,pwrite64,ioctl,fsync,fdatasync "$@"
+        return
+    fi
+    pattern=
+    [ ! -e /tmp/cut ] || read -r call number pattern </tmp/cut
+    # shellcheck disable=SC2254  # a pattern
+    case $line in
+    $pattern) strace -q -o /dev/null -e signal=none -e trace="$call" -e inject="$call:signal=KILL:when=$number" "$@" ;;
+    *) "$@" ;;
+    esac
+}
 stay before
 if [ -e /tmp/fails ] && read -r pattern </tmp/fails; then
     # shellcheck disable=SC2254  # a pattern
@@ -163,9 +150,10 @@ if [ -e /tmp/fails ] && read -r pattern </tmp/fails; then
     $pattern) exit 1 ;;
     esac
 fi
-"/real/${0##*/}" "$@"
+run "/real/${0##*/}" "$@"
 status=$?
 echo "$line" >>/tmp/ran
+[ "$status" != 137 ] || echo "$line" >>/tmp/killed
 stay behind
 exit "$status"
 SCRIPT
@@ -185,8 +173,13 @@ count_of() { # PATTERN FILE
     grep -c -- "$1" "$2"
 }
 
+# Many ask for one line of any kind, or for none, and these ask often.
 counts() { # COUNT PATTERN FILE
-    [ "$(count_of "$2" "$3")" -ge "$1" ]
+    case $1$2 in
+    0*) ;;
+    1) [ -s "$3" ] ;;
+    *) [ "$(count_of "$2" "$3")" -ge "$1" ] ;;
+    esac
 }
 
 is_quiet() {
@@ -199,6 +192,7 @@ starts() {
     : >"$STAYED"
     : >"$RAN"
     setsid sh -c "echo \$\$ >$PID; exec $AWAKE/arrayctl $*" >/tmp/run.out 2>&1 &
+    started=$!
     await test -s "$PID"
 }
 
@@ -239,6 +233,17 @@ cut_at() {
     end_all
 }
 
+# cut_inside CALL N PATTERN COMMAND...: all of it is killed where a program that the tool has started is about
+# to enter the kernel for the N-th time with this call.
+cut_inside() {
+    echo "$1 $2 $3" >/tmp/cut
+    pattern=$3
+    shift 3
+    holds_at behind "$pattern" 1 '' 0 "$@"
+    end_all
+    rm -f /tmp/cut
+}
+
 # All at once: nobody sees another one end.
 end_all() {
     cut_off=$(tree_of "$(cat "$PID")")
@@ -258,14 +263,32 @@ beside() {
 # goes_on: the one that was held comes to its end.
 goes_on() {
     rm -f /tmp/stay.*
-    wait
+    wait "$started"
+    held_status=$?
+}
+
+# The whole machine stops where it is: nothing is written out, told or ended. The runner is told first, as
+# nobody could afterwards; it ends instead of starting anew.
+power_goes() {
+    echo end
+    for port in /sys/class/virtio-ports/*; do
+        [ "$(cat "$port/name")" != status ] || echo "exit 0 $(cut -d' ' -f1 /proc/uptime)" >"/dev/${port##*/}"
+    done
+    echo b >/proc/sysrq-trigger
+    sleep 1000000
+}
+
+has_volumes() {
+    ls -d /sys/block/dm-* >/dev/null 2>&1
 }
 
 # The driver and LVM have forgotten all, as after a reboot.
 forget() {
-    for group in $(vgs --noheadings -o vg_name 2>/dev/null); do
-        must vgchange -q -an "$group"
-    done
+    if has_volumes; then
+        for group in $(vgs --noheadings -o vg_name 2>/dev/null); do
+            must vgchange -q -an "$group"
+        done
+    fi
     for number in $(arrays_known); do
         stop_arrays "$number"
     done

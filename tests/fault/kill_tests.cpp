@@ -1,7 +1,8 @@
 // SPDX-License-Identifier: MIT
 //
-// Kills the tool at every system call of every command that changes something, runs the command
-// again, and compares what the machine is like with what an undisturbed run makes of it.
+// Kills the tool at every system call of every command that changes something, looks which row of
+// the page of recovery has what it leaves, runs the command again, and compares what the machine is
+// like with what an undisturbed run makes of it.
 //
 //     kill_tests [--all] [--every N] [--minimum FILE] [FILTER]
 //
@@ -217,6 +218,7 @@ struct KILL_CASE {
     string szName;
     MACHINE machine;
     STRINGS words;
+    const char *szHad; // "data" or "blank": what its disks were; none where nothing is changed
     std::vector<LEFT_OTHERWISE> allowed = {};
 };
 
@@ -237,23 +239,30 @@ std::vector<KILL_CASE> CasesMake()
 {
     const string szOneSlot = string(CONF_RAID) + "max_sys_raid_disks=\"1\"\n";
     return {
-        {"status: an array", WithDataArray(), {"status", "2"}},
-        {"destroy: an array", WithDataArray(), {"destroy", "2"}, {STOPPED_BEFORE_WIPED}},
-        {"destroy: a mounted volume", WithVolume(), {"destroy", "2"}, {STOPPED_BEFORE_WIPED}},
-        {"newvol: two disks", WithDataDisks(), {"newvol"}},
+        {"status: an array", WithDataArray(), {"status", "2"}, nullptr},
+        {"destroy: an array", WithDataArray(), {"destroy", "2"}, "data", {STOPPED_BEFORE_WIPED}},
+        {"destroy: a mounted volume",
+         WithVolume(),
+         {"destroy", "2"},
+         "data",
+         {STOPPED_BEFORE_WIPED}},
+        {"newvol: two disks", WithDataDisks(), {"newvol"}, "data"},
         {"initsys: blank disks",
          WithBlankDisks(CONF_RAID, {"sda", "sdb"}),
          {"initsys"},
+         "blank",
          {LEFT_HALF_RENEWED}},
         {"initsys: disks that keep their data",
          WithDataDisks(),
          {"initsys"},
+         "data",
          {WIPED_HALF_RENEWED, LEFT_HALF_RENEWED}},
         {"initsys: more disks than slots",
          WithBlankDisks(szOneSlot, {"sda", "sdb"}),
          {"initsys"},
+         "blank",
          {LEFT_HALF_RENEWED, SLOT_TAKEN}},
-        {"initsys-dd: one disk", WithBlankDisks(CONF_RAID, {"sda"}), {"initsys-dd"}},
+        {"initsys-dd: one disk", WithBlankDisks(CONF_RAID, {"sda"}), {"initsys-dd"}, "blank"},
     };
 }
 
@@ -292,6 +301,72 @@ const LEFT_OTHERWISE *RowOf(const KILL_CASE &subject, const string &szLine, bool
         }
     }
     return nullptr;
+}
+
+// ---- the rows of the page of recovery -----------------------------------------------------------
+
+// What the page's block prints of these disks behind a reboot.
+string LookTake()
+{
+    const fs::path blocks = fs::path(PrivateRootFolder()) / "sys/block";
+    string szLook;
+    for (const string szDisk : {"sda", "sdb"}) {
+        if (!fs::exists(blocks / szDisk)) {
+            continue;
+        }
+        szLook += szDisk;
+        for (const char *const szPart : {"1", "2", "3"}) {
+            const string szName = szDisk + szPart;
+            if (fs::exists(blocks / szDisk / szName / "start")) {
+                const string szArray = MachineFileRead(Superblock(szName)).value_or("");
+                szLook += string(" ") + szPart + ":" +
+                          (szArray.empty() ? "-" : "md" + szArray.substr(0, szArray.find('\n')));
+            }
+        }
+        szLook += "\n";
+    }
+    return szLook;
+}
+
+// "row N" or "ended" by the rules that the cases on real disks go by.
+string RowByRules(const KILL_CASE &subject, const string &szLook)
+{
+    const string &szCommand = subject.words.front();
+    const string szLine = "printf '%s' '" + szLook +
+                          "' | awk -v ran=" + szCommand.substr(0, szCommand.find('-')) +
+                          " -v had=" + subject.szHad + " -f " ROWS_OF_PAGE;
+    char szRow[16] = "";
+    FILE *const pRules = popen(szLine.c_str(), "r");
+    const bool fRead = pRules != nullptr && fgets(szRow, sizeof(szRow), pRules) != nullptr;
+    const bool fEnded = pRules != nullptr && pclose(pRules) == 0;
+    return fRead && fEnded ? string(szRow).substr(0, strcspn(szRow, "\n")) : "";
+}
+
+bool PageHas(const string &szRow)
+{
+    static const string szPage = FileText(RECOVERY_PAGE).value_or("");
+    return szRow == "ended" ||
+           (szRow.starts_with("row ") &&
+            szPage.find("\n### Row " + szRow.substr(strlen("row ")) + ":") != string::npos);
+}
+
+// What a kill leaves has to have a row, as a machine that is switched off then comes up with it.
+void RowLook(const KILL_CASE &subject, TALLY &tally)
+{
+    static std::map<string, string> rows; // a few, for thousands of kills
+    if (subject.szHad == nullptr) {
+        return;
+    }
+    const string szLook = LookTake();
+    const string szKey = subject.szName + szLook;
+    if (!rows.contains(szKey)) {
+        rows[szKey] = RowByRules(subject, szLook);
+    }
+    if (PageHas(rows[szKey])) {
+        tally.allowed[subject.szName + ": a kill leaves " + rows[szKey]]++;
+    } else {
+        tally.wrong.push_back(subject.szName + ": a kill leaves what no row has\n" + szLook);
+    }
 }
 
 // ---- one case ----------------------------------------------------------------------------------
@@ -372,6 +447,7 @@ void StateCompare(const KILL_CASE &subject, const POINT &point, const STRINGS &e
 void PointTry(const KILL_CASE &subject, const POINT &point, const STRINGS &expected, TALLY &tally)
 {
     const RUN_RESULT killed = SteppedRun(subject, point);
+    RowLook(subject, tally);
     const RUN_RESULT again = MachineTryAgain(subject.machine, subject.words);
     tally.done++;
     if (killed.fTimedOut || again.fTimedOut || again.signal != 0) {

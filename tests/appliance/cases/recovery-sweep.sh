@@ -1,14 +1,16 @@
 #!/bin/sh
 # SPDX-License-Identifier: MIT
-# The tool is cut off before and behind each of the commands that it runs, on the first, a middle and the
-# last disk, and at random moments: every state is a row of the page of recovery.
+# The tool is cut off before and behind each of the commands that it runs, on the first, the middle and the
+# last disk, inside the partitioner and mdadm, between what they ask of the kernel, and at random moments:
+# every state is a row of the page of recovery.
 # alone: yes
-# disks: 4
+# disks: 3
 # size: 4672M
 # shellcheck disable=SC2046,SC2086,SC2154,SC2317  # lists of words; check must call the functions
 # shellcheck source=SCRIPTDIR/../lib-recovery.sh
 . /appliance/lib-recovery.sh
-RANDOM_CUTS=60
+ALL='sda sdb sdc'
+RANDOM_CUTS=15
 plan 5
 
 begin_initsys_data() {
@@ -47,8 +49,13 @@ now() { # hundredths of a second
     tr -d . </proc/uptime | cut -d' ' -f1
 }
 
-# The commands of a whole run, those of a disk on the first, a middle and the last one.
-commands_of() { # COMMAND data|blank
+# The commands among them, and no questions.
+that_change() {
+    grep -v '^pvs\|^mdadm -[DE]\|^sfdisk -l' "$1"
+}
+
+# whole_run COMMAND data|blank
+whole_run() {
     "begin_$1_$2"
     rm -f /tmp/stay.*
     begin=$(now)
@@ -56,7 +63,22 @@ commands_of() { # COMMAND data|blank
     wait
     echo $(($(now) - begin + 1)) >/tmp/length
     await is_quiet
-    grep -v '/dev/sdc[0-9]*$' "$RAN" | grep -v '^pvs\|^mdadm -D' | sort -u
+}
+
+# "CALL N COMMAND LINE" for all that the partitioner and mdadm have the kernel change.
+calls_of() { # COMMAND data|blank
+    mkdir /tmp/calls
+    whole_run "$1" "$2"
+    for line in /tmp/calls/*.line; do
+        that_change "$line" | grep '^sfdisk\|^mdadm' >/tmp/line || continue
+        awk -v line="$(cat /tmp/line)" '/^[a-z0-9_]*\(/ {
+            call = substr($0, 1, index($0, "(") - 1)
+            count[call]++
+            changes = /BLKPG/ && line ~ /^sfdisk/ || /_ARRAY|_DISK/ && !/GET_/
+            if (call != "ioctl" || changes) print call, count[call], line
+        }' "${line%.line}.calls"
+    done
+    rm -rf /tmp/calls
 }
 
 words_of() {
@@ -66,20 +88,41 @@ words_of() {
 # Nobody takes it for one that hangs.
 count_cut() {
     cuts=$((cuts + 1))
-    echo "$cuts cuts by now"
+    echo "cut $cuts: $1 $2, $row"
 }
 
-# sweep COMMAND data|blank
-sweep() {
-    commands_of "$1" "$2" >"/tmp/commands.$1.$2"
+# around COMMAND data|blank: before and behind each command.
+around() {
+    whole_run "$1" "$2"
+    that_change "$RAN" | sort -u >/tmp/commands
     while read -r line <&3; do
         for place in before behind; do
             "begin_$1_$2"
             cut_at "$place" "$line" 1 '' 0 $(words_of "$1")
             check "cut $place $line" named "$1" "$2"
-            count_cut
+            count_cut "$1" "$2"
         done
-    done 3<"/tmp/commands.$1.$2"
+    done 3</tmp/commands
+}
+
+# inside CUTS COMMAND data|blank: where a program is about to change something, or has just done so.
+inside() {
+    count=$1
+    shift
+    calls_of "$1" "$2" | shuf -n "$count" >/tmp/points
+    : >/tmp/killed
+    while read -r call number line <&3; do
+        "begin_$1_$2"
+        cut_inside "$call" "$number" "$line" $(words_of "$1")
+        check "cut at $call $number of $line" named "$1" "$2"
+        count_cut "$1" "$2"
+    done 3</tmp/points
+    # What a program asks differs a little from run to run.
+    check 'they were killed' [ $(($(wc -l </tmp/killed) * 3)) -ge $(($(wc -l </tmp/points) * 2)) ]
+}
+
+# at_random COMMAND data|blank
+at_random() {
     length=$(cat /tmp/length)
     for _ in $(seq "$RANDOM_CUTS"); do
         "begin_$1_$2"
@@ -87,24 +130,32 @@ sweep() {
         starts $(words_of "$1")
         usleep $((moment * 10000))
         end_all
-        check "cut at a random moment" named "$1" "$2"
-        count_cut
+        check 'cut at a random moment' named "$1" "$2"
+        count_cut "$1" "$2"
     done
+}
+
+# sweep COMMAND data|blank INSIDE
+sweep() {
+    around "$1" "$2"
+    at_random "$1" "$2"
+    inside "$3" "$1" "$2"
     verdict "every cut of $1, $2, ends in a row of the page"
 }
 
-block_of - 'sh look' >/tmp/look
+# Which disks would be wiped follows from their partitions, and takes the tool's time.
+block_of - 'sh look' | sed '/^echo format:/d' >/tmp/look
 slow_resync
-bays 0xf
+bays 0x7
 stand_in
 keep blank "$WHOLE_8"
 
 cuts=0
 : >/tmp/rows
-sweep initsys data
-sweep initsys blank
-sweep newvol data
-sweep destroy data
+sweep initsys data 45
+sweep initsys blank 25
+sweep newvol data 80
+sweep destroy data 80
 
 sort /tmp/rows | uniq -c
 check 'all states were looked at' [ "$(wc -l </tmp/rows)" = "$cuts" ]
