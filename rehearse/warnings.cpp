@@ -129,7 +129,7 @@ bool HasWholeTwin(const INVENTORY &inventory, const PARTITION &system)
     });
 }
 
-// initsys leaves such a disk out and ends with 0.
+// initsys leaves such a disk out and ends with 0, but where it knows no disk's layout.
 void HalfMadeFind(const SCENE &scene, SENTENCES &found)
 {
     if (scene.options.words.empty() || scene.options.words[0].rfind("initsys", 0) != 0) {
@@ -138,6 +138,7 @@ void HalfMadeFind(const SCENE &scene, SENTENCES &found)
     for (const DISK_OUTCOME &outcome : scene.outcome.disks) {
         const PARTITION *const pSystem = PartitionFind(*outcome.pDisk, 1);
         if (!outcome.fAsked || pSystem == nullptr ||
+            IsOneOf(outcome.taken, pSystem->device.szPath) ||
             PartitionFind(*outcome.pDisk, LAST_SYSTEM_PARTITION) != nullptr ||
             !HasWholeTwin(scene.inventory, *pSystem)) {
             continue;

@@ -282,6 +282,22 @@ has_volumes() {
     ls -d /sys/block/dm-* >/dev/null 2>&1
 }
 
+# with_failing PATTERN COMMAND...: each call of this pattern ends with 1 and does nothing.
+with_failing() {
+    echo "$1" >/tmp/fails
+    shift
+    "$@"
+    ended=$?
+    rm /tmp/fails
+    return "$ended"
+}
+
+# What the page shows, in a file.
+seen() {
+    sh /tmp/look >"$SEEN" 2>/dev/null
+    echo "$SEEN"
+}
+
 # The driver and LVM have forgotten all, as after a reboot.
 forget() {
     if has_volumes; then

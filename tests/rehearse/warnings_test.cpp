@@ -104,6 +104,11 @@ TEST(Warnings, CutOffBetweenItsPartitions)
               "cut-off: /dev/sdb has partition 1 without 2 and is left out: it looks like a run "
               "that was cut off: recovery.md, row 4\n");
     EXPECT_EQ(Said(inventory, run, {"newvol"}), "");
+    // Where no layout has RAID, all disks are made anew.
+    const RUN mending =
+        RunOf({"/sbin/sfdisk --fast-delete 1:2 /dev/sda", "/sbin/sfdisk -M1 /dev/sda",
+               "/sbin/sfdisk --fast-delete 1:2 /dev/sdb", "/sbin/sfdisk -M1 /dev/sdb"});
+    EXPECT_EQ(Said(inventory, mending, {"initsys"}), "");
     inventory.disks[1].partitions.pop_back();
     EXPECT_EQ(Said(inventory, run, {"initsys-dd"}),
               "cut-off: /dev/sdb has partition 1 without 2 and is left out: it looks like a run "
