@@ -105,8 +105,9 @@ int ChildRun(const OPTIONS &options, const HOST &host, int fdWatcher)
         return STATUS_NOT_REHEARSED;
     }
     const int status = Rehearse(options, host);
-    if (fflush(stdout) != 0) {
-        (void)ComplainErrno("cannot print the rehearsal");
+    // The last of it may find room where what went before it did not.
+    if (fflush(stdout) != 0 || ferror(stdout) != 0) {
+        (void)Complain("cannot print the rehearsal: its output cannot be written");
         return STATUS_NOT_REHEARSED;
     }
     return status;

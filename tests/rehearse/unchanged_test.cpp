@@ -36,7 +36,7 @@ MACHINE MachineWithOwnTool(const std::string &szScript)
 }
 
 // Rehearses the machine's own tool; before and behind that the machine looks the same.
-RUN_RESULT Unchanged(MACHINE machine)
+RUN_RESULT Unchanged(MACHINE machine, const std::string &szForm = "--commands")
 {
     const std::function<void()> prepare = std::move(machine.prepare);
     machine.prepare = {};
@@ -44,7 +44,7 @@ RUN_RESULT Unchanged(MACHINE machine)
     const std::vector<std::string> before = RehearsalPicture();
     machine.prepare = prepare;
     RUN_RESULT result = MachineTryOtherAgain(
-        machine, RehearsalWords({"--tool", REHEARSAL_OWN_TOOL, "--commands", "any"}));
+        machine, RehearsalWords({"--tool", REHEARSAL_OWN_TOOL, szForm, "any"}));
     EXPECT_EQ(RehearsalDifference(before, RehearsalPicture()), "");
     EXPECT_EQ(result.nUnreaped + result.nRunning, 0);
     EXPECT_EQ(LogText(result), "");
@@ -54,19 +54,38 @@ RUN_RESULT Unchanged(MACHINE machine)
 // ---- what the kernel or a container refuses
 // ------------------------------------------------------
 
-// From here on this call fails in this process and all that it becomes.
-void CallRefuse(long number, int error)
+using FILTER = std::vector<sock_filter>;
+
+// From here on the calls that the filter does not jump over fail in this process and all that it
+// becomes. The last of its instructions jumps over one more.
+void CallsRefuse(FILTER filter, int error)
 {
-    std::array<sock_filter, 4> filter = {{
-        BPF_STMT(BPF_LD | BPF_W | BPF_ABS, offsetof(seccomp_data, nr)),
-        BPF_JUMP(BPF_JMP | BPF_JEQ | BPF_K, static_cast<unsigned int>(number), 0, 1),
-        BPF_STMT(BPF_RET | BPF_K, SECCOMP_RET_ERRNO | static_cast<unsigned int>(error)),
-        BPF_STMT(BPF_RET | BPF_K, SECCOMP_RET_ALLOW),
-    }};
-    const sock_fprog program = {.len = filter.size(), .filter = filter.data()};
+    filter.push_back(
+        BPF_STMT(BPF_RET | BPF_K, SECCOMP_RET_ERRNO | static_cast<unsigned int>(error)));
+    filter.push_back(BPF_STMT(BPF_RET | BPF_K, SECCOMP_RET_ALLOW));
+    const sock_fprog program = {.len = static_cast<unsigned short>(filter.size()),
+                                .filter = filter.data()};
     if (prctl(PR_SET_SECCOMP, SECCOMP_MODE_FILTER, &program) != 0) {
         _exit(1);
     }
+}
+
+void CallRefuse(long number, int error)
+{
+    CallsRefuse({BPF_STMT(BPF_LD | BPF_W | BPF_ABS, offsetof(seccomp_data, nr)),
+                 BPF_JUMP(BPF_JMP | BPF_JEQ | BPF_K, static_cast<unsigned int>(number), 0, 1)},
+                error);
+}
+
+// Only those with these flags; what goes before them is granted.
+void MountRefuse(unsigned long flags)
+{
+    constexpr auto FLAGS = offsetof(seccomp_data, args) + 3 * sizeof(seccomp_data::args[0]);
+    CallsRefuse({BPF_STMT(BPF_LD | BPF_W | BPF_ABS, offsetof(seccomp_data, nr)),
+                 BPF_JUMP(BPF_JMP | BPF_JEQ | BPF_K, SYS_mount, 0, 3),
+                 BPF_STMT(BPF_LD | BPF_W | BPF_ABS, FLAGS),
+                 BPF_JUMP(BPF_JMP | BPF_JEQ | BPF_K, static_cast<unsigned int>(flags), 0, 1)},
+                EPERM);
 }
 
 struct CALL_ROW {
@@ -121,6 +140,31 @@ TEST(Unchanged, WhenACallIsRefused)
     for (const CALL_ROW &row : CALL_ROWS) {
         SCOPED_TRACE(row.szName);
         ExpectRefusal(Unchanged(MachineRefusing(row)), row.szError);
+    }
+}
+
+struct MOUNT_ROW {
+    const char *szName;
+    unsigned long flags;
+    const char *szError;
+};
+
+// In the order in which they are made.
+const MOUNT_ROW MOUNT_ROWS[] = {
+    {"a private folder", MS_NOSUID | MS_NODEV,
+     "cannot lay a private folder over /tmp: Operation not permitted\n"},
+    {"a program", MS_BIND, "cannot keep /sbin/mdadm at hand: Operation not permitted\n"},
+    {"the seal", MS_REMOUNT | MS_RDONLY | MS_NOSUID | MS_NODEV,
+     "cannot make /tmp/.arrayctl-rehearse read-only: Operation not permitted\n"},
+};
+
+TEST(Unchanged, WhenALaterMountIsRefused)
+{
+    for (const MOUNT_ROW &row : MOUNT_ROWS) {
+        SCOPED_TRACE(row.szName);
+        MACHINE machine = MachineWithOwnTool("echo ran; /sbin/mdadm -S /dev/md2\n");
+        machine.prepare = [row] { MountRefuse(row.flags); };
+        ExpectRefusal(Unchanged(machine), row.szError);
     }
 }
 
@@ -183,17 +227,22 @@ TEST(Unchanged, AsAUserWithoutRights)
 // ---- what the machine lacks
 // ----------------------------------------------------------------------
 
-// A file system of a few pages over the machine's /tmp, and no page of it is free.
-void TmpFill()
+// A file system of a few pages over a folder of the machine, and no page of it is free.
+void FolderFill(const std::string &szFolder)
 {
-    if (unshare(CLONE_NEWNS) != 0 || mount("full", "/tmp", "tmpfs", 0, "size=16k") != 0) {
+    if (unshare(CLONE_NEWNS) != 0 || mount("full", szFolder.c_str(), "tmpfs", 0, "size=16k") != 0) {
         _exit(1);
     }
     const std::array<char, 4096> page = {};
-    const int fd = open("/tmp/full", O_WRONLY | O_CREAT | O_CLOEXEC, 0600);
+    const int fd = open((szFolder + "/full").c_str(), O_WRONLY | O_CREAT | O_CLOEXEC, 0600);
     while (write(fd, page.data(), page.size()) > 0) {
     }
     (void)close(fd);
+}
+
+void TmpFill()
+{
+    FolderFill("/tmp");
     if (open("/tmp/raid.1", O_WRONLY | O_CREAT | O_CLOEXEC, 0600) < 0) {
         _exit(1);
     }
@@ -217,6 +266,32 @@ TEST(Unchanged, WithAToolThatFillsItsTmp)
                            ">/var/log/full; echo x >/tmp/more || /sbin/mdadm -S /dev/md2\n"));
     EXPECT_EQ(result.status, 0);
     EXPECT_EQ(result.szOut, "/sbin/mdadm -S /dev/md2\n");
+}
+
+void OutputToFullFolder()
+{
+    FolderFill("/mnt");
+    const int fd = open("/mnt/output", O_WRONLY | O_CREAT | O_CLOEXEC, 0600);
+    if (fd < 0 || dup2(fd, STDOUT_FILENO) < 0) {
+        _exit(1);
+    }
+}
+
+// Status 0 lets a script go on, so it may not be that when nobody can read what was printed; be
+// that less than the stream holds back, or more.
+TEST(Unchanged, WithoutRoomForWhatItPrints)
+{
+    const std::string szLong = "/sbin/mdadm $(yes x | head -n 9000 | tr -d '\\n')\n";
+    for (const std::string szForm : {"--commands", "--json"}) {
+        for (const std::string &szScript : {std::string("/sbin/mdadm -S /dev/md2\n"), szLong}) {
+            SCOPED_TRACE(szForm + " of " + szScript);
+            MACHINE machine = MachineWithOwnTool(szScript);
+            MachineFolder(machine, "/mnt");
+            machine.prepare = OutputToFullFolder;
+            ExpectRefusal(Unchanged(machine, szForm),
+                          "cannot print the rehearsal: its output cannot be written\n");
+        }
+    }
 }
 
 constexpr const char *CALLS[] = {
