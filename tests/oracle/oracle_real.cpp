@@ -240,7 +240,9 @@ void DestroyCompare(const PLAN &plan, const RECORD &record, vector<string> &diff
         differences.push_back(string("what was done to the array: it was ") +
                               (fStopped ? "stopped, and did not run\n" : "not stopped\n"));
     }
-    differences.insert(differences.end(), record.seen.problems.begin(), record.seen.problems.end());
+    for (const string &szProblem : record.seen.problems) {
+        differences.push_back("problems: " + szProblem + "\n");
+    }
 }
 
 void ModelCompare(const ORACLE_CASE &subject, const RECORD &record, vector<string> &differences)
@@ -250,7 +252,7 @@ void ModelCompare(const ORACLE_CASE &subject, const RECORD &record, vector<strin
     differences.insert(differences.end(), others.begin(), others.end());
 }
 
-// What the machine proves: its command when nothing of that failed, else an empty text.
+// What the machine proves: its command when nothing of that failed or differed, else an empty text.
 string MachineCompare(u64 seed, const string &szRecords, bool fRehearsed)
 {
     const string szFolder = szRecords + "/" + to_string(seed);
@@ -275,9 +277,9 @@ string MachineCompare(u64 seed, const string &szRecords, bool fRehearsed)
     const string szFailed = record.szFailed.empty() ? "" : ", failed: " + record.szFailed;
     VerdictTell("seed " + to_string(seed), szText,
                 Head(plan, record) + (fRehearsed ? szFailed : ""));
-    return !record.szFailed.empty()                ? ""
-           : PlanDestroys(plan) && !HasArray(plan) ? "destroy of nothing"
-                                                   : plan.subject.words[0];
+    return !record.szFailed.empty() || !differences.empty() ? ""
+           : PlanDestroys(plan) && !HasArray(plan)          ? "destroy of nothing"
+                                                            : plan.subject.words[0];
 }
 
 void EnoughTell(const string &szName, u64 nSeen, u64 nMin)
