@@ -99,6 +99,32 @@ std::vector<pid_t> RunsFind(const std::string &szTool)
     return runs;
 }
 
+constexpr char UDEV_CONTROL[] = "/run/udev/control";
+constexpr const char *ACTING_RULES[] = {"64-md-raid-assembly.rules", "69-lvm.rules"};
+constexpr const char *RULE_FOLDERS[] = {"/etc/udev/rules.d", "/run/udev/rules.d",
+                                        "/usr/local/lib/udev/rules.d", "/usr/lib/udev/rules.d",
+                                        "/lib/udev/rules.d"};
+
+// The first file of a name counts for udev. One that is empty, as /dev/null is, masks the others.
+WORDS UdevRulesFind()
+{
+    WORDS rules;
+    for (const char *const szRule : ACTING_RULES) {
+        for (const char *const szFolder : RULE_FOLDERS) {
+            struct stat info = {};
+            const std::string szPath = std::string(szFolder) + "/" + szRule;
+            if (stat(szPath.c_str(), &info) != 0) {
+                continue;
+            }
+            if (info.st_size > 0) {
+                rules.push_back(szPath);
+            }
+            break;
+        }
+    }
+    return access(UDEV_CONTROL, F_OK) == 0 ? rules : WORDS();
+}
+
 constexpr const char *MARKERS[] = {
     "/.force_clean_all_disk",
     "/tmp/.dualhead",
@@ -126,5 +152,6 @@ HOST HostRead(const OPTIONS &options)
     return {.mounts = MountsRead(),
             .swaps = SwapsRead(),
             .otherRuns = RunsFind(options.szToolPath),
+            .udevRules = UdevRulesFind(),
             .markers = MarkersFind()};
 }

@@ -16,6 +16,7 @@ struct HOST {
     std::vector<MOUNT> mounts;
     std::vector<dev_t> swaps;
     std::vector<pid_t> otherRuns; // of the same tool, at this moment
+    WORDS udevRules;              // that act on arrays and groups by themselves, where udev runs
     WORDS markers;                // paths of those that are set, before the tool sets one itself
 };
 

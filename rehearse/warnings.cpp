@@ -421,6 +421,17 @@ void OtherRunFind(const SCENE &scene, SENTENCES &found)
     }
 }
 
+void UdevFind(const SCENE &scene, SENTENCES &found)
+{
+    const bool fChanges = std::any_of(scene.run.commands.begin(), scene.run.commands.end(),
+                                      [](const COMMAND &command) { return !command.fQuestion; });
+    for (const std::string &szRule : fChanges ? scene.host.udevRules : WORDS()) {
+        found.push_back("udev runs and " + szRule +
+                        " is not masked: it acts on arrays or groups while the command works on "
+                        "them");
+    }
+}
+
 // A command that looks at whole disks leaves out those that are not the machine's own.
 void UnseenDiskFind(const SCENE &scene, SENTENCES &found)
 {
@@ -464,6 +475,7 @@ constexpr WARNING_ROW WARNING_ROWS[] = {
     {"survivor", SurvivorFind},
     {"left-out", LeftOutFind},
     {"other-run", OtherRunFind},
+    {"udev", UdevFind},
     {"unseen-disk", UnseenDiskFind},
     {"bad-end", BadEndFind},
 };

@@ -201,6 +201,35 @@ TEST(Rehearsal, RefusesWithASentence)
     }
 }
 
+// What the host's own folders hold of these rules is masked by those of the machine.
+TEST(Rehearsal, WarnsOfUdevsRules)
+{
+    constexpr char COMMAND[] = "/sbin/mdadm -S /dev/md2\n";
+    constexpr char WARNED[] =
+        "What should make you stop:\n"
+        "  udev runs and /run/udev/rules.d/69-lvm.rules is not masked: it acts on arrays or groups "
+        "while the command works on them\n\n";
+    const auto statusOf = [&](const char *szScript, bool fUdev, bool fMasked) {
+        MACHINE machine = MachineWithTool(szScript);
+        MachineFile(machine, "/run/udev/rules.d/64-md-raid-assembly.rules", "a rule\n");
+        MachineFile(machine, "/run/udev/rules.d/69-lvm.rules", "a rule\n");
+        MachineFile(machine, "/etc/udev/rules.d/64-md-raid-assembly.rules", "");
+        if (fUdev) {
+            MachineFile(machine, "/run/udev/control", "");
+        }
+        if (fMasked) {
+            MachineLink(machine, "/etc/udev/rules.d/69-lvm.rules", "/dev/null");
+        }
+        const RUN_RESULT result = RehearsalTry(machine, {"--tool", REHEARSAL_OWN_TOOL, "any"});
+        EXPECT_EQ(result.szOut.find(WARNED) != std::string::npos, result.status == 3);
+        return result.status;
+    };
+    EXPECT_EQ(statusOf(COMMAND, true, false), 3);
+    EXPECT_EQ(statusOf(COMMAND, true, true), 0);
+    EXPECT_EQ(statusOf(COMMAND, false, false), 0);
+    EXPECT_EQ(statusOf("echo only asks\n", true, false), 0);
+}
+
 TEST(Rehearsal, NeedsATmp)
 {
     MACHINE machine = MachineWithTool("exit 0\n");
