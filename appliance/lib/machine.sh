@@ -14,6 +14,7 @@ szBuildDir=$SOURCE_DIR/build/release
 nSilence=$((2 * SILENCE_SECONDS))
 szTool=${ARRAYCTL_TOOL:-}
 szConsoleCopy=
+szAnswers=
 szWorkDir=
 szBaseDir=
 szAccelerator=
@@ -26,7 +27,7 @@ PROBE_SECONDS=10
 machine_options() {
     while [ $# -gt 0 ]; do
         case $1 in
-        --disks | --size | --keep | --build | --silence | --file | --console | --release)
+        --disks | --size | --keep | --build | --silence | --file | --console | --answers | --release)
             [ $# -ge 2 ] || die "$1 needs a value; see --help"
             machine_option "$1" "$2"
             shift 2
@@ -52,6 +53,7 @@ machine_option() {
     --file) files+=("$2") ;;
     --release) szRelease=$2 ;;
     --console) szConsoleCopy=$2 ;;
+    --answers) szAnswers=$2 ;;
     esac
 }
 

@@ -13,11 +13,17 @@ TOLD=/tmp/told
 
 # --- what the real tool runs ----------------------------------------------------------------------
 
+has_lvm() {
+    [ -e /usr/sbin/lvm ]
+}
+
 # Under the names of all programs lies a script that writes down how it is called, as a person would
 # type it, and passes that on.
 record_calls() {
     mkdir -p "$REAL"
-    mv /usr/sbin/mdadm /usr/sbin/sfdisk /usr/sbin/lvm /usr/bin/umount "$REAL"
+    programs='/usr/sbin/mdadm /usr/sbin/sfdisk /usr/bin/umount'
+    ! has_lvm || programs="$programs /usr/sbin/lvm"
+    mv $programs "$REAL"
     for name in pvs lvremove vgremove pvremove pvcreate vgcreate lvcreate vgs vgchange vgextend; do
         ln -s lvm "$REAL/$name"
     done
@@ -32,7 +38,7 @@ echo "$line" >>/tmp/calls
 exec "/real/${0##*/}" "$@"
 SCRIPT
     chmod +x /tmp/recorder
-    for program in /usr/sbin/mdadm /usr/sbin/sfdisk /usr/sbin/lvm /usr/bin/umount; do
+    for program in $programs; do
         cp /tmp/recorder "$program"
     done
 }
@@ -55,8 +61,9 @@ in_order() {
 
 # --- that nothing has changed ---------------------------------------------------------------------
 
+# What is mounted is flushed by each "sync", so writes are counted by their sectors.
 state() {
-    writes
+    writes | awk '{ print $1, $3, $4 }'
     cat /proc/mdstat /proc/mounts
     "$REAL/lvm" vgs --noheadings -o vg_name,lv_count 2>/dev/null
     find /tmp /run /var/log /etc /dev ! -path "$SYSLOG" ! -path '/tmp/*' 2>/dev/null | sort
@@ -76,6 +83,27 @@ keeps_everything() {
     state >/tmp/state.now
     diff /tmp/state /tmp/state.now || return 125
     return "$kept"
+}
+
+# Every sector of every disk, a line for each. Only a case whose head says "pictures: yes" can ask for it.
+exec 3>&1
+host_picture() {
+    sync
+    for port in /sys/class/virtio-ports/*; do
+        [ "$(cat "$port/name")" = answers ] || continue
+        echo picture >&3
+        while read -r line && [ "$line" != end ]; do
+            echo "$line"
+        done <"/dev/${port##*/}"
+    done
+}
+
+# keeps_every_sector STATUS COMMAND...: rehearsed, with every sector of every disk as before.
+keeps_every_sector() {
+    host_picture >/tmp/picture
+    rehearses "$@" || return 1
+    host_picture >/tmp/picture.now
+    [ "$(grep -c '^disk' /tmp/picture)" = 4 ] && diff /tmp/picture /tmp/picture.now
 }
 
 # --- the rehearsal --------------------------------------------------------------------------------
