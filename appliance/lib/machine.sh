@@ -43,6 +43,7 @@ machine_options() {
     rest=("$@")
 }
 
+# shellcheck disable=SC2034  # szAnswers is read elsewhere
 machine_option() {
     case $1 in
     --disks) nDisks=$2 ;;
