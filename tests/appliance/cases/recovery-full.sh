@@ -34,7 +34,7 @@ without_room() {
     ended=$?
     refused=
     for folder in $FOLDERS; do
-        { : >"$folder/more"; } 2>/dev/null || refused="$refused $folder"
+        mkdir "$folder/more" 2>/dev/null || refused="$refused $folder"
         umount -l "$folder"
     done
     [ "$ended" = "$expected" ] && [ "$refused" = " $FOLDERS" ] && return

@@ -7,7 +7,7 @@
 # shellcheck disable=SC2046,SC2086,SC2154,SC2317  # lists of words; check must call the functions
 # shellcheck source=SCRIPTDIR/../lib-recovery.sh
 . /appliance/lib-recovery.sh
-plan 6
+plan 7
 
 slow_resync
 bays 0xf
@@ -76,4 +76,15 @@ stop_arrays 2
 check 'what follows' says 0 '' arrayctl_awake initsys
 check_whole "$WHOLE_8"
 verdict 'row 2: layout 8, and the second run was cut off'
+
+with_data "$WHOLE_8"
+: >/.force_clean_all_disk
+check 'a run' says 0 '' arrayctl_awake initsys
+rm /.force_clean_all_disk
+check 'what one sees' looks_like 2
+way_back 2
+check_tables "$WHOLE_8" $ALL
+check_data
+forget
+verdict 'row 2: layout 8, and it was to wipe all'
 finish

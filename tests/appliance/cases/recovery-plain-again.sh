@@ -7,7 +7,7 @@
 # shellcheck disable=SC2046,SC2086,SC2154,SC2317  # lists of words; check must call the functions
 # shellcheck source=SCRIPTDIR/../lib-recovery.sh
 . /appliance/lib-recovery.sh
-plan 7
+plan 9
 ALL='sda sdb'
 
 slow_resync
@@ -100,4 +100,32 @@ for kind in none '' stock; do
     forget
 done
 verdict 'row 8: layout 3 without RAID'
+
+# No array at all; the other disk is another case's.
+ALL=sda
+bays 0x1 supportraid=no
+erased sda
+lay_out sda "$(plain_of 8)"
+store_data sda3
+picture sda3 >/tmp/before
+cut_at before 'sfdisk -N1 *' 1 '' 0 initsys
+numbers 8 'no RAID'
+with_disks
+way_back 1
+check_tables "$(plain_of 8)" sda
+picture sda3 >/tmp/now
+check 'every byte' cmp /tmp/before /tmp/now
+stop_arrays 0 1
+verdict 'row 1: a file system without an array'
+
+cut_at before 'sfdisk -N1 *' 1 '' 0 initsys
+must arrayctl_awake initsys
+check_tables "$(plain_of 8 | head -n 2)" sda
+numbers 8 'no RAID'
+with_disks
+way_back 2
+check_tables "$(plain_of 8)" sda
+picture sda3 >/tmp/now
+check 'every byte' cmp /tmp/before /tmp/now
+verdict 'row 2: a file system without an array'
 finish
