@@ -2,6 +2,7 @@
 # SPDX-License-Identifier: MIT
 # An installation is cut off at every place that the page of recovery tells of, and what the page says
 # brings the machine back, with every byte of its data.
+# alone: yes
 # disks: 4
 # size: 4672M
 # shellcheck disable=SC2046,SC2086,SC2154,SC2317  # lists of words; check must call the functions

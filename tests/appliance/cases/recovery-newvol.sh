@@ -2,6 +2,7 @@
 # SPDX-License-Identifier: MIT
 # The making of a data array is cut off, or ends early at a bad disk; what the page of recovery says ends
 # it, or brings the array that was there back with every byte.
+# alone: yes
 # disks: 4
 # size: 4672M
 # shellcheck disable=SC2046,SC2086,SC2154,SC2317  # lists of words; check must call the functions
