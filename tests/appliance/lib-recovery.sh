@@ -183,7 +183,7 @@ counts() { # COUNT PATTERN FILE
 }
 
 is_quiet() {
-    ! cat /proc/[0-9]*/comm 2>/dev/null | grep -qxE 'arrayctl|mdadm|sfdisk|lvm|pvs|strace|sleep'
+    ! cat /proc/[0-9]*/comm 2>/dev/null | grep -qxE 'arrayctl|mdrequests|mdadm|sfdisk|lvm|pvs|strace|sleep'
 }
 
 # starts COMMAND...: the tool in a session of its own, so that all of it can be killed.
@@ -244,10 +244,16 @@ cut_inside() {
     rm -f /tmp/cut
 }
 
-# All at once: nobody sees another one end.
+# All at once: nobody sees another one end. One that is being started while the others are looked for is
+# found the next time, as those who could start more stand still by then.
 end_all() {
-    cut_off=$(tree_of "$(cat "$PID")")
-    kill -STOP $cut_off 2>/dev/null
+    cut_off=
+    found=$(tree_of "$(cat "$PID")" | sort)
+    while [ "$found" != "$cut_off" ]; do
+        cut_off=$found
+        kill -STOP $cut_off 2>/dev/null
+        found=$(tree_of "$(cat "$PID")" | sort)
+    done
     kill -9 $cut_off 2>/dev/null
     wait
     rm -f /tmp/stay.*
