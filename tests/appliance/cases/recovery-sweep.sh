@@ -58,18 +58,23 @@ that_change() {
 # whole_run COMMAND data|blank
 whole_run() {
     "begin_$1_$2"
-    rm -f /tmp/stay.*
     begin=$(now)
+    run_through "$1"
+    echo $(($(now) - begin + 1)) >/tmp/length
+}
+
+run_through() { # COMMAND
+    rm -f /tmp/stay.*
     starts $(words_of "$1")
     wait
-    echo $(($(now) - begin + 1)) >/tmp/length
     await is_quiet
 }
 
 # "CALL N COMMAND LINE" for all that the partitioner and mdadm have the kernel change.
 calls_of() { # COMMAND data|blank
+    "begin_$1_$2"
     mkdir /tmp/calls
-    whole_run "$1" "$2"
+    run_through "$1"
     for line in /tmp/calls/*.line; do
         that_change "$line" | grep '^sfdisk\|^mdadm' >/tmp/line || continue
         awk -v line="$(cat /tmp/line)" '/^[a-z0-9_]*\(/ {
