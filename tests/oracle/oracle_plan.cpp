@@ -204,7 +204,9 @@ int LevelMake(DICE &dice, const PLAN_ARRAY &array)
     static const vector<int> levels = {0, 1, 5, 10};
     const int nLevel = Pick(dice, levels);
     const bool fEnough = array.members.size() >= (nLevel == 5 ? 3 : 2);
-    return fEnough && !array.fSpare ? nLevel : 1;
+    const bool fKnown =
+        nLevel != 0 || array.szMetadata != "0.90"; // mdadm refuses these two together
+    return fEnough && fKnown && !array.fSpare ? nLevel : 1;
 }
 
 // The array that the command takes apart runs, and may carry a group. Now and then it does not run,
