@@ -16,9 +16,14 @@ import verdict
 RUN = os.path.join(verdict.ROOT, "tests/run")
 PASSES = "echo '[ RUN      ] Some.Passes'; echo '[       OK ] Some.Passes (0 ms)'\n"
 FAILS = "echo '[ RUN      ] Some.Fails'; echo wrong; echo '[  FAILED  ] Some.Fails (0 ms)'\n"
-# The switched-off processor of a machine that is there: it never says a word.
+# The switched-off processor of a machine that is there: it never says a word. Where there is no base yet,
+# the machine that tries the new one runs.
 STOPPED_MACHINE = """eval "$(declare -f machine_qemu | sed '1s/machine_qemu/machine_qemu_running/')"
-machine_qemu() { echo "$BASHPID" >"$PROCESS_FILE"; machine_qemu_running "$@" -S; }
+machine_qemu() {
+    [ -n "${ARRAYCTL_BASE:-}" ] || set -- "$@" -S
+    echo "$BASHPID" >"$PROCESS_FILE"
+    machine_qemu_running "$@"
+}
 """
 
 
