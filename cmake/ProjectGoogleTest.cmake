@@ -17,6 +17,7 @@ endif()
 
 # What nearly every test includes, parsed once for a test program: half of what compiling them takes.
 set(TEST_HEADERS <gtest/gtest.h> <functional> <map> <string> <vector>)
-# Test programs of many files are compiled far more often than run. UBSan is for the code under test: in
-# theirs it takes as long to compile as all the rest.
-set(TEST_OPTIONS -O0 -fno-sanitize=undefined)
+# UBSan is for the code under test: in that of tests it takes as long to compile as all the rest. And test
+# programs of many files are compiled far more often than run.
+set(HARNESS_OPTIONS -fno-sanitize=undefined)
+set(TEST_OPTIONS ${HARNESS_OPTIONS} -O0)
