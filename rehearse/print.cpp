@@ -208,6 +208,15 @@ constexpr FORM_ROW FORMS[] = {
 
 } // namespace
 
+void ScenePrint(const SCENE &scene, const std::vector<WARNING> &warnings)
+{
+    for (const FORM_ROW &row : FORMS) {
+        if (row.form == scene.options.form) {
+            row.pPrint(scene, warnings);
+        }
+    }
+}
+
 int RehearsalPrint(const OPTIONS &options, const HOST &host, const RUN &run)
 {
     const INVENTORY inventory = InventoryRead(host);
@@ -215,10 +224,6 @@ int RehearsalPrint(const OPTIONS &options, const HOST &host, const RUN &run)
     const SCENE scene = {
         .options = options, .host = host, .run = run, .inventory = inventory, .outcome = outcome};
     const std::vector<WARNING> warnings = WarningsFind(scene);
-    for (const FORM_ROW &row : FORMS) {
-        if (row.form == options.form) {
-            row.pPrint(scene, warnings);
-        }
-    }
+    ScenePrint(scene, warnings);
     return warnings.empty() ? STATUS_CLEAN : STATUS_WARNED;
 }
