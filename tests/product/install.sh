@@ -35,6 +35,11 @@ REHEARSE_FILES="usr/sbin/arrayctl-rehearse
 usr/share/bash-completion/completions/arrayctl-rehearse
 usr/share/man/man8/arrayctl-rehearse.8.gz"
 
+# The C library that the programs of a release ask for; where it reads numbers of a newer C, a newer one.
+declare -A LIBC=([bookworm]='libc6 (>= 2.34)' [trixie]='libc6 (>= 2.38)')
+declare -A REHEARSE_LIBC=([bookworm]='libc6 (>= 2.36)' [trixie]='libc6 (>= 2.38)')
+RELEASE=$(bash -c '. cmake/packages.sh && system_codename')
+
 listing() { (cd "$1" && find . -type f -printf '%p %s %T@ %m\n' | LC_ALL=C sort); }
 
 files_of() { (cd "$1" && find . -type f | sed 's,^\./,,' | LC_ALL=C sort); }
@@ -95,7 +100,7 @@ package_files() { # PACKAGE ARCHITECTURE
 depends_are_right() {
     local szArch
     for szArch in amd64 powerpc; do
-        same 'libc6 (>= 2.34), lvm2, mdadm, mount' "$(field arrayctl "$szArch" Depends)" || return 1
+        same "${LIBC[$RELEASE]}, lvm2, mdadm, mount" "$(field arrayctl "$szArch" Depends)" || return 1
         same "$szArch" "$(field arrayctl "$szArch" Architecture)" || return 1
         same 'lvm2, mdadm, mount' "$(field arrayctl-static "$szArch" Depends)" || return 1
         same "arrayctl (= $VERSION)" "$(field arrayctl-static "$szArch" Provides)" || return 1
@@ -104,9 +109,9 @@ depends_are_right() {
     done
     same "glibc (= $(dpkg-query -W -f '${source:Version}' libc6-dev))" "$(field arrayctl-static amd64 Built-Using)" || return 1
     [[ $(field arrayctl-static powerpc Built-Using) =~ ^glibc\ \(=\ [0-9].*\)$ ]] || return 1
-    same "libblkid1 (>= 2.17), libc6 (>= 2.36), arrayctl (= $VERSION) | arrayctl-static (= $VERSION)" \
+    same "libblkid1 (>= 2.17), ${REHEARSE_LIBC[$RELEASE]}, arrayctl (= $VERSION) | arrayctl-static (= $VERSION)" \
         "$(field arrayctl-rehearse amd64 Depends)" || return 1
-    same "libfdisk1 (>= 2.35), libc6 (>= 2.34), arrayctl (= $VERSION)" "$(field arrayctl-platform amd64 Depends)"
+    same "libfdisk1 (>= 2.35), ${LIBC[$RELEASE]}, arrayctl (= $VERSION)" "$(field arrayctl-platform amd64 Depends)"
 }
 
 packages_hold_what_they_should() {
