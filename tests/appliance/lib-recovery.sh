@@ -315,7 +315,7 @@ forget() {
         stop_arrays "$number"
     done
     for disk in $ALL; do
-        must blockdev --rereadpt "/dev/$disk"
+        read_table_again "$disk"
     done
 }
 
@@ -328,7 +328,7 @@ erased() {
             [ ! -e "/dev/$disk$part" ] || mdadm -q --zero-superblock "/dev/$disk$part" 2>/dev/null
         done
         must dd if=/dev/zero of="/dev/$disk" bs=64k count=1 conv=fsync
-        must blockdev --rereadpt "/dev/$disk"
+        read_table_again "$disk"
     done
 }
 
@@ -380,7 +380,7 @@ put_back() {
             dd if="/tmp/kept.$1/$disk.$first" of="/dev/$disk" bs=64k oflag=seek_bytes seek="$first" \
                 conv=notrunc,fsync 2>/dev/null
         done <"/tmp/kept.$1/places"
-        must blockdev --rereadpt "/dev/$disk"
+        read_table_again "$disk"
     done
 }
 

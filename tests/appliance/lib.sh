@@ -107,6 +107,12 @@ await() {
 
 # --- disks -------------------------------------------------------------------------------------
 
+# The kernel refuses while somebody has the disk open, as udev does who looks at what was written to it.
+read_table_again() { # DISK
+    await blockdev --rereadpt "/dev/$1"
+    rest
+}
+
 # partition_disks "64M 64M" sda sdb ...: fresh tables with these partitions and one for the rest.
 partition_disks() {
     sizes=$1

@@ -87,7 +87,7 @@ blank() {
     for disk in sda sdb; do
         mdadm -q --zero-superblock "/dev/$disk"[12] 2>/dev/null
         must dd if=/dev/zero of="/dev/$disk" bs=1M count=1 conv=fsync
-        must blockdev --rereadpt "/dev/$disk"
+        read_table_again "$disk"
     done
 }
 

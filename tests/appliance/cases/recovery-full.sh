@@ -10,7 +10,9 @@
 . /appliance/lib-recovery.sh
 plan 3
 
-FOLDERS='/tmp /run /var/log /etc/lvm'
+FOLDERS='/tmp /var/log /etc/lvm'
+# Where there is udev, it has to find in /run what it knows of the devices.
+has_udev || FOLDERS="$FOLDERS /run"
 
 # What a program puts there when it can: lvm.conf is read, so it has to be where it was.
 fill_up() { # FOLDER

@@ -59,7 +59,7 @@ must umount /films
 stop_arrays 2
 for disk in sda sdb sdc sdd; do
     must wipefs -q -a /dev/$disk
-    must blockdev --rereadpt /dev/$disk
+    read_table_again "$disk"
 done
 check 'initsys' says 0 '' arrayctl_awake initsys
 check 'newvol' says 0 'Creating RAID 5 volume... \n' arrayctl_awake newvol

@@ -138,7 +138,8 @@ check 'cut off' warns initsys \
 verdict 'a run that was cut off'
 
 for disk in sda sdb sdc sdd; do
-    must sh -c "mdadm --zero-superblock /dev/${disk}3; wipefs -q -a /dev/$disk; blockdev --rereadpt /dev/$disk"
+    must sh -c "mdadm --zero-superblock /dev/${disk}3; wipefs -q -a /dev/$disk"
+    read_table_again "$disk"
 done
 machine internalportcfg=0x1f usbportcfg=0x10000 maxdisks=5
 debug_disk
