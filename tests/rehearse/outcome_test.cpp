@@ -166,14 +166,7 @@ TEST(Outcome, ArrayRunsOnWithoutOneMember)
 TEST(Outcome, GroupGoesWithAllItsVolumes)
 {
     INVENTORY inventory;
-    VOLUME volume;
-    volume.szName = "films";
-    volume.device.szPath = "/dev/vg1/films";
-    volume.device.nSector = 2097152;
-    volume.device.signatures = {{.szType = "ext4", .szLabel = "cinema", .fTable = false}};
-    volume.device.mounts = {"/films"};
-    inventory.groups = {
-        {.szName = "vg1", .devices = {"/dev/md2", "/dev/md3"}, .volumes = {volume}}};
+    inventory.groups = {FilmsGroup({"/dev/md2", "/dev/md3"}, {"/films"})};
     const OUTCOME outcome =
         OutcomeOf(inventory, RunOf({"/sbin/lvremove -f /dev/vg1/films",
                                     "/sbin/vgremove -f /dev/vg1", "/sbin/pvremove -f /dev/md2"}));

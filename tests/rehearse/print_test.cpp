@@ -108,13 +108,7 @@ TEST(Print, BarsOnATerminal)
 TEST(Print, WhatIsMountedIsMarkedAsLost)
 {
     INVENTORY inventory;
-    VOLUME volume;
-    volume.szName = "films";
-    volume.device.szPath = "/dev/vg1/films";
-    volume.device.nSector = 2097152;
-    volume.device.signatures = {{.szType = "ext4", .szLabel = "cinema", .fTable = false}};
-    volume.device.mounts = {"/films", "/srv/films"};
-    inventory.groups = {{.szName = "vg1", .devices = {"/dev/md2"}, .volumes = {volume}}};
+    inventory.groups = {FilmsGroup({"/dev/md2"}, {"/films", "/srv/films"})};
     EXPECT_EQ(Part(Printed(inventory, {"/sbin/lvremove -f /dev/vg1/films",
                                        "/sbin/vgremove -f /dev/vg1", "/sbin/pvremove -f /dev/md2"}),
                    "What is lost"),

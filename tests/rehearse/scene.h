@@ -58,6 +58,18 @@ inline ARRAY DataArray(const WORDS &members)
     return array;
 }
 
+// Group vg1 with a mounted volume of 1 GiB.
+inline GROUP FilmsGroup(const WORDS &devices, const WORDS &mounts)
+{
+    VOLUME volume;
+    volume.szName = "films";
+    volume.device.szPath = "/dev/vg1/films";
+    volume.device.nSector = 2097152;
+    volume.device.signatures = {{.szType = "ext4", .szLabel = "cinema", .fTable = false}};
+    volume.device.mounts = mounts;
+    return {.szName = "vg1", .devices = devices, .volumes = {volume}};
+}
+
 // A command, or a question with the status in wait's form.
 inline COMMAND CommandOf(const std::string &szLine, bool fQuestion = false, int status = 0)
 {
