@@ -19,7 +19,6 @@
 #include <sched.h>
 #include <sys/wait.h>
 #include <unistd.h>
-#include <utility>
 
 namespace
 {
@@ -140,8 +139,8 @@ void OtherStreamsClose()
     _exit(STATUS_NOT_EXECUTED);
 }
 
-// In the parent: turns its end of the pipe into a registered stream.
-FILE *StreamRegister(HEAP_OWNER<PIPE_STREAM> pRecord, const PIPE_MODE &mode, FD_OWNER fdOurs)
+// In the parent: turns its end of the pipe into a registered stream, which then owns both.
+FILE *StreamRegister(HEAP_OWNER<PIPE_STREAM> &pRecord, const PIPE_MODE &mode, FD_OWNER &fdOurs)
 {
     if (!mode.fKeepCloseOnExec) {
         CloseOnExecClear(fdOurs.get());
@@ -228,7 +227,7 @@ FILE *NLIBCPopenV(const char *szPath, const char *szMode, char *const argv[])
         NLIBCErrSetHere(ERR_FORK_FAILED);
         return nullptr;
     }
-    return StreamRegister(std::move(pRecord), mode, std::move(fdOurs));
+    return StreamRegister(pRecord, mode, fdOurs);
 }
 
 FILE *NLIBCPopen(const char *szPath, const char *szMode, ...)
