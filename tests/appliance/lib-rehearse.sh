@@ -61,18 +61,20 @@ in_order() {
 
 # --- that nothing has changed ---------------------------------------------------------------------
 
-# What is mounted is flushed by each "sync", so writes are counted by their sectors.
+# What is mounted is flushed by each "sync", so writes are counted by their sectors. Udev's workers
+# come and go by themselves, and tidy up which of them claimed a link.
 state() {
     writes | awk '{ print $1, $3, $4 }'
     cat /proc/mdstat /proc/mounts
     "$REAL/lvm" vgs --noheadings -o vg_name,lv_count 2>/dev/null
-    find /tmp /run /var/log /etc /dev ! -path "$SYSLOG" ! -path '/tmp/*' 2>/dev/null | sort
+    find /tmp /run /var/log /etc /dev ! -path "$SYSLOG" ! -path '/tmp/*' ! -path '/run/udev/links/*' \
+        2>/dev/null | sort
     find /tmp -name '.*' | sort
     log_is_whole
     grep -v ' mark: ' "$SYSLOG"
     for process in /proc/[0-9]*; do
         [ ! -e "$process/exe" ] || readlink "$process/exe"
-    done | sort | uniq -c | grep -v busybox
+    done | sort | uniq -c | grep -v -e busybox -e systemd-udevd
 }
 
 # keeps_everything COMMAND...: before and behind it, all of this is the same.

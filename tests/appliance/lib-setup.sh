@@ -60,7 +60,7 @@ lay_out() {
         echo 'label: dos'
         echo "$2" | sed 's/\(.*\) \(.*\) \(.*\) \(.*\)/\1 : start=\2, size=\3, type=\4/'
     } >/tmp/table
-    must sh -c "sfdisk.stock -q --wipe always --wipe-partitions never /dev/$1 </tmp/table"
+    must sh -c "sfdisk.stock --lock -q --wipe always --wipe-partitions never /dev/$1 </tmp/table"
 }
 
 # The name of the disk that the kernel's test driver made.

@@ -119,7 +119,7 @@ partition_disks() {
     shift
     for disk in "$@"; do
         printf ',%s\n' $sizes '' >/tmp/table
-        must sh -c "sfdisk.stock -q --wipe always /dev/$disk </tmp/table"
+        must sh -c "sfdisk.stock --lock -q --wipe always /dev/$disk </tmp/table"
     done
 }
 

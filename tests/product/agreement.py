@@ -259,6 +259,8 @@ def case_what_the_tests_of_recovery_type_is_the_page():
     for row, text in rows_of_recovery().items():
         blocks = dict(re.findall(r"^```sh ?(\w*)\n(.*?)^```", text.split("\n## ")[0], re.S | re.M))
         assert ("sfdisk" in blocks.get("", "")) == ("stock" in blocks), f"row {row} for which partitioner?"
+        calls = re.findall(r"\bsfdisk .*", blocks.get("stock", ""))
+        assert all(call.startswith("sfdisk --lock ") for call in calls), f"row {row} beside udev"
     shown = {row for row, text in rows_of_recovery().items() if "```text\n" in text}
     seen = {row for body, row, _ in verdicts_of_recovery() if re.search(rf"looks_like {row}\b", body)}
     verdict.same(seen & shown, shown, "what one sees")
